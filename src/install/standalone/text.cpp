@@ -1,0 +1,73 @@
+#include "text.h"
+
+namespace {
+
+std::string framed(std::string_view name)
+{
+    std::string text(ListSeparator);
+    text += name;
+    text += ListSeparator;
+    return text;
+}
+
+} // namespace
+
+void trim(std::string& text)
+{
+    const std::size_t last = text.find_last_not_of(Blanks);
+    if (last == std::string::npos)
+        return;
+    text.erase(last + 1);
+    text.erase(0, text.find_first_not_of(Blanks));
+}
+
+void trimRight(std::string& text)
+{
+    text.erase(text.find_last_not_of(Blanks) + 1); // npos + 1 is 0: nothing but blanks
+}
+
+void appendToNameList(std::string& list, std::string_view name)
+{
+    list += framed(name);
+}
+
+bool nameListContains(std::string_view list, std::string_view name)
+{
+    return list.find(framed(name)) != std::string_view::npos;
+}
+
+bool readLine(std::FILE* file, std::string& line)
+{
+    line.clear();
+    int c = getc_unlocked(file);
+    if (c == EOF)
+        return false;
+    for (; c != EOF && c != '\n'; c = getc_unlocked(file))
+        line += static_cast<char>(c);
+    return std::ferror(file) == 0;
+}
+
+std::string keyOfLine(const std::string& line)
+{
+    std::string key = line.substr(0, line.find('='));
+    trim(key);
+    return key;
+}
+
+std::string textAfterEquals(const std::string& line)
+{
+    const std::size_t equals = line.find('=');
+    return equals == std::string::npos ? std::string() : line.substr(equals + 1);
+}
+
+int replaceEach(std::string& text, const std::string& old, const std::string& replacement)
+{
+    int count = 0;
+    // Deliberate: not from behind the replacement. What it forms with its neighbours is replaced
+    // too.
+    for (std::size_t at = text.find(old); at != std::string::npos; at = text.find(old)) {
+        text.replace(at, old.size(), replacement);
+        ++count;
+    }
+    return count;
+}

@@ -1,0 +1,47 @@
+// Trimming, and lists of names held in one text.
+//
+// A name list frames each name with "|" on both sides: "|bin/a||bin/b|". It is searched as a text,
+// so a name that itself holds "|" can match across two names.
+#pragma once
+
+#include <cstdio>
+#include <string>
+#include <string_view>
+
+/// The characters cut from keys and values: blank, tab, newline, carriage return.
+inline constexpr std::string_view Blanks = " \t\n\r";
+
+/// Stands before and after every name of a name list.
+inline constexpr std::string_view ListSeparator = "|";
+
+/// Cuts every leading and trailing character of Blanks, in place.
+///
+/// Deliberate: a text made only of blanks stays as it is; registries depend on it, since an empty
+/// exploiter list reads back as one blank.
+void trim(std::string& text);
+
+/// Cuts every trailing character of Blanks, in place; a text made only of blanks becomes empty.
+void trimRight(std::string& text);
+
+/// Appends `name` in its frame to `list`.
+void appendToNameList(std::string& list, std::string_view name);
+
+/// True when `name` in its frame occurs in `list`.
+[[nodiscard]] bool nameListContains(std::string_view list, std::string_view name);
+
+/// Reads one line of `file` into `line`, without its newline. NUL is an ordinary byte.
+///
+/// A last line without a newline counts. Returns false at the end of the file or when reading
+/// fails (ferror() tells which); a line cut short by a failure is not delivered.
+[[nodiscard]] bool readLine(std::FILE* file, std::string& line);
+
+/// What `line` holds before its first "=", trimmed; the whole line, trimmed, without one.
+[[nodiscard]] std::string keyOfLine(const std::string& line);
+
+/// What `line` holds after its first "=", as it stands; empty without one.
+[[nodiscard]] std::string textAfterEquals(const std::string& line);
+
+/// Replaces the first `old` in `text` by `replacement`, from the start of the text again and again,
+/// until there is none; returns the number of replacements. `old` must not be empty and not occur
+/// in `replacement`: that would never end.
+int replaceEach(std::string& text, const std::string& old, const std::string& replacement);

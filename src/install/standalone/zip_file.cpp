@@ -1,0 +1,398 @@
+#undef NDEBUG // the assertion below holds in every build type
+#include "zip_file.h"
+
+#include <algorithm>
+#include <cassert>
+#include <cstring>
+#include <limits>
+
+#include <fcntl.h>
+
+namespace {
+
+constexpr std::uint32_t MaxNameLength = 2048;
+constexpr std::size_t EndRecordSize = 22;
+constexpr std::size_t CentralHeaderSize = 46;
+constexpr std::size_t LocalHeaderSize = 30;
+constexpr std::uint32_t SizesFollowData = 8; // bit 3 of the general-purpose flags
+
+constexpr std::int64_t SeekLimit = std::int64_t{1} << 31;
+
+std::uint32_t read16(const unsigned char* at)
+{
+    return static_cast<std::uint32_t>(at[0] | at[1] << 8);
+}
+
+std::uint32_t read32(const unsigned char* at)
+{
+    return read16(at) | read16(at + 2) << 16;
+}
+
+bool hasSignature(const unsigned char* at, unsigned char third, unsigned char fourth)
+{
+    return at[0] == 'P' && at[1] == 'K' && at[2] == third && at[3] == fourth;
+}
+
+/// Reads up to `size` bytes; fewer only at the end of the file or when reading fails.
+std::size_t readUpTo(int fd, void* buffer, std::size_t size)
+{
+    std::size_t done = 0;
+    while (done < size) {
+        const ssize_t count = ::read(fd, static_cast<char*>(buffer) + done, size - done);
+        if (count <= 0)
+            break;
+        done += static_cast<std::size_t>(count);
+    }
+    return done;
+}
+
+ScopedFd openArchive(const char* path)
+{
+    return ScopedFd(::open(path, O_RDONLY | O_CLOEXEC));
+}
+
+/// Reads an archive's headers from a window of the file, so that one system call serves many.
+class HeaderReader {
+public:
+    explicit HeaderReader(int fd) : fd_(fd) {}
+
+    [[nodiscard]] std::int64_t position() const { return position_; }
+
+    bool seek(std::int64_t position)
+    {
+        if (position < 0 || position >= SeekLimit)
+            return false;
+        position_ = position;
+        return true;
+    }
+
+    bool skip(std::uint32_t count) { return seek(position_ + count); }
+
+    bool seekBeforeEnd(std::int64_t distance)
+    {
+        const std::int64_t end = ::lseek(fd_, 0, SEEK_END);
+        return seek(end - distance);
+    }
+
+    /// Reads exactly `size` bytes, at most MaxNameLength of them, and moves on.
+    bool read(void* buffer, std::size_t size)
+    {
+        if (!inWindow(size) && !fill(size))
+            return false;
+        std::memcpy(buffer, window_ + (position_ - start_), size);
+        position_ += static_cast<std::int64_t>(size);
+        return true;
+    }
+
+private:
+    [[nodiscard]] bool inWindow(std::size_t size) const
+    {
+        return position_ >= start_ && position_ + static_cast<std::int64_t>(size) <= end_;
+    }
+
+    /// Moves the window to the position; true when it then holds `size` bytes.
+    bool fill(std::size_t size)
+    {
+        start_ = end_ = position_;
+        while (!inWindow(size)) {
+            const auto held = static_cast<std::size_t>(end_ - start_);
+            const ssize_t count = ::pread(fd_, window_ + held, sizeof window_ - held, end_);
+            if (count <= 0)
+                return false;
+            end_ += count;
+        }
+        return true;
+    }
+
+    int fd_;
+    std::int64_t position_ = 0;
+    std::int64_t start_ = 0; ///< the window holds the bytes from start_ to before end_
+    std::int64_t end_ = 0;
+    unsigned char window_[4096];
+};
+
+/// Reads a name of `length` bytes and cuts it at its first NUL.
+bool readName(HeaderReader& reader, std::uint32_t length, std::string& name)
+{
+    char text[MaxNameLength + 1];
+    if (!reader.read(text, length))
+        return false;
+    text[length] = '\0';
+    name = text;
+    return true;
+}
+
+/// Takes sizes and offset of `count` central headers; dataOffset is the local header's until
+/// resolveLocalHeader() has run.
+bool readCentralHeaders(HeaderReader& reader, std::uint32_t count, std::vector<ZipEntry>& entries)
+{
+    for (std::uint32_t i = 0; i < count; ++i) {
+        unsigned char header[CentralHeaderSize];
+        if (!reader.read(header, sizeof header) || !hasSignature(header, 1, 2))
+            return false;
+
+        const std::uint32_t nameLength = read16(header + 28);
+        // Deliberate: a file comment is not skipped. The next header is then not found, and the
+        // archive is read through the scan.
+        if (nameLength > MaxNameLength || !reader.skip(nameLength + read16(header + 30)))
+            return false;
+
+        ZipEntry& entry = entries.emplace_back();
+        entry.method = read16(header + 10);
+        entry.crc32 = read32(header + 16);
+        entry.compressedSize = read32(header + 20);
+        entry.uncompressedSize = read32(header + 24);
+        entry.dataOffset = read32(header + 42);
+    }
+    return true;
+}
+
+/// Gives `entry` its name and the place of its data. The local signature is not looked at.
+bool resolveLocalHeader(HeaderReader& reader, ZipEntry& entry)
+{
+    unsigned char header[LocalHeaderSize];
+    if (!reader.seek(entry.dataOffset) || !reader.read(header, sizeof header))
+        return false;
+
+    const std::uint32_t nameLength = read16(header + 26);
+    if (read16(header + 8) != entry.method || nameLength > MaxNameLength)
+        return false;
+    if (!readName(reader, nameLength, entry.name))
+        return false;
+
+    entry.dataOffset = static_cast<std::uint32_t>(reader.position()) + read16(header + 28);
+    return true;
+}
+
+/// Reads the central directory; false when anything about it is wrong.
+bool readCentralDirectory(HeaderReader& reader, std::vector<ZipEntry>& entries)
+{
+    // The end record is looked for in one place only, so an archive comment hides it.
+    unsigned char end[EndRecordSize];
+    if (!reader.seekBeforeEnd(EndRecordSize) || !reader.read(end, sizeof end) ||
+        !hasSignature(end, 5, 6))
+        return false;
+
+    const std::uint32_t count = read16(end + 10);
+    if (read16(end + 8) != count || !reader.seek(read32(end + 16)))
+        return false;
+    if (!readCentralHeaders(reader, count, entries))
+        return false;
+
+    return std::all_of(entries.begin(), entries.end(),
+                       [&](ZipEntry& entry) { return resolveLocalHeader(reader, entry); });
+}
+
+/// Reads one local header behind its signature's check and moves past its data.
+int scanLocalHeader(HeaderReader& reader, const unsigned char* header, ZipEntry& entry)
+{
+    const std::uint32_t nameLength = read16(header + 26);
+    if (nameLength > MaxNameLength)
+        return ZipNameTooLong;
+    if (!readName(reader, nameLength, entry.name))
+        return ZipNameCutShort;
+
+    entry.method = read16(header + 8);
+    entry.crc32 = read32(header + 14);
+    entry.compressedSize = read32(header + 18);
+    entry.uncompressedSize = read32(header + 22);
+    const bool sizesKnown =
+        entry.crc32 != 0 || entry.compressedSize != 0 || entry.uncompressedSize != 0;
+    if (!sizesKnown && (read16(header + 6) & SizesFollowData) != 0)
+        return ZipUnknownEntrySize;
+
+    if (!reader.skip(read16(header + 28)))
+        return ZipCannotSkipExtra;
+    entry.dataOffset = static_cast<std::uint32_t>(reader.position());
+    return reader.skip(entry.compressedSize) ? ZipOk : ZipCannotSkipData;
+}
+
+/// Walks the local headers from the start of the file to the first central header.
+int scanLocalHeaders(HeaderReader& reader, std::vector<ZipEntry>& entries)
+{
+    (void)reader.seek(0); // cannot fail
+    for (;;) {
+        unsigned char header[LocalHeaderSize];
+        if (!reader.read(header, sizeof header))
+            return ZipEndOfFile;
+        if (hasSignature(header, 1, 2))
+            return ZipOk;
+        if (!hasSignature(header, 3, 4))
+            return ZipUnknownRecord;
+
+        ZipEntry entry;
+        const int code = scanLocalHeader(reader, header, entry);
+        if (code != ZipOk)
+            return code;
+        entries.push_back(std::move(entry));
+    }
+}
+
+} // namespace
+
+X__StoredInputStream::X__StoredInputStream(ScopedFd file, std::uint32_t size)
+    : file_(std::move(file)), remaining_(static_cast<std::int32_t>(size))
+{
+}
+
+int X__StoredInputStream::read()
+{
+    unsigned char byte = 0;
+    if (readUpTo(file_.get(), &byte, 1) != 1)
+        return -1;
+    --remaining_;
+    return byte;
+}
+
+int X__StoredInputStream::read(char* buf, int len)
+{
+    const std::int32_t wanted = std::min(len, remaining_);
+    if (wanted <= 0)
+        return 0;
+    const auto count =
+        static_cast<std::int32_t>(readUpTo(file_.get(), buf, static_cast<std::size_t>(wanted)));
+    remaining_ -= count;
+    return count;
+}
+
+int X__StoredInputStream::available()
+{
+    return remaining_;
+}
+
+X__DeflatedInputStream::X__DeflatedInputStream(ScopedFd file, std::uint32_t compressedSize,
+                                               std::uint32_t uncompressedSize)
+    : file_(std::move(file)), compressedRemaining_(compressedSize), available_(uncompressedSize)
+{
+    inflate_.next_in = input_;
+    (void)inflateInit2(&inflate_, -15); // raw data; if it fails, the first inflate tells
+}
+
+X__DeflatedInputStream::~X__DeflatedInputStream()
+{
+    (void)inflateEnd(&inflate_);
+}
+
+int X__DeflatedInputStream::read()
+{
+    char c = 0;
+    if (read(&c, 1) != 1)
+        return -1;
+    return static_cast<signed char>(c);
+}
+
+/// Reads compressed bytes ahead; false when none are left.
+bool X__DeflatedInputStream::refill()
+{
+    const std::size_t wanted = std::min<std::size_t>(sizeof input_, compressedRemaining_);
+    const std::size_t count = readUpTo(file_.get(), input_, wanted);
+    compressedRemaining_ -= static_cast<std::uint32_t>(count);
+    inflate_.next_in = input_;
+    inflate_.avail_in = static_cast<uInt>(count);
+    return count != 0;
+}
+
+int X__DeflatedInputStream::markExhausted()
+{
+    status_ = Z_STREAM_ERROR;
+    available_ = 0;
+    return 0;
+}
+
+int X__DeflatedInputStream::read(char* buf, int len)
+{
+    if (!file_.isOpen())
+        return 0;
+
+    if (len > 0) {
+        inflate_.next_out = reinterpret_cast<Bytef*>(buf);
+        inflate_.avail_out = static_cast<uInt>(len);
+        while (status_ == Z_OK && inflate_.avail_out != 0) {
+            const bool dry = inflate_.avail_in == 0 && !refill();
+            // Also without input: inflate may hold output that did not fit the previous block.
+            status_ = inflate(&inflate_, Z_NO_FLUSH);
+            if (dry && status_ == Z_BUF_ERROR)
+                return markExhausted();
+        }
+    }
+
+    if (status_ != Z_OK && status_ != Z_STREAM_END) {
+        available_ = 0;
+        return 0;
+    }
+
+    // Deliberate: with `len` 0 or below this counts the room that the previous call left, and an
+    // entry that inflates to more than its recorded size ends the program.
+    const auto result = static_cast<int>(static_cast<unsigned>(len) - inflate_.avail_out);
+    if (!(available_ >= static_cast<unsigned>(result)))
+        __assert_fail("available_ >= (unsigned) result", "zip_file", 432,
+                      "virtual int X__DeflatedInputStream::read(char*, int)");
+    available_ -= static_cast<unsigned>(result);
+    return result;
+}
+
+int X__DeflatedInputStream::available()
+{
+    return static_cast<std::int32_t>(available_);
+}
+
+ZipFile::ZipFile(const char* path) : path_(path == nullptr ? "" : path)
+{
+    (void)readDirectory(path, entries_); // an empty list tells
+}
+
+const ZipEntry* ZipFile::findEntry(const std::string& name) const
+{
+    const auto found = std::find_if(entries_.begin(), entries_.end(),
+                                    [&](const ZipEntry& entry) { return entry.name == name; });
+    return found == entries_.end() ? nullptr : &*found;
+}
+
+InputStream* ZipFile::getInputStream(const ZipEntry* entry) const
+{
+    if (entry == nullptr || entry->compressedSize == 0 || entry->uncompressedSize == 0)
+        return nullptr;
+
+    ScopedFd file = openArchive(path_.c_str());
+    if (!file.isOpen())
+        return nullptr;
+    // A seek that fails is not looked at: the stream then starts at the archive's first byte.
+    if (entry->dataOffset < SeekLimit)
+        (void)::lseek(file.get(), entry->dataOffset, SEEK_SET);
+
+    switch (entry->method) {
+    case 0:
+        return new X__StoredInputStream(std::move(file), entry->uncompressedSize);
+    case 8:
+        return new X__DeflatedInputStream(std::move(file), entry->compressedSize,
+                                          entry->uncompressedSize);
+    default:
+        return nullptr;
+    }
+}
+
+int ZipFile::readDirectory(const char* path, std::vector<ZipEntry>& entries)
+{
+    if (path == nullptr)
+        return ZipCannotOpen;
+    const ScopedFd file = openArchive(path);
+    if (!file.isOpen())
+        return ZipCannotOpen;
+
+    entries.clear();
+    HeaderReader reader(file.get());
+    if (readCentralDirectory(reader, entries) && !entries.empty())
+        return ZipOk;
+
+    entries.clear();
+    const int code = scanLocalHeaders(reader, entries);
+    if (code != ZipOk)
+        entries.clear();
+    return code;
+}
+
+int ZipFile::validate(const char* path)
+{
+    std::vector<ZipEntry> discarded;
+    return readDirectory(path, discarded);
+}
