@@ -1,0 +1,199 @@
+#include "file_operations.h"
+
+#include "paths.h"
+#include "scoped.h"
+
+#include <cerrno>
+#include <cstdio>
+#include <memory>
+
+#include <fcntl.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+namespace {
+
+constexpr mode_t NewFileMode = 0666;
+constexpr mode_t NewDirectoryMode = 0777;
+constexpr int CopyBlockSize = 4096;
+constexpr int ExtractBlockSize = 8192;
+
+ScopedFd openForWriting(const std::string& path)
+{
+    return ScopedFd(open(path.c_str(), O_WRONLY | O_CREAT | O_TRUNC | O_CLOEXEC, NewFileMode));
+}
+
+/// Writes all of `data`; returns 0 or the code of the failed write.
+int writeAll(int fd, const char* data, std::size_t size)
+{
+    while (size != 0) {
+        const ssize_t count = write(fd, data, size);
+        if (count <= 0)
+            return writeErrorCode(count < 0 ? errno : EIO);
+        data += count;
+        size -= static_cast<std::size_t>(count);
+    }
+    return FileOk;
+}
+
+/// Closes a file that was written: a file system may tell only now that the last block failed.
+int closeWritten(ScopedFd& file)
+{
+    return close(file.release()) == 0 ? FileOk : writeErrorCode(errno);
+}
+
+int copyContent(int source, int destination)
+{
+    char block[CopyBlockSize];
+    for (;;) {
+        const ssize_t count = read(source, block, sizeof block);
+        if (count < 0)
+            return CannotRead;
+        if (count == 0)
+            return FileOk;
+        const int code = writeAll(destination, block, static_cast<std::size_t>(count));
+        if (code != FileOk)
+            return code;
+    }
+}
+
+int writeContent(InputStream& stream, int destination)
+{
+    char block[ExtractBlockSize];
+    for (;;) {
+        const int count = stream.read(block, sizeof block);
+        if (count < 0)
+            return CannotRead;
+        if (count == 0)
+            return FileOk;
+        const int code = writeAll(destination, block, static_cast<std::size_t>(count));
+        if (code != FileOk)
+            return code;
+    }
+}
+
+int createIfMissing(FileTransaction& transaction, const std::string& path, mode_t mode)
+{
+    if (path.empty() || pathExists(path))
+        return FileOk;
+    if (makeDirectory(path, mode) != 0)
+        return CannotCreateDirectory;
+    record(transaction, DirectoryCreated, path);
+    return FileOk;
+}
+
+} // namespace
+
+int copyFile(const std::string& source, const std::string& destination)
+{
+    const ScopedFd in(open(source.c_str(), O_RDONLY | O_CLOEXEC));
+    if (!in.isOpen())
+        return CannotOpenForReading;
+    ScopedFd out = openForWriting(destination);
+    if (!out.isOpen())
+        return CannotOpenForWriting;
+
+    const int code = copyContent(in.get(), out.get());
+    return code != FileOk ? code : closeWritten(out);
+}
+
+int backupFile(FileTransaction& transaction, const std::string& path)
+{
+    if (!transaction.backup || !pathExists(path))
+        return FileOk;
+
+    const std::string backup = backupName(path);
+    (void)unlink(backup.c_str()); // of an older run; if it stays, the rename tells
+    if (std::rename(path.c_str(), backup.c_str()) != 0)
+        return CannotRename;
+
+    // Only now: an entry without its backup would have nothing to restore.
+    record(transaction, BackedUp, path);
+    return FileOk;
+}
+
+int backupCopy(FileTransaction& transaction, const std::string& path)
+{
+    const std::string backup = backupName(path);
+    const int code = copyFile(path, backup);
+    if (code != FileOk) {
+        (void)unlink(backup.c_str()); // a partial copy restores nothing
+        return code;
+    }
+    record(transaction, BackedUp, path);
+    record(transaction, Created, path);
+    return FileOk;
+}
+
+int extractFile(FileTransaction& transaction, const ZipFile& archive, const ZipEntry& entry,
+                const std::string& destination, mode_t mode)
+{
+    const std::unique_ptr<InputStream> stream(archive.getInputStream(&entry));
+    if (!stream)
+        return CannotOpenForReading;
+    const int backedUp = backupFile(transaction, destination);
+    if (backedUp != FileOk)
+        return backedUp;
+
+    ScopedFd file = openForWriting(destination);
+    if (!file.isOpen())
+        return CannotOpenForWriting;
+    record(transaction, Created, destination); // before its first byte: a rollback finds it
+
+    const int code = writeContent(*stream, file.get());
+    if (code != FileOk)
+        return code;
+    if (mode != 0)
+        (void)fchmod(file.get(), mode); // the content is what counts
+    return closeWritten(file);
+}
+
+int copyFileWithBackup(FileTransaction& transaction, const std::string& source,
+                       const std::string& destination)
+{
+    const int backedUp = backupFile(transaction, destination);
+    if (backedUp != FileOk)
+        return backedUp;
+    const int code = copyFile(source, destination);
+    if (code != FileOk)
+        return code;
+    record(transaction, Created, destination);
+    return FileOk;
+}
+
+int setFileMode(FileTransaction& /*transaction*/, const std::string& path, mode_t mode)
+{
+    return chmod(path.c_str(), mode) == 0 ? FileOk : CannotChangeMode;
+}
+
+int makeDirectory(const std::string& path, mode_t mode)
+{
+    return mkdir(path.c_str(), mode != 0 ? mode : NewDirectoryMode);
+}
+
+int removeDirectory(const std::string& path)
+{
+    return rmdir(path.c_str());
+}
+
+int createPath(FileTransaction& transaction, const std::string& path, mode_t mode)
+{
+    // Shallowest first, so that a rollback removes the deepest first.
+    for (std::size_t slash = path.find('/'); slash != std::string::npos;
+         slash = path.find('/', slash + 1)) {
+        const int code = createIfMissing(transaction, path.substr(0, slash), mode);
+        if (code != FileOk)
+            return code;
+    }
+    return FileOk;
+}
+
+int createFullPath(FileTransaction& transaction, const std::string& path, mode_t mode, int* counter)
+{
+    if (counter != nullptr)
+        *counter = 0;
+    const int code = createPath(transaction, path, mode);
+    if (code != FileOk || path.empty() || endsWithSlash(path))
+        return code;
+    return createIfMissing(transaction, path, mode);
+}

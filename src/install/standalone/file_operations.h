@@ -1,0 +1,71 @@
+// The primitives through which an installation changes the disk.
+//
+// Each returns a code of file_codes.h and prints nothing. What it changed stands in the journal, so
+// a caller that sees a failure only returns it. A primitive that fails before its journal entry
+// leaves no entry; a partial file of such a one stays. Permission changes are not journalled.
+// Directories and files get their mode under the process umask; the caller sets that.
+#pragma once
+
+#include "file_codes.h"
+#include "transaction.h"
+#include "zip_file.h"
+
+#include <string>
+
+#include <sys/types.h>
+
+/// Copies a file; the destination is created or truncated. Nothing is journalled.
+///
+/// Returns 0, CannotOpenForReading (1, the destination is not touched), CannotOpenForWriting (2),
+/// CannotRead (4), or the code of a failed write (5, 6, 7). A failed copy leaves what was written.
+[[nodiscard]] int copyFile(const std::string& source, const std::string& destination);
+
+/// Moves what lies at `path` to its backup name and journals that; an older backup is deleted.
+///
+/// Does nothing when the transaction keeps no backups or nothing exists there. Afterwards nothing
+/// lies at `path`. Returns 0 or CannotRename (9).
+[[nodiscard]] int backupFile(FileTransaction& transaction, const std::string& path);
+
+/// Copies the file at `path` to its backup name, for a caller that overwrites it next: journals the
+/// backup and then `path` as created. Does not look at the transaction's backup flag.
+///
+/// Returns 0 or the code of copyFile(); the backup name is then deleted.
+[[nodiscard]] int backupCopy(FileTransaction& transaction, const std::string& path);
+
+/// Writes `entry` of `archive` to `destination`, whose old content is backed up, and gives it
+/// exactly `mode` unless that is 0. The directory must exist.
+///
+/// Returns 0; CannotOpenForReading (1) when the entry has no stream: nothing was done then; 9 when
+/// the old content cannot be moved; 2; 4; or the code of a failed write (5, 6, 7).
+[[nodiscard]] int extractFile(FileTransaction& transaction, const ZipFile& archive,
+                              const ZipEntry& entry, const std::string& destination, mode_t mode);
+
+/// Copies a file over `destination`, whose old content is backed up. No flow calls it.
+///
+/// Returns 0, CannotRename (9) or the code of copyFile(); a partly written destination has no
+/// journal entry then.
+[[nodiscard]] int copyFileWithBackup(FileTransaction& transaction, const std::string& source,
+                                     const std::string& destination);
+
+/// Sets the permission bits of `path`. Returns 0 or CannotChangeMode (13).
+///
+/// The transaction is part of the interface of all primitives; a rollback does not undo this.
+[[nodiscard]] int setFileMode(FileTransaction& transaction, const std::string& path, mode_t mode);
+
+/// Creates one directory, with 0777 when `mode` is 0. Returns 0, or -1 with `errno`.
+[[nodiscard]] int makeDirectory(const std::string& path, mode_t mode);
+
+/// Removes an empty directory. Returns 0, or -1 with `errno`.
+int removeDirectory(const std::string& path);
+
+/// Creates and journals every missing directory named before the last "/" of `path`.
+///
+/// What exists, of whatever kind, is passed over. Returns 0 or CannotCreateDirectory (11).
+[[nodiscard]] int createPath(FileTransaction& transaction, const std::string& path, mode_t mode);
+
+/// As createPath(), with the last component as well.
+///
+/// `counter` may be null. Deliberate: it is set to 0 and never raised; whoever needs to know what
+/// was created reads the journal.
+[[nodiscard]] int createFullPath(FileTransaction& transaction, const std::string& path, mode_t mode,
+                                 int* counter);

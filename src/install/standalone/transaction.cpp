@@ -1,0 +1,141 @@
+#include "transaction.h"
+
+#include "file_codes.h"
+#include "paths.h"
+#include "scoped.h"
+#include "text.h"
+
+#include <algorithm>
+#include <cstdio>
+
+#include <unistd.h>
+
+namespace {
+
+char letterOf(int kind)
+{
+    switch (kind) {
+    case BackedUp:
+        return 'B';
+    case Created:
+        return 'C';
+    case DirectoryCreated:
+        return 'D';
+    default:
+        return ' ';
+    }
+}
+
+/// The kind behind a letter of a saved journal; 0 for a letter that it never holds.
+int kindOf(char letter)
+{
+    switch (letter) {
+    case 'B':
+        return BackedUp;
+    case 'C':
+        return Created;
+    case 'D':
+        return DirectoryCreated;
+    default:
+        return 0;
+    }
+}
+
+void undo(const JournalEntry& entry)
+{
+    const char* const path = entry.path.c_str();
+    switch (entry.kind) {
+    case BackedUp:
+        (void)std::rename(backupName(entry.path).c_str(), path); // left where it is otherwise
+        break;
+    case Created:
+        (void)unlink(path);
+        break;
+    case DirectoryCreated:
+        (void)rmdir(path); // stays while it holds what no entry recorded
+        break;
+    default:
+        break;
+    }
+}
+
+} // namespace
+
+void record(FileTransaction& transaction, int kind, const std::string& path)
+{
+    transaction.journal.push_back({kind, path});
+}
+
+int commit(FileTransaction& transaction)
+{
+    const auto& journal = transaction.journal;
+    for (auto entry = journal.rbegin(); entry != journal.rend(); ++entry) {
+        if (entry->kind == BackedUp)
+            (void)unlink(backupName(entry->path).c_str()); // left where it is otherwise
+    }
+    transaction.journal.clear();
+    return FileOk;
+}
+
+int rollback(FileTransaction& transaction)
+{
+    const auto& journal = transaction.journal;
+    std::for_each(journal.rbegin(), journal.rend(), undo);
+    transaction.journal.clear();
+    return FileOk;
+}
+
+int saveJournal(const FileTransaction& transaction, const std::string& path)
+{
+    const ScopedFile file(std::fopen(path.c_str(), "w"));
+    if (!file)
+        return CannotOpenForWriting;
+    for (const JournalEntry& entry : transaction.journal)
+        (void)std::fprintf(file.get(), "%c %s\n", letterOf(entry.kind), entry.path.c_str());
+    return FileOk;
+}
+
+int loadJournal(FileTransaction& transaction, const std::string& path)
+{
+    transaction.journal.clear();
+    const ScopedFile file(std::fopen(path.c_str(), "r"));
+    if (!file)
+        return CannotOpenForReading;
+
+    std::string line;
+    while (readLine(file.get(), line)) {
+        const int kind = line.size() < 3 ? 0 : kindOf(line[0]);
+        if (kind == 0)
+            return CannotRead;
+        record(transaction, kind, line.substr(2));
+    }
+    return std::ferror(file.get()) == 0 ? FileOk : CannotRead;
+}
+
+void setVariable(FileTransaction& transaction, const std::string& name, const std::string& value)
+{
+    for (auto& [knownName, knownValue] : transaction.variables) {
+        if (knownName == name) {
+            knownValue = value;
+            return;
+        }
+    }
+    transaction.variables.emplace_back(name, value);
+}
+
+std::string getVariable(const FileTransaction& transaction, const std::string& name)
+{
+    for (const auto& [knownName, value] : transaction.variables) {
+        if (knownName == name)
+            return value;
+    }
+    return {};
+}
+
+int substituteVariables(const FileTransaction& transaction, std::string& text)
+{
+    int count = 0;
+    for (const auto& [name, value] : transaction.variables)
+        count += replaceEach(text, std::string(VariablePrefix) + name, value);
+    return count;
+}

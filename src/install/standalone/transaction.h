@@ -1,0 +1,67 @@
+// The journal of a run: what was changed, so that it can be committed or undone.
+//
+// Every operation that changes the disk appends what it did, oldest first. commit() deletes the
+// backups, rollback() undoes the changes, newest first, so that files go before their directories
+// and a file that was backed up and rewritten is first deleted and then restored. The journal lives
+// in memory: when the process dies, the backups stay beside the files.
+#pragma once
+
+#include <string>
+#include <string_view>
+#include <utility>
+#include <vector>
+
+/// Kinds of journal entries. The numbers are fixed; 3 does not exist.
+enum JournalKind : int {
+    BackedUp = 1,         ///< the path's previous content lies at its backup name
+    Created = 2,          ///< the path is a file that this run wrote
+    DirectoryCreated = 4, ///< the path is a directory that this run made
+};
+
+struct JournalEntry {
+    int kind = 0; ///< a JournalKind; others are skipped by commit and rollback
+    std::string path;
+};
+
+/// The state of one run; owned by the driver, passed by reference to every file operation.
+///
+/// Dropped without commit or rollback it leaves the disk as it is.
+struct FileTransaction {
+    bool backup = true;     ///< keep what is replaced under its backup name
+    bool journalled = true; ///< set together with `backup`; nothing reads it
+    std::vector<JournalEntry> journal;
+    std::vector<std::pair<std::string, std::string>> variables; ///< name and value
+};
+
+/// Stands before the name of a variable in a text.
+inline constexpr std::string_view VariablePrefix = "$";
+
+/// Appends an entry to the journal.
+void record(FileTransaction& transaction, int kind, const std::string& path);
+
+/// Deletes every backup and empties the journal. Failures are ignored; returns 0.
+int commit(FileTransaction& transaction);
+
+/// Undoes every change, newest first, and empties the journal. Failures are ignored: a directory
+/// that is not empty stays, a backup that cannot be moved stays. Returns 0.
+int rollback(FileTransaction& transaction);
+
+/// Writes the journal to the file at `path`: per entry a letter ("B", "C", "D", a blank for an
+/// unknown kind), a blank and the path. Returns 0, or CannotOpenForWriting (2). No flow calls it.
+[[nodiscard]] int saveJournal(const FileTransaction& transaction, const std::string& path);
+
+/// Replaces the journal by what saveJournal() wrote to `path`. Returns 0, CannotOpenForReading (1)
+/// with an empty journal, or CannotRead (4) at a malformed line or a failed read: the entries
+/// before it stay. No flow calls it.
+[[nodiscard]] int loadJournal(FileTransaction& transaction, const std::string& path);
+
+/// Sets the variable `name`, a new one behind the others. No flow calls it.
+void setVariable(FileTransaction& transaction, const std::string& name, const std::string& value);
+
+/// The value of the variable `name`; empty when there is none. No flow calls it.
+[[nodiscard]] std::string getVariable(const FileTransaction& transaction, const std::string& name);
+
+/// Replaces every "$" + name in `text` by the variable's value, variable by variable, each time
+/// searching from the start of the text again; returns the number of replacements. A value must not
+/// contain "$" + its own name: that would never end. No flow calls it.
+int substituteVariables(const FileTransaction& transaction, std::string& text);
