@@ -1,0 +1,136 @@
+#include "property_file.h"
+
+#include "scoped.h"
+#include "settings.h"
+#include "text.h"
+
+#include <cerrno>
+#include <cstdio>
+#include <cstring>
+#include <iostream>
+
+namespace {
+
+void logFailure(const char* doing, const std::string& path, int error)
+{
+    *logstream << doing << " file " << path << " error: " << error << " (" << std::strerror(error)
+               << ")\n";
+}
+
+bool contains(const std::string& text, const std::string& fragment)
+{
+    return text.find(fragment) != std::string::npos;
+}
+
+int readLines(const std::string& path, std::vector<std::string>& lines)
+{
+    const ScopedFile file(std::fopen(path.c_str(), "r"));
+    if (!file)
+        return errno;
+    std::string line;
+    while (readLine(file.get(), line))
+        lines.push_back(line);
+    // Half a file, taken for whole, would be saved over the whole one.
+    return std::ferror(file.get()) != 0 ? errno : 0;
+}
+
+} // namespace
+
+int PropertyFile::load(const std::string& path)
+{
+    lines.clear();
+    const int error = readLines(path, lines);
+    if (error != 0) {
+        lines.clear();
+        logFailure("Loading", path, error);
+    }
+    return error;
+}
+
+int PropertyFile::save(const std::string& path) const
+{
+    const ScopedFile file(std::fopen(path.c_str(), "w"));
+    if (!file) {
+        const int error = errno;
+        logFailure("Saving", path, error);
+        return error;
+    }
+    for (const std::string& line : lines) {
+        (void)std::fwrite(line.data(), 1, line.size(), file.get());
+        (void)std::fputc('\n', file.get());
+        (void)std::fflush(file.get());
+    }
+    return 0;
+}
+
+std::string PropertyFile::getValue(const std::string& key) const
+{
+    for (const std::string& line : lines) {
+        if (!contains(line, "=") || keyOfLine(line) != key)
+            continue;
+        std::string value = textAfterEquals(line);
+        trim(value);
+        return value;
+    }
+    return {};
+}
+
+std::string* PropertyFile::findLine(const std::string& key)
+{
+    for (auto line = lines.rbegin(); line != lines.rend(); ++line) {
+        if (keyOfLine(*line) == key)
+            return &*line;
+    }
+    return nullptr;
+}
+
+int PropertyFile::setValue(const std::string& key, const std::string& value)
+{
+    int count = 0;
+    for (std::string& line : lines) {
+        if (keyOfLine(line) != key)
+            continue;
+        line = key + "=" + value;
+        ++count;
+    }
+    return count;
+}
+
+int PropertyFile::setValueWhereKeyContains(const std::string& fragment, const std::string& value)
+{
+    int count = 0;
+    for (std::string& line : lines) {
+        const std::string key = keyOfLine(line);
+        if (!contains(key, fragment))
+            continue;
+        line = key + "=" + value;
+        ++count;
+    }
+    return count;
+}
+
+int PropertyFile::clearWhereKeyContains(const std::string& fragment)
+{
+    int count = 0;
+    for (std::string& line : lines) {
+        if (!contains(keyOfLine(line), fragment))
+            continue;
+        line.clear();
+        ++count;
+    }
+    return count;
+}
+
+int PropertyFile::replaceText(const std::string& old, const std::string& replacement)
+{
+    int count = 0;
+    for (std::string& line : lines)
+        count += replaceEach(line, old, replacement);
+    return count;
+}
+
+void PropertyFile::dump() const
+{
+    for (const std::string& line : lines)
+        std::cout << line << '\n';
+}

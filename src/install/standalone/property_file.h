@@ -1,0 +1,49 @@
+// Property files: text files of key=value lines, held as the list of their lines.
+//
+// Every operation works on the lines in place, so comments, blank lines, order and unknown keys
+// survive a load and save untouched. The key of a line is the text before its first "=", trimmed;
+// its value the text after it, trimmed; keys are compared exactly. For findLine() and the
+// operations that set or clear, a line without "=" is a key as a whole. Files have a few hundred
+// lines, so every operation is a plain scan.
+#pragma once
+
+#include <string>
+#include <vector>
+
+struct PropertyFile {
+    std::vector<std::string> lines; ///< without their newlines, otherwise as read
+
+    /// Replaces `lines` by those of the file at `path`. Returns 0, or the `errno` of what failed,
+    /// with a line about it on `logstream`; no lines are held then.
+    [[nodiscard]] int load(const std::string& path);
+
+    /// Writes the lines to the file at `path`, each with a newline. Returns 0, or the `errno` of
+    /// the failed open, with a line about it on `logstream`.
+    ///
+    /// Deliberate: a failing write is not detected.
+    [[nodiscard]] int save(const std::string& path) const;
+
+    /// The value of the first line with "=" whose key is `key`; empty when there is none.
+    [[nodiscard]] std::string getValue(const std::string& key) const;
+
+    /// The last line whose key is `key`, or null. It belongs to `lines`.
+    [[nodiscard]] std::string* findLine(const std::string& key);
+
+    /// Makes every line whose key is `key` into `key`=`value`; returns their number. A missing line
+    /// is not added.
+    int setValue(const std::string& key, const std::string& value);
+
+    /// As setValue(), for every line whose key contains `fragment`; each keeps its own key.
+    int setValueWhereKeyContains(const std::string& fragment, const std::string& value);
+
+    /// Empties every line whose key contains `fragment`; returns their number. The lines stay, as
+    /// empty ones.
+    int clearWhereKeyContains(const std::string& fragment);
+
+    /// Replaces `old` by `replacement` in every line, as replaceEach() of text.h does; returns the
+    /// number of replacements.
+    int replaceText(const std::string& old, const std::string& replacement);
+
+    /// Prints the lines on standard output. A diagnostic aid; no flow calls it.
+    void dump() const;
+};
