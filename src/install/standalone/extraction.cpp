@@ -1,0 +1,175 @@
+#include "extraction.h"
+
+#include "file_operations.h"
+#include "install_log.h"
+#include "paths.h"
+#include "registry.h"
+#include "scoped.h"
+#include "settings.h"
+#include "text.h"
+#include "zip_file.h"
+
+#include <iostream>
+#include <set>
+
+#include <unistd.h>
+
+namespace {
+
+constexpr mode_t PublicMode = 0755;
+constexpr mode_t InstallDirMode = 0750; // the one package directory that not everybody reads
+
+void trace(bool debug, const char* what, const std::string& value)
+{
+    if (debug)
+        std::cout << what << value << '\n';
+}
+
+std::string sourcePrefix(const std::string& subdir)
+{
+    return spbFileRoot + subdir + "/";
+}
+
+/// `dstDir` and `rest`, without two slashes in a row.
+std::string destinationName(const std::string& dstDir, const std::string& rest)
+{
+    std::string name = dstDir + "/" + rest;
+    for (std::size_t at = name.find("//"); at != std::string::npos; at = name.find("//", at))
+        name.erase(at, 1);
+    return name;
+}
+
+/// Extracts one entry to `destination`, which tells by its last character what it is.
+int extractEntry(FileTransaction& transaction, const ZipFile& archive, const ZipEntry& entry,
+                 const std::string& destination, mode_t mode, std::FILE* logFile, bool debug)
+{
+    if (endsWithSlash(destination)) {
+        trace(debug, "createPath: ", destination);
+        return createPath(transaction, destination, mode);
+    }
+
+    trace(debug, "extractFile: ", destination);
+    const int code = extractFile(transaction, archive, entry, destination, mode);
+    if (logFile != nullptr) // also after a failure: part of the file may lie there
+        (void)std::fprintf(logFile, "%s\n", destination.c_str());
+    return code;
+}
+
+/// Extracts "config", on an upgrade without the main property file. Never traces.
+int extractConfigs(FileTransaction& transaction, const ZipFile& archive, const std::string& home,
+                   bool freshInstall)
+{
+    const std::string prefix = sourcePrefix(spbCfgDir);
+    const std::string destination = joinPath(home, spbCfgDir);
+    std::string skipList;
+    if (!freshInstall)
+        appendToNameList(skipList, prefix + zorProps);
+
+    *logstream << "Extracting configs to '" << destination << "'\n";
+    return extractEntries(transaction, archive, prefix, destination, PublicMode, &skipList,
+                          zor_file_handle, false);
+}
+
+/// Extracts the package directories in their order; returns the first failing code.
+int extractDirs(FileTransaction& transaction, const ZipFile& archive, const std::string& home,
+                bool freshInstall)
+{
+    const ScopedUmask mask(globalFilesUmask);
+    const auto extract = [&](const std::string& subdir, mode_t mode) {
+        return extractDir(transaction, archive, home, subdir, mode, zor_file_handle, debugMode);
+    };
+
+    int code = extract(spbBinDir, PublicMode);
+    if (code != FileOk)
+        *logstream << "Bin dir file extraction failed\n";
+    if (code == FileOk)
+        code = extract(spbPropertiesDir, PublicMode);
+    if (code == FileOk)
+        code = extractConfigs(transaction, archive, home, freshInstall);
+    // Deliberate: the step above has extracted these already; the second pass backs up and lists
+    // them once more.
+    if (code == FileOk)
+        code = extract(joinPath(spbCfgDir, spbCfgXssDir), PublicMode);
+    if (code == FileOk)
+        code = extract(auxDirInstall, InstallDirMode);
+    return code;
+}
+
+} // namespace
+
+int extractPackage(const std::string& spbPath, FileTransaction& transaction,
+                   InstallRegistry& installation, bool freshInstall, const std::string* logPath)
+{
+    *logstream << "Starting file extraction...\n" << std::flush; // a damaged entry may end the run
+    const ZipFile archive(spbPath.c_str());
+    if (archive.entries().empty()) {
+        *logstream << "*** Error: package not found or not valid.\n";
+        return CannotOpenForReading;
+    }
+
+    std::set<std::string> files;
+    if (logPath != nullptr) {
+        readFileIndex(*logPath, files); // of earlier installations
+        openTransientIndex(transaction, *logPath);
+    }
+
+    const int code = extractDirs(transaction, archive, installation.homeDirectory, freshInstall);
+
+    closeTransientIndex();
+    if (logPath != nullptr) {
+        const ScopedUmask mask(globalFilesUmask);
+        readFileIndex(*logPath, files);
+        addInstallerFiles(installation, files);
+        writeFileIndex(*logPath, files);
+    }
+    if (code != FileOk) {
+        *logstream << "File extraction failed, error = " << code << " ("
+                   << fileErrorText(static_cast<unsigned>(code)) << ")\n";
+        if (logPath != nullptr)
+            (void)unlink(logPath->c_str()); // it lists what the rollback takes away
+    }
+    return code;
+}
+
+int extractDir(FileTransaction& transaction, const ZipFile& archive, const std::string& targetDir,
+               const std::string& subdir, mode_t mode, std::FILE* logFile, bool debug)
+{
+    return extractEntries(transaction, archive, sourcePrefix(subdir), joinPath(targetDir, subdir),
+                          mode, nullptr, logFile, debug);
+}
+
+int extractEntries(FileTransaction& transaction, const ZipFile& archive,
+                   const std::string& srcPrefix, const std::string& dstDir, mode_t mode,
+                   const std::string* skipList, std::FILE* logFile, bool debug)
+{
+    trace(debug, "Src path: ", srcPrefix);
+    trace(debug, "Dst path: ", dstDir);
+    trace(debug, "Mode: ", std::to_string(mode));
+
+    for (const ZipEntry& entry : archive.entries()) {
+        if (skipList != nullptr && nameListContains(*skipList, entry.name)) {
+            trace(debug, "Skip: ", entry.name);
+            continue;
+        }
+        if (debug)
+            std::cout << "Looking at file " << entry.name << " inside spb\n";
+        if (!entry.name.starts_with(srcPrefix))
+            continue;
+
+        const std::string destination =
+            destinationName(dstDir, entry.name.substr(srcPrefix.size()));
+        trace(debug, "dstName: ", destination);
+        if (destination.size() <= 1) {
+            trace(debug, "Skipping dstName: ", destination);
+            continue;
+        }
+
+        const int code =
+            extractEntry(transaction, archive, entry, destination, mode, logFile, debug);
+        if (code != FileOk) {
+            trace(debug, "createPath or extractFile failed", "");
+            return code;
+        }
+    }
+    return FileOk;
+}

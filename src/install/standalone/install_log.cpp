@@ -1,0 +1,122 @@
+#include "install_log.h"
+
+#include "build_stamp.h"
+#include "file_operations.h"
+#include "paths.h"
+#include "registry.h"
+#include "scoped.h"
+#include "settings.h"
+#include "text.h"
+#include "time_stamps.h"
+
+#include <cstdio>
+#include <ostream>
+
+#include <fcntl.h>
+
+namespace {
+
+constexpr const char* SingleUserFlagName = "SingleUserMode";
+constexpr mode_t IndexDirectoryMode = 0755;
+constexpr mode_t IndexFileMode = 0644;
+
+std::string singleUserFlagPath(const std::string& home)
+{
+    return joinPath(joinPath(home, spbCfgDir), SingleUserFlagName);
+}
+
+} // namespace
+
+void readFileIndex(const std::string& path, std::set<std::string>& files)
+{
+    const ScopedFile file(std::fopen(path.c_str(), "r"));
+    if (!file)
+        return;
+    std::string line;
+    while (readLine(file.get(), line)) {
+        if (!line.empty() && line[0] != '#')
+            files.insert(line);
+    }
+}
+
+void addInstallerFiles(const InstallRegistry& registry, std::set<std::string>& files)
+{
+    const std::string& home = registry.homeDirectory;
+    files.insert(joinPath(joinPath(home, spbBinDir), "libzor.so"));
+    files.insert(joinPath(joinPath(home, spbCfgDir), "Zor.tmp"));
+    files.insert(singleUserFlagPath(home));
+    files.insert(joinPath(home, "zor.log"));
+    files.insert(joinPath(home, "zor.log.bak"));
+}
+
+void writeFileIndex(const std::string& path, const std::set<std::string>& files)
+{
+    const ScopedFile file(std::fopen(path.c_str(), "w"));
+    if (!file)
+        return;
+    (void)std::fprintf(file.get(), "# File created by ZOR: %s installed on %s\n", zorBuildStamp,
+                       localTimeStamp().c_str());
+    for (const std::string& line : files) {
+        (void)std::fwrite(line.data(), 1, line.size(), file.get());
+        (void)std::fputc('\n', file.get());
+    }
+}
+
+void refreshFileIndex(const InstallRegistry& registry, const std::string& path)
+{
+    std::set<std::string> files;
+    readFileIndex(path, files);
+    addInstallerFiles(registry, files);
+    writeFileIndex(path, files);
+}
+
+void openTransientIndex(FileTransaction& transaction, const std::string& path)
+{
+    const ScopedUmask mask(globalFilesUmask);
+    (void)createPath(transaction, path, IndexDirectoryMode); // the open tells
+
+    ScopedFd fd(open(path.c_str(), O_RDWR | O_CREAT | O_TRUNC | O_CLOEXEC, IndexFileMode));
+    zor_file_handle = fd.isOpen() ? fdopen(fd.get(), "w") : nullptr;
+    if (zor_file_handle == nullptr) {
+        *logstream << "Warning! Failed to create install log file: " << path << '\n';
+        return;
+    }
+    (void)fd.release(); // the stream owns it now
+    (void)std::fprintf(zor_file_handle, "# File created by ZOR: %s\n", zorBuildStamp);
+}
+
+void closeTransientIndex()
+{
+    if (zor_file_handle == nullptr)
+        return;
+    (void)std::fclose(zor_file_handle); // the final index is written from what arrived
+    zor_file_handle = nullptr;
+}
+
+void detectSingleUserMode(const std::string& home)
+{
+    const ScopedFile flag(std::fopen(singleUserFlagPath(home).c_str(), "r"));
+    if (!flag)
+        return;
+    *logstream << "Single user mode file found\n";
+    enterSingleUserMode();
+}
+
+void createSingleUserModeFlag(FileTransaction& transaction, const std::string& home,
+                              const std::string* indexPath)
+{
+    const ScopedUmask mask(globalFilesUmask);
+    const std::string path = singleUserFlagPath(home);
+    *logstream << "Creating single user mode flag file: " << path << '\n';
+    if (!ScopedFile(std::fopen(path.c_str(), "w"))) {
+        *logstream << "Unable to create single user mode flag file\n";
+        return;
+    }
+    if (indexPath == nullptr)
+        return;
+
+    (void)createPath(transaction, *indexPath, IndexDirectoryMode); // the open tells
+    const ScopedFile index(std::fopen(indexPath->c_str(), "a"));
+    if (index)
+        (void)std::fprintf(index.get(), "%s\n", path.c_str());
+}
