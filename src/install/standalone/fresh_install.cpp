@@ -1,0 +1,165 @@
+#include "fresh_install.h"
+
+#include "common_directory.h"
+#include "environment.h"
+#include "extraction.h"
+#include "file_operations.h"
+#include "install_log.h"
+#include "locations.h"
+#include "paths.h"
+#include "property_file.h"
+#include "registry.h"
+#include "scoped.h"
+#include "settings.h"
+#include "template_variables.h"
+
+#include <cstdio>
+#include <ostream>
+
+namespace {
+
+constexpr mode_t UserCacheDirMode = 0770;
+constexpr mode_t RegistryDirMode = 0755;
+
+int makeSubdirOrSay(FileTransaction& transaction, const std::string& parent,
+                    const std::string& name, mode_t mode)
+{
+    const ScopedUmask mask(globalFilesUmask);
+    const int code = makeSubdir(transaction, parent, name, mode);
+    if (code != FileOk)
+        *logstream << "Cannot create subdir: " << name << '\n';
+    return code;
+}
+
+/// Creates the directories that the package does not carry.
+int createDirectories(FileTransaction& transaction, const std::string& home)
+{
+    const mode_t cacheMode = isRoot() ? CacheDirRootMode : UserCacheDirMode;
+    int code = makeSubdirOrSay(transaction, home, cacheDir, cacheMode);
+    if (code == FileOk)
+        code = makeSubdirOrSay(transaction, joinPath(home, spbBinDir), etcDir, EtcDirMode);
+    if (code != FileOk)
+        return code;
+
+    code = createInstallDir(transaction, home);
+    if (code != 0)
+        *logstream << "Cannot create extra directories!\n";
+    return code;
+}
+
+/// Loads the property file at `path`, lets `edit` change it and saves it; returns 0 or an `errno`.
+template <typename Edit>
+int customize(const std::string& path, Edit edit)
+{
+    *logstream << "Customizing property file: " << path << '\n';
+    PropertyFile file;
+    const int loaded = file.load(path);
+    if (loaded != 0) {
+        *logstream << "Could not load property file\n";
+        return loaded;
+    }
+    edit(file);
+    const int saved = file.save(path);
+    if (saved != 0)
+        *logstream << "Could not save property file\n";
+    return saved;
+}
+
+int customizeProperties(const std::string& home)
+{
+    const std::string config = joinPath(home, spbCfgDir);
+    const int code = customize(joinPath(config, zorProps), [&](PropertyFile& file) {
+        replaceAll(file, tokenZorDestDir, home);
+        replaceAll(file, tokenZorCfgRoot, home);
+        replaceAll(file, tokenFileSeparator, "/");
+        replaceAll(file, tokenScannerMode, fileScannerMode);
+    });
+    if (code != 0)
+        return code;
+    return customize(joinPath(config, traceProps), [&](PropertyFile& file) {
+        replaceAll(file, tokenZorDestDir, home);
+        replaceAll(file, tokenZorCfgRoot, home);
+    });
+}
+
+/// Completes the exploiter list and saves the registry.
+int registerInstallation(FileTransaction& transaction, InstallRegistry& registry)
+{
+    if (skipExploiterRegistration)
+        registry.exploiters.clear();
+    registry.exploiters += ":";
+
+    int code = FileOk;
+    {
+        const ScopedUmask mask(globalFilesUmask);
+        code =
+            createFullPath(transaction, registryDirectory(localInstall), RegistryDirMode, nullptr);
+    }
+    return code != FileOk ? code : saveRegistry(transaction, registry);
+}
+
+/// Records whether the installation is the shared or a per-user one. Not journalled; a failure is
+/// logged only.
+void writeInstallType(const std::string& home, const std::string* indexPath)
+{
+    const ScopedUmask mask(globalFilesUmask);
+    const std::string path = joinPath(home, joinPath(auxDirInstall, installProps));
+    const ScopedFile file(std::fopen(path.c_str(), "w"));
+    const ScopedFile index(indexPath != nullptr ? std::fopen(indexPath->c_str(), "a") : nullptr);
+    if (!file) {
+        *logstream << "Could not create file " << path << '\n';
+        return;
+    }
+
+    const std::string& type = localInstall ? valueInstallLocal : valueInstallGlobal;
+    (void)std::fprintf(file.get(), "%s=%s\n", keyInstallType.c_str(), type.c_str());
+    if (index)
+        (void)std::fprintf(index.get(), "%s\n", path.c_str());
+}
+
+/// The installation up to its last fatal step.
+int installFiles(FileTransaction& transaction, InstallRegistry& registry,
+                 const std::string* indexPath, bool writeRegistry, bool useCustomPath)
+{
+    const std::string& home = registry.homeDirectory;
+    const int extracted = extractPackage(spbPackage, transaction, registry, true, indexPath);
+    (void)setSelinuxContext(home); // also of a part; never fatal
+    if (extracted != FileOk)
+        return extracted;
+
+    int code = createDirectories(transaction, home);
+    if (code == 0)
+        code = customizeProperties(home);
+    if (code != 0)
+        return code;
+
+    updateScripts(home, readCommonDirectory(useCustomPath));
+    if (writeRegistry)
+        code = registerInstallation(transaction, registry);
+    if (code == FileOk)
+        writeInstallType(home, indexPath);
+    return code;
+}
+
+} // namespace
+
+int freshInstall(FileTransaction& transaction, InstallRegistry& registry,
+                 const std::string* indexPath, bool writeRegistry, bool useCustomPath,
+                 const std::string& customPath)
+{
+    const std::string& home = registry.homeDirectory;
+    detectSingleUserMode(home);
+    *logstream << "Performing fresh install on " << home << " (config=" << joinPath(home, spbCfgDir)
+               << ")\n";
+
+    const int code = installFiles(transaction, registry, indexPath, writeRegistry, useCustomPath);
+    if (createSingleUserModeFile) // in every case
+        createSingleUserModeFlag(transaction, home, indexPath);
+    if (code != 0)
+        return code;
+
+    // The shared installation has its traces in the common directory; a user's own goes without.
+    if (localInstall && !useCustomPath)
+        return 0;
+    return updateCommonTracePath(transaction, home, useCustomPath, customPath);
+}

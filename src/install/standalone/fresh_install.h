@@ -1,0 +1,18 @@
+// The fresh installation: the toolkit put where none is registered yet.
+#pragma once
+
+#include <string>
+
+struct FileTransaction;
+struct InstallRegistry;
+
+/// Installs `spbPackage` into the home of `registry`, journalled.
+///
+/// `registry` holds the calling exploiter's identifier without its colon; with `writeRegistry` the
+/// list is completed and the registry saved. `indexPath` is the index of installed files, null for
+/// none. With `useCustomPath` traces go to `customPath`. Returns 0, or the first code met: of a
+/// file operation, an `errno` of a property file, -1 when "install" cannot be made, or the status
+/// of the scanner control program. The caller commits or rolls back.
+[[nodiscard]] int freshInstall(FileTransaction& transaction, InstallRegistry& registry,
+                               const std::string* indexPath, bool writeRegistry, bool useCustomPath,
+                               const std::string& customPath);
