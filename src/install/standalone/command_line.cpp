@@ -1,0 +1,239 @@
+#include "command_line.h"
+
+#include "build_stamp.h"
+#include "settings.h"
+#include "text.h"
+
+#include <cstring>
+#include <fstream>
+#include <iostream>
+#include <string_view>
+
+namespace {
+
+constexpr std::string_view OptionsWithArgument = "dfsoc";
+
+/// The valid providers of the file-system scanner, as a name list.
+std::string providerList()
+{
+    std::string list;
+    for (const char* const name :
+         {"provider_standard", "provider_cache", "provider_cache2", "provider_cache3",
+          "provider_remote_cache", "provider_remote_cache2"})
+        appendToNameList(list, name);
+    return list;
+}
+
+int invalidOption(const std::string& argument)
+{
+    std::cerr << "Invalid option: " << argument << '\n';
+    return printUsage();
+}
+
+/// Makes the file at `path` the log stream. A file that cannot be opened swallows all that follows.
+void redirectLog(const char* path)
+{
+    static std::ofstream file; // lives to the end of the process, which flushes it
+    file.close();
+    file.clear();
+    file.open(path, std::ios::out | std::ios::trunc);
+    logstream = &file;
+}
+
+/// The state of one pass over the options.
+class OptionParser {
+public:
+    OptionParser(int argc, char** argv, CommandLine& commandLine)
+        : argc_(argc), argv_(argv), commandLine_(commandLine), providers_(providerList())
+    {
+    }
+
+    /// Takes every option from the fourth argument on; returns 0 or 1.
+    int run()
+    {
+        for (at_ = 3; at_ < argc_; ++at_) {
+            const int code = takeOption(argv_[at_]);
+            if (code != 0)
+                return code;
+        }
+        return 0;
+    }
+
+    [[nodiscard]] bool destinationGiven() const { return destinationGiven_; }
+    [[nodiscard]] int installTypeChoices() const { return installTypeChoices_; }
+
+private:
+    int takeOption(const std::string& option)
+    {
+        if (option == "-eeo")
+            extended_ = true;
+        else if (option == "-norollback")
+            norollback = true;
+        else if (option.size() != 2 || option[0] != '-')
+            return invalidOption(option);
+        else if (!(extended_ && takeExtended(option[1])) && !takeSwitch(option[1]))
+            return takeOptionWithArgument(option);
+        return 0;
+    }
+
+    /// The options that "-eeo" unlocks; false for any other letter.
+    bool takeExtended(char letter)
+    {
+        switch (letter) {
+        case 'l':
+        case 'g':
+            localInstall = letter == 'l';
+            ++installTypeChoices_;
+            return true;
+        case 'z':
+            ignoreNonFatalErrors = true;
+            return true;
+        default:
+            return false;
+        }
+    }
+
+    /// The options without an argument; false for any other letter.
+    bool takeSwitch(char letter)
+    {
+        switch (letter) {
+        case 'r':
+            enterSingleUserMode();
+            createSingleUserModeFile = true;
+            return true;
+        case 'p':
+            privateMode = true;
+            commandLine_.privateAction = commandLine_.action;
+            return true;
+        case 'n':
+            skipExploiterRegistration = true;
+            return true;
+        case 'v':
+            debugMode = true;
+            return true;
+        default:
+            return false;
+        }
+    }
+
+    int takeOptionWithArgument(const std::string& option)
+    {
+        if (OptionsWithArgument.find(option[1]) == std::string_view::npos)
+            return invalidOption(option);
+        if (at_ + 1 == argc_) {
+            std::cerr << "Missing argument for option: " << option << '\n';
+            return printUsage();
+        }
+        return applyOption(option[1], argv_[++at_]);
+    }
+
+    int applyOption(char letter, const char* value)
+    {
+        switch (letter) {
+        case 's':
+            spbPackage = value;
+            *logstream << "SPB file: " << value << '\n';
+            return 0;
+        case 'd':
+            commandLine_.destDir = commandLine_.privatePath = value;
+            destinationGiven_ = true;
+            *logstream << "Target directory: " << value << '\n';
+            return 0;
+        case 'f':
+            return applyProvider(value);
+        case 'c':
+            new_log_path = value;
+            custom_log_path_available = true;
+            *logstream << "ZOR custom trace path: " << value << '\n';
+            return 0;
+        default: // 'o'
+            redirectLog(value);
+            return 0;
+        }
+    }
+
+    int applyProvider(const char* value)
+    {
+        // Deliberate: a text search, so a value that holds "|" can match across two names.
+        if (!nameListContains(providers_, value)) {
+            *logstream << "Invalid provider specified: " << value << '\n';
+            return printUsage();
+        }
+        fileScannerMode = value;
+        *logstream << "File scanner mode: " << value << '\n';
+        return 0;
+    }
+
+    int argc_;
+    char** argv_;
+    int at_ = 0;
+    CommandLine& commandLine_;
+    std::string providers_;
+    bool extended_ = false;
+    bool destinationGiven_ = false;
+    int installTypeChoices_ = 0;
+};
+
+/// What can be judged only when every option is known.
+int checkOptions(const CommandLine& commandLine, const OptionParser& options)
+{
+    if (privateMode && !options.destinationGiven()) {
+        std::cerr << "For privatePath -d parameter is mandatory\n";
+        return 1;
+    }
+    if (options.installTypeChoices() > 1)
+        *logstream << "Warning: install type has been specified multiple times\n";
+    if (commandLine.action == 'i' && spbPackage.empty()) {
+        *logstream << "Error: an SPB file is required to install or upgrade\n";
+        return printUsage();
+    }
+    return 0;
+}
+
+} // namespace
+
+int parseCommandLine(int argc, char** argv, CommandLine& commandLine)
+{
+    if (argc < 3)
+        return printUsage();
+
+    const std::string_view action = argv[1];
+    if (action != "i" && action != "r") {
+        std::cerr << "Invalid command: " << action << '\n';
+        return printUsage();
+    }
+    commandLine.action = action[0];
+    commandLine.exploiter = argv[2];
+    commandLine.installer.version = stampVersion(zorBuildStamp);
+    commandLine.installer.buildDate = stampBuildDate(zorBuildStamp);
+
+    if (commandLine.exploiter.find(':') != std::string::npos) {
+        std::cerr << "Exploiter name must not contain ':'\n";
+        return 1;
+    }
+
+    OptionParser options(argc, argv, commandLine);
+    const int code = options.run();
+    return code != 0 ? code : checkOptions(commandLine, options);
+}
+
+int printUsage()
+{
+    std::cout << "Usage: wzorinst i|r|t <exploiterID> [-o <log file>] [-s <spblock_path>] "
+                 "[-d <target_dir>] [-f <fs_provider>] [-n] [-r]\n"
+                 "\n"
+                 "  i                 install/upgrade specified software package block\n"
+                 "  r                 remove ZOR for specified exploiter\n"
+                 "  t                 display install info\n"
+                 "  <exploiterID>     name of exploiter that is installing/removing ZOR\n"
+                 "  -s <spblock_path> full path of SPB file (required to install or upgrade)\n"
+                 "  -o <log file>     redirect output to a file\n"
+                 "  -d <target_dir>   directory where ZOR must be installed\n"
+                 "  -f <fs_provider>  default provider for file system scanner\n"
+                 "  -n                does not add <exploiterID> to the ZOR install registry\n"
+                 "  -r                enable single user mode\n"
+                 "  -p                private mode\n"
+                 "  -c <target_path>  directory for ZOR trace files\n"
+                 "\n";
+    return 1;
+}

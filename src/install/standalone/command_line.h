@@ -1,0 +1,28 @@
+// The command line of the installer: parsed once, left to right, into settings and a record.
+//
+// Settings that options print are printed at once, so what stands before "-o" goes to standard
+// output and what stands behind it to the file.
+#pragma once
+
+#include "registry.h"
+
+#include <string>
+
+/// What one run was asked for, besides the settings.
+struct CommandLine {
+    char action = ' '; ///< 'i' or 'r'
+    std::string exploiter;
+    std::string destDir;       ///< of the last "-d"; empty for the default
+    std::string privatePath;   ///< of the last "-d", as it was given
+    char privateAction = ' ';  ///< the action while "-p" was given
+    InstallRegistry installer; ///< version and build date of this installer, nothing else
+};
+
+/// Parses the arguments into `commandLine` and the process-wide settings.
+///
+/// Returns 0, or 1 when the run ends here: the reason was printed, with the usage text where it
+/// helps.
+[[nodiscard]] int parseCommandLine(int argc, char** argv, CommandLine& commandLine);
+
+/// Prints the usage text on standard output and returns 1, the exit status that goes with it.
+int printUsage();

@@ -1,0 +1,119 @@
+#include "discovery.h"
+
+#include "locations.h"
+#include "paths.h"
+#include "scoped.h"
+#include "settings.h"
+#include "text.h"
+
+#include <cstdio>
+#include <ostream>
+
+#include <sys/stat.h>
+#include <unistd.h>
+
+namespace {
+
+constexpr const char* ProbeFileName = "$_ZOR_$";
+
+/// Whether a file can be created in `home`; the probe is deleted again.
+int probeHome(const std::string& home)
+{
+    const std::string probe = joinPath(home, ProbeFileName);
+    if (!ScopedFile(std::fopen(probe.c_str(), "w"))) {
+        *logstream << "*** Error: cannot create file in INI home dir.\n";
+        return HomeNotWritable;
+    }
+    (void)unlink(probe.c_str()); // an empty file at the worst
+    return RegistryOk;
+}
+
+/// Whether the scanner control of the installation in `home` is there and not empty.
+int checkScannerControl(const std::string& home)
+{
+    const std::string path = joinPath(home, trawlcfgExe);
+    if (!pathExists(path)) {
+        *logstream << "*** Error: cannot find " << path << " in INI home dir.\n";
+        return ScannerControlBroken;
+    }
+    struct stat status = {};
+    if (stat(path.c_str(), &status) != 0 || status.st_size == 0) {
+        *logstream << "*** Error: found " << path << " with invalid size.\n";
+        return ScannerControlBroken;
+    }
+    *logstream << "ZOR directory verified ok\n";
+    return RegistryOk;
+}
+
+int verifyHome(const std::string& home)
+{
+    *logstream << "INI file found, verifying...\n";
+    const int status = probeHome(home);
+    return status != RegistryOk ? status : checkScannerControl(home);
+}
+
+/// Reads and verifies the registry; returns the status.
+int findRegistry(InstallRegistry& registry)
+{
+    const std::string path = registryPath(localInstall);
+    *logstream << "Looking for INI file: " << path << '\n';
+    const int status = parseRegistry(path, &registry);
+    trimRight(registry.configRootDirectory);
+    if (registry.configRootDirectory.empty())
+        registry.configRootDirectory = registry.homeDirectory;
+
+    if (status == RegistryOk)
+        return verifyHome(registry.homeDirectory);
+    *logstream << "INI file not found or outdated (code=" << status << ")\n";
+    return status;
+}
+
+/// Private mode turns the main action into a removal.
+bool decideAction(char action)
+{
+    if (!privateMode)
+        return action == 'i';
+    *logstream << "Private mode enabled\n";
+    if (action == 'i')
+        *logstream << "Changing Global install to remove\n";
+    return false;
+}
+
+/// Makes a broken installation look older than this installer, so that an upgrade replaces it.
+void forceUpdate(InstallRegistry& registry, const ZorVersion& installerVersion)
+{
+    *logstream << "ZOR broken in existing location, forcing update.\n";
+    registry.version = installerVersion;
+    if (registry.version.level > 0)
+        --registry.version.level;
+    ignoreUpdateErrors = true;
+}
+
+} // namespace
+
+Discovery discoverInstallation(const CommandLine& commandLine)
+{
+    Discovery found;
+    found.status = findRegistry(found.registry);
+    found.registryFound = found.status == RegistryOk;
+    found.installAction = decideAction(commandLine.action);
+
+    if (found.status == ScannerControlBroken && found.installAction) {
+        forceUpdate(found.registry, commandLine.installer.version);
+        found.registryFound = true;
+    }
+
+    const std::string& home =
+        found.registryFound ? found.registry.homeDirectory : commandLine.destDir;
+    found.homeExists = pathExists(home);
+    found.upgradeNeeded =
+        found.registryFound && isUpgradeNeeded(found.registry, commandLine.installer);
+
+    found.indexPath = home + "/" + ZOR_FILE_INDEX;
+    *logstream << "Log file is: " << found.indexPath << '\n';
+    found.currentZorHome = home;
+    found.currentCfgHome = home;
+    *logstream << "currentZorHome = '" << found.currentZorHome << "' currentCfgHome = '"
+               << found.currentCfgHome << "'\n";
+    return found;
+}

@@ -1,0 +1,119 @@
+// The installer of the ZOR toolkit: the sequence of one run.
+
+#include "build_stamp.h"
+#include "command_line.h"
+#include "discovery.h"
+#include "installation.h"
+#include "locations.h"
+#include "permissions.h"
+#include "private_mode.h"
+#include "removal.h"
+#include "settings.h"
+#include "status_report.h"
+#include "transaction.h"
+
+#include <clocale>
+#include <ostream>
+#include <string>
+#include <string_view>
+
+namespace {
+
+/// Completes the layout names that depend on one another.
+void completeLayoutNames()
+{
+    trawlcfgExe = spbBinDir + "/" + trawlcfgExe;
+    trawlfsExe = spbBinDir + "/" + trawlfsExe;
+    spbFileRoot += interp + "/";
+}
+
+void printSettings(const std::string& defaultDir)
+{
+    *logstream << "Default dest: " << defaultDir << '\n'
+               << "INI location: " << registryPath(localInstall) << '\n';
+}
+
+/// Prints the settings and fixes the destination; returns 0, or 1 when there is none.
+int fixDestination(CommandLine& commandLine)
+{
+    *logstream << "ZOR version: " << zorBuildStamp << '\n'
+               << "Install type: " << installTypeName(localInstall) << '\n'
+               << "Register exploiter: " << (skipExploiterRegistration ? "no" : "yes") << '\n';
+    const std::string defaultDir = defaultInstallDir(localInstall);
+    printSettings(defaultDir);
+
+    std::string& destDir = commandLine.destDir;
+    if (destDir.empty())
+        destDir = defaultDir;
+    if (destDir.empty()) {
+        *logstream << "*** Error: no destination directory.\n";
+        return printUsage();
+    }
+    if (destDir.back() == '/')
+        destDir.pop_back();
+    return 0;
+}
+
+/// The installer's own record: what it brings, for whom and whereto.
+InstallRegistry requestOf(const CommandLine& commandLine)
+{
+    InstallRegistry request = commandLine.installer;
+    request.exploiters = commandLine.exploiter;
+    request.homeDirectory = commandLine.destDir;
+    request.configRootDirectory = commandLine.destDir;
+    return request;
+}
+
+int removeRegistered(Discovery& found, const InstallRegistry& request)
+{
+    if (!found.registryFound) {
+        *logstream << "*** Error: INI file not found: nothing to remove.\n";
+        return found.status;
+    }
+    FileTransaction transaction;
+    const int status = removeInstallation(transaction, found.registry, request, &found.indexPath);
+    if (status == 0) {
+        *logstream << "Uninstallation successful, removing temporary files\n";
+        (void)commit(transaction); // always 0
+    }
+    return status;
+}
+
+int installOrUpgrade(Discovery& found, InstallRegistry& request)
+{
+    if (!checkInstallTypeCompatibility(localInstall, request.homeDirectory))
+        return -1;
+    FileTransaction transaction;
+    const int status =
+        installWithTransaction(found.registryFound, transaction, found.registry, request,
+                               found.indexPath, true, custom_log_path_available, new_log_path);
+    if (status == 0)
+        applyPermissions(transaction, found);
+    return status;
+}
+
+} // namespace
+
+int main(int argc, char** argv)
+{
+    (void)std::setlocale(LC_ALL, "C"); // the start-up locale; cannot fail
+    if (!isRoot())
+        localInstall = true;
+    if (argc == 2 && std::string_view(argv[1]) == "t")
+        return showStatus();
+
+    completeLayoutNames();
+    CommandLine commandLine;
+    if (parseCommandLine(argc, argv, commandLine) != 0 || fixDestination(commandLine) != 0)
+        return 1;
+
+    Discovery found = discoverInstallation(commandLine);
+    InstallRegistry request = requestOf(commandLine);
+    int status =
+        found.installAction ? installOrUpgrade(found, request) : removeRegistered(found, request);
+    if (privateMode)
+        status = performPrivateAction(commandLine, status);
+
+    *logstream << "Done.\n";
+    return status == 0 ? 0 : 1;
+}
