@@ -69,7 +69,7 @@ int runCommand(const std::string& program, const std::string& /*directory*/,
     // The command's own output, in debug mode, stands behind what was printed before it.
     std::cout.flush();
     logstream->flush();
-    const int status = std::system(command.c_str()); // NOLINT(cert-env33-c, concurrency-mt-unsafe)
+    const int status = std::system(command.c_str());
     *logstream << "Exec '" << command << "' returned " << status << '\n';
     return status;
 }
@@ -104,7 +104,7 @@ int setSelinuxContext(const std::string& home)
 void setLibraryPath(const std::string& home)
 {
     std::string setting = std::string(LibraryPathName) + "=" + joinPath(home, "bin");
-    const char* const old = std::getenv(LibraryPathName); // NOLINT(concurrency-mt-unsafe)
+    const char* const old = std::getenv(LibraryPathName);
     if (old != nullptr)
         setting += std::string(":") + old;
 
@@ -112,8 +112,7 @@ void setLibraryPath(const std::string& home)
         *logstream << "Setting '" << LibraryPathName << "' to '" << setting << "'\n";
 
     // The environment keeps pointing at the buffer: it stays for the rest of the process.
-    char* const buffer = strdup(setting.c_str());
-    const int result = putenv(buffer); // NOLINT(concurrency-mt-unsafe)
+    const int result = putenv(strdup(setting.c_str())); // NOLINT(clang-analyzer-unix.Malloc)
     if (result != 0)
         *logstream << "Setting up the '" << LibraryPathName
                    << "' variable has failed. Error = " << result << '\n';

@@ -34,12 +34,12 @@ std::string installTypeName(bool local)
 std::string homeDirectory()
 {
     // The installer has one thread: the static results of the user database are its own.
-    if (const passwd* entry = getpwuid(getuid())) // NOLINT(concurrency-mt-unsafe)
+    if (const passwd* entry = getpwuid(getuid()))
         return entry->pw_dir;
-    const char* const login = getlogin(); // NOLINT(concurrency-mt-unsafe)
+    const char* const login = getlogin();
     if (login == nullptr)
         return {};
-    const passwd* const entry = getpwnam(login); // NOLINT(concurrency-mt-unsafe)
+    const passwd* const entry = getpwnam(login);
     return entry == nullptr ? "" : entry->pw_dir;
 }
 

@@ -2,9 +2,6 @@
 
 #include <iostream>
 
-// The settings carry the system's own names.
-// NOLINTBEGIN(readability-identifier-naming)
-
 bool localInstall = false;
 bool skipExploiterRegistration = false;
 bool privateMode = false;
@@ -34,8 +31,6 @@ std::string trawlcfgExe = "trawlcfg";
 std::string trawlfsExe = "trawlfs";
 
 std::FILE* zor_file_handle = nullptr;
-
-// NOLINTEND(readability-identifier-naming)
 
 void enterSingleUserMode()
 {

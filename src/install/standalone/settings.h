@@ -22,11 +22,11 @@ extern bool ignoreNonFatalErrors;      ///< a failed scanner command counts as a
 extern bool ignoreUpdateErrors;        ///< the status of scanner commands is not looked at
 extern bool createSingleUserModeFile;  ///< put the single-user flag into the installation
 extern bool applySingleUserMode;       ///< single-user mode: nobody but the owner writes
-extern bool custom_log_path_available; // NOLINT(readability-identifier-naming)
+extern bool custom_log_path_available; ///< a directory for traces was given
 
 extern std::string spbPackage;      ///< path of the SPB
 extern std::string fileScannerMode; ///< default provider of the file-system scanner
-extern std::string new_log_path;    // NOLINT(readability-identifier-naming)
+extern std::string new_log_path;    ///< that directory
 
 /// Every line of progress, warning or error: standard output, or the file of "-o". Never null.
 extern std::ostream* logstream;
@@ -34,10 +34,10 @@ extern std::ostream* logstream;
 // Modes of what an installation creates, in single-user mode 0755 and 022.
 
 extern mode_t globalFilesUmask; ///< the process umask while an installation creates
-extern mode_t LogDirMode;       // NOLINT(readability-identifier-naming)
-extern mode_t CommonLogDirMode; // NOLINT(readability-identifier-naming)
-extern mode_t CacheDirRootMode; // NOLINT(readability-identifier-naming)
-extern mode_t EtcDirMode;       // NOLINT(readability-identifier-naming)
+extern mode_t LogDirMode;
+extern mode_t CommonLogDirMode;
+extern mode_t CacheDirRootMode;
+extern mode_t EtcDirMode;
 inline constexpr mode_t CorvanCommonDirMode = 0777;
 
 /// Single-user mode: the modes above are lowered and applySingleUserMode is set, for the rest of
@@ -46,9 +46,8 @@ void enterSingleUserMode();
 
 // The package's layout: names of directories and files, relative to the installation.
 
-extern std::string interp; ///< platform directory inside the image root
-extern std::string
-    spbFileRoot; ///< where the package's files lie inside the SPB, final "/" included
+extern std::string interp;      ///< platform directory inside the image root
+extern std::string spbFileRoot; ///< image root inside the SPB; with `interp` once completed
 extern std::string trawlcfgExe; ///< scanner control; relative to the installation once prefixed
 extern std::string trawlfsExe;  ///< file-system scanner; the same
 
@@ -59,8 +58,8 @@ inline const std::string spbCfgXssDir = "xss";
 inline const std::string spbBinPluginsDir = "plugins";
 inline const std::string spbBinCustomScannersDir = "customscanners";
 inline const std::string auxDirInstall = "install";
-inline const std::string binDir = "bin";
-inline const std::string binEtcDir = "bin/etc";
+inline const std::string binDir = "bin";        // no road uses this name today
+inline const std::string binEtcDir = "bin/etc"; // nor this one
 inline const std::string etcDir = "etc";
 inline const std::string logDir = "logs";
 inline const std::string cacheDir = "cache_data";
@@ -69,7 +68,7 @@ inline const std::string zorProps = "Zor.properties";
 inline const std::string traceProps = "ZorTrace.properties";
 inline const std::string installProps = "zor_install.properties";
 inline const std::string UninstallFileName = "_uninst";
-inline const std::string ZOR_FILE_INDEX = "ZOR_files"; // NOLINT(readability-identifier-naming)
+inline const std::string ZOR_FILE_INDEX = "ZOR_files";
 
 /// The index of installed files while an extraction writes it; null at all other times.
-extern std::FILE* zor_file_handle; // NOLINT(readability-identifier-naming)
+extern std::FILE* zor_file_handle;

@@ -47,7 +47,7 @@ bool removeTree(const std::string& path, bool recurse, bool keepDirs)
         return false;
 
     bool result = true;
-    while (const dirent* entry = readdir(dir.get())) { // NOLINT(concurrency-mt-unsafe)
+    while (const dirent* entry = readdir(dir.get())) {
         if (!isDotName(entry->d_name))
             result = removeChild(joinPath(path, entry->d_name), recurse, keepDirs, result);
     }
