@@ -127,6 +127,20 @@ class Machine:
         """Plants another package; the arguments are those of `toolkit.package`."""
         self.plant(SPB, toolkit.package(changes, without))
 
+    def register(self, home="/opt/corvan/zor", version="9.2.30.0000", date="22/12/02",
+                 exploiters="ABC:", path="/etc/zor/zor.ini"):
+        """Plants a registry as the installer writes it."""
+        self.plant(path, f"ZOR_Version = {version}\n"
+                         f"ZOR_BuildDate = {date}\n"
+                         f"ZOR_HomeDirectory = {home}\n"
+                         f"ZOR_Exploiters = {exploiters}\n"
+                         f"ZOR_ConfigRootDirectory = {home}\n")
+
+    def plant_scanner_control(self, home="/opt/corvan/zor"):
+        """Plants the two scanner programs, which make an installation count as intact."""
+        for name in ("trawlcfg", "trawlfs"):
+            self.plant(f"{home}/bin/{name}", toolkit.SCANNER_PROGRAM, 0o755)
+
     def let_commands_fail(self, *failures):
         """Makes scanner programs exit with a status: pairs of a text to look for and a status."""
         self.plant(toolkit.FAILURES, "".join(f"{text} {status}\n" for text, status in failures))
