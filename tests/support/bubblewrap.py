@@ -111,8 +111,11 @@ def make_mount_point(root, path):
 
 
 def environment_of(home, changes=None):
-    """The sandboxed program's whole environment: `changes` win, None takes a variable away."""
-    environment = {"PATH": "/usr/bin", "TZ": "UTC0", "HOME": home}
+    """The sandboxed program's whole environment: `changes` win, None takes a variable away.
+
+    WZOR_SANDBOX tells tests that plant files in /etc or /usr that these are their own.
+    """
+    environment = {"PATH": "/usr/bin", "TZ": "UTC0", "HOME": home, "WZOR_SANDBOX": "1"}
     environment.update({name: value for name, value in os.environ.items()
                         if name.startswith(PASSED_VARIABLES)})
     environment.update(changes or {})
