@@ -13,8 +13,7 @@ namespace {
 
 void logFailure(const char* doing, const std::string& path, int error)
 {
-    *logstream << doing << " file " << path << " error: " << error << " (" << std::strerror(error)
-               << ")\n";
+    *logstream << doing << path << " error: " << error << " (" << std::strerror(error) << ")\n";
 }
 
 bool contains(const std::string& text, const std::string& fragment)
@@ -42,7 +41,7 @@ int PropertyFile::load(const std::string& path)
     const int error = readLines(path, lines);
     if (error != 0) {
         lines.clear();
-        logFailure("Loading", path, error);
+        logFailure("Loading file ", path, error);
     }
     return error;
 }
@@ -52,7 +51,7 @@ int PropertyFile::save(const std::string& path) const
     const ScopedFile file(std::fopen(path.c_str(), "w"));
     if (!file) {
         const int error = errno;
-        logFailure("Saving", path, error);
+        logFailure("Saving file ", path, error);
         return error;
     }
     for (const std::string& line : lines) {
