@@ -27,21 +27,22 @@ void completeLayoutNames()
     spbFileRoot += interp + "/";
 }
 
-void printSettings(const std::string& defaultDir)
-{
-    *logstream << "Default dest: " << defaultDir << '\n'
-               << "INI location: " << registryPath(localInstall) << '\n';
-}
-
-/// Prints the settings and fixes the destination; returns 0, or 1 when there is none.
-int fixDestination(CommandLine& commandLine)
+/// Prints the settings of this run; returns the default destination, one of them.
+std::string printSettings()
 {
     *logstream << "ZOR version: " << zorBuildStamp << '\n'
                << "Install type: " << installTypeName(localInstall) << '\n'
                << "Register exploiter: " << (skipExploiterRegistration ? "no" : "yes") << '\n';
+    // Asked once a run: without a home directory it prints a line of its own.
     const std::string defaultDir = defaultInstallDir(localInstall);
-    printSettings(defaultDir);
+    *logstream << "Default dest: " << defaultDir << '\n'
+               << "INI location: " << registryPath(localInstall) << '\n';
+    return defaultDir;
+}
 
+/// Fixes the destination; returns 0, or 1 when there is none.
+int fixDestination(CommandLine& commandLine, const std::string& defaultDir)
+{
     std::string& destDir = commandLine.destDir;
     if (destDir.empty())
         destDir = defaultDir;
@@ -104,7 +105,9 @@ int main(int argc, char** argv)
 
     completeLayoutNames();
     CommandLine commandLine;
-    if (parseCommandLine(argc, argv, commandLine) != 0 || fixDestination(commandLine) != 0)
+    if (parseCommandLine(argc, argv, commandLine) != 0)
+        return 1;
+    if (fixDestination(commandLine, printSettings()) != 0)
         return 1;
 
     Discovery found = discoverInstallation(commandLine);
