@@ -510,11 +510,13 @@ TEST_F(ZipDirectoryTest, TheScanOfAFileThatBeginsWithACentralHeaderFindsNothingA
 TEST_F(ZipDirectoryTest, WithoutAPathTheCodeIs1)
 {
     EXPECT_EQ(1, ZipFile::readDirectory(nullptr, entries));
+    EXPECT_TRUE(entries.empty());
 }
 
 TEST_F(ZipDirectoryTest, WithoutAFileTheCodeIs1)
 {
     EXPECT_EQ(1, ZipFile::readDirectory((dir / "missing").c_str(), entries));
+    EXPECT_TRUE(entries.empty());
 }
 
 TEST_F(ZipDirectoryTest, AnEmptyFileGives2)

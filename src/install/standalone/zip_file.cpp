@@ -373,13 +373,13 @@ InputStream* ZipFile::getInputStream(const ZipEntry* entry) const
 
 int ZipFile::readDirectory(const char* path, std::vector<ZipEntry>& entries)
 {
+    entries.clear();
     if (path == nullptr)
         return ZipCannotOpen;
     const ScopedFd file = openArchive(path);
     if (!file.isOpen())
         return ZipCannotOpen;
 
-    entries.clear();
     HeaderReader reader(file.get());
     if (readCentralDirectory(reader, entries) && !entries.empty())
         return ZipOk;
