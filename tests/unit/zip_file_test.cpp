@@ -694,6 +694,24 @@ TEST_F(FarHeaderTest, AnExtraFieldThatEndsBelow2ToThe31IsSkipped)
     EXPECT_EQ(0x7FFFFFFFU - 68, entries[1].dataOffset);
 }
 
+TEST_F(FarHeaderTest, WithoutAnExtraFieldItIsTheDataThatCannotBeSkipped)
+{
+    far.name = "b";
+    far.compressedSize = 1;
+
+    EXPECT_EQ(7, codeOfFar(TwoGiB - 31, headerBytes(far) + "x"));
+}
+
+TEST_F(FarHeaderTest, AnEmptyEntryThatEndsAt2ToThe31NeedsNoSeek)
+{
+    far.name = "b";
+
+    EXPECT_EQ(0, codeOfFar(TwoGiB - 31, headerBytes(far) + headerBytes(CentralHeader())));
+
+    EXPECT_EQ((Names{"a", "b"}), names());
+    EXPECT_EQ(0x80000000U, entries[1].dataOffset);
+}
+
 TEST_F(ZipDirectoryTest, ALocalHeaderJustBelow2ToThe31IsFoundThroughTheDirectory)
 {
     const ZipItem item = storedItem("far", "data of far");

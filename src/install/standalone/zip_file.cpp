@@ -201,10 +201,13 @@ int scanLocalHeader(HeaderReader& reader, const unsigned char* header, ZipEntry&
     if (!sizesKnown && (read16(header + 6) & SizesFollowData) != 0)
         return ZipUnknownEntrySize;
 
-    if (!reader.skip(read16(header + 28)))
+    const std::uint32_t extraLength = read16(header + 28);
+    if (extraLength != 0 && !reader.skip(extraLength))
         return ZipCannotSkipExtra;
     entry.dataOffset = static_cast<std::uint32_t>(reader.position());
-    return reader.skip(entry.compressedSize) ? ZipOk : ZipCannotSkipData;
+    if (entry.compressedSize != 0 && !reader.skip(entry.compressedSize))
+        return ZipCannotSkipData;
+    return ZipOk;
 }
 
 /// Walks the local headers from the start of the file to the first central header.
