@@ -6,10 +6,12 @@
 std::string noiseBytes(std::size_t size, std::uint32_t seed)
 {
     std::mt19937 random(seed);
-    std::string bytes;
-    bytes.reserve(size);
-    while (bytes.size() < size)
-        bytes += static_cast<char>(random() & 0xFFU);
+    std::string bytes(size, '\0');
+    std::uint32_t number = 0;
+    for (std::size_t i = 0; i < size; ++i) {
+        number = i % 4 == 0 ? static_cast<std::uint32_t>(random()) : number >> 8;
+        bytes[i] = static_cast<char>(number & 0xFFU);
+    }
     return bytes;
 }
 
