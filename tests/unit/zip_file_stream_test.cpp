@@ -326,6 +326,19 @@ TEST_F(ZipStreamTest, AStoredEntryOf2ToThe31BytesOrMoreGivesNoBlocks)
     EXPECT_EQ("wxyz", std::string(buffer, 4));
 }
 
+TEST_F(ZipStreamTest, AStoredEntryOf2ToThe31BytesOrMoreGivesSingleBytes)
+{
+    ZipItem item = storedItem("a", "0123456789");
+    item.central.uncompressedSize = 0x80000001U;
+    const auto stream = openItem(item);
+
+    EXPECT_EQ('0', stream->read());
+    EXPECT_EQ(std::int32_t{-2147483647 - 1}, stream->available());
+    EXPECT_EQ('1', stream->read());
+    EXPECT_EQ(2147483647, stream->available()); // 32 bits wrap around
+    EXPECT_EQ("2345", readBlock(*stream, 4));
+}
+
 TEST_F(ZipStreamTest, AStoredStreamAskedForNothingGivesNothing)
 {
     const auto stream = openItem(storedItem("a", "0123456789"));

@@ -243,7 +243,9 @@ int X__StoredInputStream::read()
     unsigned char byte = 0;
     if (readUpTo(file_.get(), &byte, 1) != 1)
         return -1;
-    --remaining_;
+    // In unsigned arithmetic: a size of 2^31 or more begins below 0 and may pass the smallest
+    // number.
+    remaining_ = static_cast<std::int32_t>(static_cast<std::uint32_t>(remaining_) - 1);
     return byte;
 }
 
