@@ -29,8 +29,10 @@ int readLines(const std::string& path, std::vector<std::string>& lines)
     std::string line;
     while (readLine(file.get(), line))
         lines.push_back(line);
-    // Half a file, taken for whole, would be saved over the whole one.
-    return std::ferror(file.get()) != 0 ? errno : 0;
+    const int error = std::ferror(file.get()) != 0 ? errno : 0;
+    // Half a file, taken for whole, would be saved over the whole one. A directory can be opened
+    // and holds no lines: to save it is what fails.
+    return error == EISDIR ? 0 : error;
 }
 
 } // namespace

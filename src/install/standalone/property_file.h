@@ -14,7 +14,7 @@ struct PropertyFile {
     std::vector<std::string> lines; ///< without their newlines, otherwise as read
 
     /// Replaces `lines` by those of the file at `path`. Returns 0, or the `errno` of what failed,
-    /// with a line about it on `logstream`; no lines are held then.
+    /// with a line about it on `logstream`; no lines are held then. A directory loads as no lines.
     [[nodiscard]] int load(const std::string& path);
 
     /// Writes the lines to the file at `path`, each with a newline. Returns 0, or the `errno` of
