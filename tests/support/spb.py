@@ -60,14 +60,15 @@ class Archive:
         self.comment = b""
 
     def add(self, name, data=b"", method=DEFLATED, **fields):
-        """Appends an entry with the full name `name`; `fields` override what would be right."""
+        """Appends an entry with the full name `name`; `fields` override what would be right.
+
+        A method other than stored and deflated leaves the data as they are.
+        """
         if isinstance(name, str):
             name = name.encode()
         if name.endswith(b"/"):
             method = STORED
         entry = Entry(name, data, method)
-        if "method" in fields or "local_method" not in fields:
-            entry.local_method = entry.method
         for field, value in fields.items():
             assert hasattr(entry, field), field
             setattr(entry, field, value)
