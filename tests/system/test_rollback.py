@@ -271,15 +271,37 @@ def test_a_missing_main_property_file_fails_the_installation(machine):
     rolled_back(machine, before, FILE_INDEX)
 
 
-def test_a_main_property_file_that_cannot_be_saved_fails_the_installation(machine):
-    machine.pack({"config/Zor.properties/": b""}, without=("config/Zor.properties",))
+@pytest.mark.parametrize("name", ["Zor.properties", "ZorTrace.properties"])
+def test_a_property_file_that_cannot_be_saved_fails_the_installation(machine, name):
+    path = "/home/ann/corvan/zor/config/" + name
+    machine.pack(without=("config/" + name,))
+    machine.plant(path, "key=$(ZOR_DestinationDir)\n", 0o400)
     before = machine.tree()
 
-    printed(fail(machine), UP_TO_LABELS +
-            f"Customizing property file: {MAIN}\n"
-            f"Saving file {MAIN} error: 21 (Is a directory)\n"
-            "Could not save property file\n" + FAILED, status=1)
+    outcome = fail(machine, user=ANN)
 
+    printed_lines(outcome, f"Customizing property file: {path}",
+                  f"Saving file {path} error: 13 (Permission denied)",
+                  "Could not save property file",
+                  "Installation failed, rolling back",
+                  "Done.")
+    rolled_back(machine, before, FILE_INDEX)
+
+
+@pytest.mark.parametrize("name", ["Zor.properties", "ZorTrace.properties"])
+def test_a_property_file_that_cannot_be_read_fails_the_installation(machine, name):
+    path = "/home/ann/corvan/zor/config/" + name
+    machine.pack(without=("config/" + name,))
+    machine.plant(path, "key=$(ZOR_DestinationDir)\n", 0)
+    before = machine.tree()
+
+    outcome = fail(machine, user=ANN)
+
+    printed_lines(outcome, f"Customizing property file: {path}",
+                  f"Loading file {path} error: 13 (Permission denied)",
+                  "Could not load property file",
+                  "Installation failed, rolling back",
+                  "Done.")
     rolled_back(machine, before, FILE_INDEX)
 
 
@@ -292,19 +314,6 @@ def test_a_missing_trace_property_file_fails_the_installation(machine):
             f"Customizing property file: {TRACE}\n"
             f"Loading file {TRACE} error: 2 (No such file or directory)\n"
             "Could not load property file\n" + FAILED, status=1)
-
-    rolled_back(machine, before, FILE_INDEX)
-
-
-def test_a_trace_property_file_that_cannot_be_saved_fails_the_installation(machine):
-    machine.pack({"config/ZorTrace.properties/": b""}, without=("config/ZorTrace.properties",))
-    before = machine.tree()
-
-    printed(fail(machine), UP_TO_LABELS +
-            f"Customizing property file: {MAIN}\n"
-            f"Customizing property file: {TRACE}\n"
-            f"Saving file {TRACE} error: 21 (Is a directory)\n"
-            "Could not save property file\n" + FAILED, status=1)
 
     rolled_back(machine, before, FILE_INDEX)
 
