@@ -1,0 +1,51 @@
+// Fixtures of the tests that let the installer work on real files.
+#pragma once
+
+#include "scoped.h"
+#include "settings_guard.h"
+#include "test_files.h"
+#include "transaction.h"
+
+#include <gtest/gtest.h>
+
+#include <optional>
+#include <string>
+
+/// Restores a variable of the environment at its end.
+class VariableGuard {
+public:
+    explicit VariableGuard(const char* name);
+    VariableGuard(const VariableGuard&) = delete;
+    VariableGuard& operator=(const VariableGuard&) = delete;
+    ~VariableGuard();
+
+private:
+    const char* name_;
+    std::optional<std::string> value_;
+};
+
+/// A directory and a transaction of the test's own, umask 022, no LD_LIBRARY_PATH, a caught log.
+class InstallerTest : public ::testing::Test {
+protected:
+    InstallerTest();
+
+    SettingsGuard settings;
+    VariableGuard libraryPath{"LD_LIBRARY_PATH"};
+    ScopedUmask mask{022};
+    LogCapture log;
+    TempDir dir;
+    FileTransaction transaction;
+};
+
+/// For tests that reach fixed places of the machine (/etc/zor, /etc/kel, /usr/kel, /opt, homes).
+///
+/// They fail at once outside of tests/support/sandbox, which sets WZOR_SANDBOX. Each begins and
+/// ends without any of those places.
+class MachineTest : public InstallerTest {
+protected:
+    void SetUp() override;
+    void TearDown() override;
+};
+
+/// The journal as lines of kind and path, "4 /opt/corvan\n".
+std::string journalText(const FileTransaction& transaction);

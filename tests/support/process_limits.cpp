@@ -1,0 +1,108 @@
+#include "process_limits.h"
+
+#include "test_files.h"
+
+#include <gtest/gtest.h>
+
+#include <cstddef>
+#include <cstdio>
+#include <iostream>
+#include <iterator>
+
+#include <linux/filter.h>
+#include <linux/seccomp.h>
+#include <sched.h>
+#include <sys/mount.h>
+#include <sys/prctl.h>
+#include <sys/syscall.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+namespace {
+
+constexpr __u32 RightsOfRoot =
+    1U << CAP_DAC_OVERRIDE | 1U << CAP_DAC_READ_SEARCH | 1U << CAP_FOWNER;
+
+/// Gets or sets (`call`) the capabilities of this thread.
+void capabilities(long call, __user_cap_data_struct* data)
+{
+    __user_cap_header_struct header = {_LINUX_CAPABILITY_VERSION_3, 0};
+    EXPECT_EQ(0, syscall(call, &header, data));
+}
+
+} // namespace
+
+OrdinaryRights::OrdinaryRights()
+{
+    capabilities(SYS_capget, previous_);
+    __user_cap_data_struct lowered[2] = {previous_[0], previous_[1]};
+    lowered[0].effective &= ~RightsOfRoot;
+    capabilities(SYS_capset, lowered);
+}
+
+OrdinaryRights::~OrdinaryRights()
+{
+    capabilities(SYS_capset, previous_);
+}
+
+SmallDisk::SmallDisk(const std::string& path, int kilobytes) : path_(path)
+{
+    const std::string size = "size=" + std::to_string(kilobytes) + "k";
+    EXPECT_EQ(0, mount("tmpfs", path.c_str(), "tmpfs", 0, size.c_str()));
+}
+
+SmallDisk::~SmallDisk()
+{
+    EXPECT_EQ(0, umount(path_.c_str()));
+}
+
+FileInPlace::FileInPlace(const std::string& source, const std::string& target) : target_(target)
+{
+    EXPECT_EQ(0, mount(source.c_str(), target.c_str(), nullptr, MS_BIND, nullptr));
+}
+
+FileInPlace::~FileInPlace()
+{
+    EXPECT_EQ(0, umount(target_.c_str()));
+}
+
+bool passesInChild(const std::function<void()>& body)
+{
+    std::cout.flush();
+    (void)std::fflush(nullptr);
+    const pid_t child = fork();
+    if (child == 0) {
+        body();
+        std::cout.flush();
+        (void)std::fflush(nullptr);
+        _exit(::testing::Test::HasFailure() ? 1 : 0);
+    }
+    int status = -1;
+    EXPECT_EQ(child, waitpid(child, &status, 0));
+    return status == 0;
+}
+
+void becomeUser(uid_t uid)
+{
+    const std::string map = std::to_string(uid) + " " + std::to_string(getuid()) + " 1";
+    ASSERT_EQ(0, unshare(CLONE_NEWUSER));
+    writeFile("/proc/self/uid_map", map);
+    ASSERT_EQ(uid, getuid());
+}
+
+void failSystemCall(long number, int error)
+{
+    const auto wanted = static_cast<__u32>(number);
+    const auto answer = SECCOMP_RET_ERRNO | static_cast<__u32>(error);
+    sock_filter program[] = {
+        BPF_STMT(BPF_LD | BPF_W | BPF_ABS, static_cast<__u32>(offsetof(seccomp_data, nr))),
+        BPF_JUMP(BPF_JMP | BPF_JEQ | BPF_K, wanted, 0, 3),
+        BPF_STMT(BPF_LD | BPF_W | BPF_ABS, static_cast<__u32>(offsetof(seccomp_data, args))),
+        BPF_JUMP(BPF_JMP | BPF_JGT | BPF_K, 2, 0, 1),
+        BPF_STMT(BPF_RET | BPF_K, answer),
+        BPF_STMT(BPF_RET | BPF_K, SECCOMP_RET_ALLOW),
+    };
+    const sock_fprog filter = {static_cast<unsigned short>(std::size(program)), program};
+    ASSERT_EQ(0, prctl(PR_SET_NO_NEW_PRIVS, 1, 0, 0, 0));
+    ASSERT_EQ(0, prctl(PR_SET_SECCOMP, SECCOMP_MODE_FILTER, &filter));
+}

@@ -1,0 +1,58 @@
+// What a test takes away from its own process: rights, identity, system calls, room on a disk.
+#pragma once
+
+#include <functional>
+#include <string>
+
+#include <linux/capability.h>
+#include <sys/types.h>
+
+/// Makes root respect permission bits like any other user while it lives; without effect for other
+/// users, who do so anyway.
+class OrdinaryRights {
+public:
+    OrdinaryRights();
+    OrdinaryRights(const OrdinaryRights&) = delete;
+    OrdinaryRights& operator=(const OrdinaryRights&) = delete;
+    ~OrdinaryRights();
+
+private:
+    __user_cap_data_struct previous_[2] = {};
+};
+
+/// A file system of `kilobytes` at the existing directory `path` while it lives. Needs the rights
+/// that root has in tests/support/sandbox.
+class SmallDisk {
+public:
+    SmallDisk(const std::string& path, int kilobytes);
+    SmallDisk(const SmallDisk&) = delete;
+    SmallDisk& operator=(const SmallDisk&) = delete;
+    ~SmallDisk();
+
+private:
+    std::string path_;
+};
+
+/// Shows the file `source` at the path of the existing file `target` while it lives. Needs the
+/// rights that root has in tests/support/sandbox.
+class FileInPlace {
+public:
+    FileInPlace(const std::string& source, const std::string& target);
+    FileInPlace(const FileInPlace&) = delete;
+    FileInPlace& operator=(const FileInPlace&) = delete;
+    ~FileInPlace();
+
+private:
+    std::string target_;
+};
+
+/// Runs `body` in a child process, so that what it does to its process ends with it. Returns true
+/// when the child ended by itself and no expectation in it failed; its failures are printed.
+bool passesInChild(const std::function<void()>& body);
+
+/// Makes this process that of the user `uid`, who owns the same files. For a child only.
+void becomeUser(uid_t uid);
+
+/// Makes the system call `number` (SYS_...) fail with `error` from now on, unless its first
+/// argument is 0 to 2, a standard stream. For a child only.
+void failSystemCall(long number, int error);
