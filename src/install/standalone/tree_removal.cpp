@@ -18,17 +18,21 @@ bool isDotName(std::string_view name)
     return name == "." || name == "..";
 }
 
-/// Deletes one thing in a directory; see removeTree(). Returns the result so far, `result`, as this
-/// thing changes it.
-bool removeChild(const std::string& child, bool recurse, bool keepDirs, bool result)
+/// Deletes what the directory `path` lists as `name`; see removeTree(). Returns the result so far,
+/// `result`, as this thing changes it.
+bool removeChild(const std::string& path, const char* name, bool recurse, bool keepDirs,
+                 bool result)
 {
+    const std::string child = joinPath(path, name);
     struct stat status = {};
     if (lstat(child.c_str(), &status) != 0)
-        return false;
+        return false; // "." tells too: in a directory that may be listed but not searched
     if (!S_ISDIR(status.st_mode))
         return deleteFile(child) == 0 && result;
+    if (!recurse || isDotName(name))
+        return result;
     // Deliberate: a later success hides an earlier failure.
-    return recurse ? removeTree(child, true, keepDirs) || result : result;
+    return removeTree(child, true, keepDirs) || result;
 }
 
 } // namespace
@@ -47,10 +51,8 @@ bool removeTree(const std::string& path, bool recurse, bool keepDirs)
         return false;
 
     bool result = true;
-    while (const dirent* entry = readdir(dir.get())) {
-        if (!isDotName(entry->d_name))
-            result = removeChild(joinPath(path, entry->d_name), recurse, keepDirs, result);
-    }
+    while (const dirent* entry = readdir(dir.get()))
+        result = removeChild(path, entry->d_name, recurse, keepDirs, result);
     dir.reset();
     if (keepDirs)
         return result;

@@ -12,8 +12,9 @@ int deleteFile(const std::string& path);
 /// Deletes the files in the directory `path`, with `recurse` also those of its subdirectories, and
 /// unless `keepDirs` the directories that are empty then, each logged as "RMDIR: ".
 ///
-/// Links are deleted, not followed. Returns false when something could not be deleted or the
-/// directory not be opened; but a later subdirectory's success hides an earlier failure.
+/// Links are deleted, not followed. Returns false when the directory could not be opened or removed
+/// or something in it not be deleted. A failure further below does not count by itself, and a
+/// subdirectory's success hides an earlier failure.
 bool removeTree(const std::string& path, bool recurse, bool keepDirs);
 
 /// removeTree() of the directory `sub` in `base`, or of `base` when `sub` is empty. The transaction

@@ -1,0 +1,293 @@
+#include "installer_fixtures.h"
+#include "paths.h"
+#include "process_limits.h"
+#include "tree_removal.h"
+
+#include <gtest/gtest.h>
+
+#include <algorithm>
+#include <filesystem>
+
+#include <sys/stat.h>
+#include <sys/syscall.h>
+
+namespace {
+
+namespace fs = std::filesystem;
+
+using Lines = std::vector<std::string>;
+
+/// The lines of `text`, sorted: the order in which a directory lists its files is the system's.
+Lines sortedLines(const std::string& text)
+{
+    std::istringstream stream(text);
+    Lines lines;
+    for (std::string line; std::getline(stream, line);)
+        lines.push_back(line);
+    std::sort(lines.begin(), lines.end());
+    return lines;
+}
+
+using DeleteFileTest = InstallerTest;
+
+TEST_F(DeleteFileTest, LogsAndDeletesAFile)
+{
+    writeFile(dir / "file", "content");
+
+    EXPECT_EQ(0, deleteFile(dir / "file"));
+
+    EXPECT_FALSE(pathExists(dir / "file"));
+    EXPECT_EQ("DEL: " + dir / "file" + "\n", log.text());
+}
+
+TEST_F(DeleteFileTest, DeletesAnEmptyDirectory)
+{
+    makeDirectories(dir / "empty");
+
+    EXPECT_EQ(0, deleteFile(dir / "empty"));
+
+    EXPECT_FALSE(pathExists(dir / "empty"));
+}
+
+TEST_F(DeleteFileTest, DeletesALinkAndNotWhatItNames)
+{
+    writeFile(dir / "file", "content");
+    fs::create_symlink("file", dir / "link");
+
+    EXPECT_EQ(0, deleteFile(dir / "link"));
+
+    EXPECT_EQ(Lines{"f 0644 file"}, treeOf(dir.path()));
+}
+
+TEST_F(DeleteFileTest, LogsAlsoWhatItCannotDelete)
+{
+    EXPECT_EQ(-1, deleteFile(dir / "missing"));
+
+    EXPECT_EQ("DEL: " + dir / "missing" + "\n", log.text());
+}
+
+class RemoveTreeTest : public InstallerTest {
+protected:
+    RemoveTreeTest()
+    {
+        makeDirectories(dir / "tree/sub/deep");
+        writeFile(dir / "tree/file", "");
+        writeFile(dir / "tree/sub/file", "");
+        writeFile(dir / "tree/sub/deep/file", "");
+    }
+
+    /// Closes a directory for changes by the test itself, whoever runs it.
+    void protect(const std::string& name)
+    {
+        EXPECT_EQ(0, chmod((dir / name).c_str(), 0555));
+        rights_.emplace();
+    }
+
+private:
+    std::optional<OrdinaryRights> rights_;
+};
+
+TEST_F(RemoveTreeTest, RemovesEverythingAndLogsIt)
+{
+    EXPECT_TRUE(removeTree(dir / "tree", true, false));
+
+    EXPECT_TRUE(treeOf(dir.path()).empty());
+    EXPECT_EQ(Lines({"DEL: " + dir / "tree/file", "DEL: " + dir / "tree/sub/deep/file",
+                     "DEL: " + dir / "tree/sub/file", "RMDIR: " + dir / "tree",
+                     "RMDIR: " + dir / "tree/sub", "RMDIR: " + dir / "tree/sub/deep"}),
+              sortedLines(log.text()));
+}
+
+TEST_F(RemoveTreeTest, ADirectoryIsRemovedAfterWhatItHolds)
+{
+    EXPECT_TRUE(removeTree(dir / "tree/sub/deep", true, false));
+
+    EXPECT_EQ("DEL: " + dir / "tree/sub/deep/file" + "\nRMDIR: " + dir / "tree/sub/deep" + "\n",
+              log.text());
+}
+
+TEST_F(RemoveTreeTest, WithoutRecursionSubdirectoriesStayAndKeepTheDirectory)
+{
+    EXPECT_FALSE(removeTree(dir / "tree", false, false));
+
+    EXPECT_EQ(Lines({"d 0755 tree", "d 0755 tree/sub", "d 0755 tree/sub/deep",
+                     "f 0644 tree/sub/deep/file", "f 0644 tree/sub/file"}),
+              treeOf(dir.path()));
+    EXPECT_EQ("DEL: " + dir / "tree/file" + "\n", log.text());
+}
+
+TEST_F(RemoveTreeTest, WithoutRecursionADirectoryOfFilesGoes)
+{
+    EXPECT_TRUE(removeTree(dir / "tree/sub/deep", false, false));
+
+    EXPECT_FALSE(pathExists(dir / "tree/sub/deep"));
+}
+
+TEST_F(RemoveTreeTest, DirectoriesCanBeKept)
+{
+    EXPECT_TRUE(removeTree(dir / "tree", true, true));
+
+    EXPECT_EQ(Lines({"d 0755 tree", "d 0755 tree/sub", "d 0755 tree/sub/deep"}),
+              treeOf(dir.path()));
+    EXPECT_EQ(Lines({"DEL: " + dir / "tree/file", "DEL: " + dir / "tree/sub/deep/file",
+                     "DEL: " + dir / "tree/sub/file"}),
+              sortedLines(log.text()));
+}
+
+TEST_F(RemoveTreeTest, KeepingDirectoriesWithoutRecursionDeletesTheFilesOnTop)
+{
+    EXPECT_TRUE(removeTree(dir / "tree", false, true));
+
+    EXPECT_EQ(Lines({"d 0755 tree", "d 0755 tree/sub", "d 0755 tree/sub/deep",
+                     "f 0644 tree/sub/deep/file", "f 0644 tree/sub/file"}),
+              treeOf(dir.path()));
+}
+
+TEST_F(RemoveTreeTest, AMissingDirectoryIsFalseWithoutAWord)
+{
+    EXPECT_FALSE(removeTree(dir / "missing", true, false));
+
+    EXPECT_EQ("", log.text());
+}
+
+TEST_F(RemoveTreeTest, AFileIsNoTree)
+{
+    EXPECT_FALSE(removeTree(dir / "tree/file", true, false));
+
+    EXPECT_TRUE(pathExists(dir / "tree/file"));
+}
+
+TEST_F(RemoveTreeTest, LinksAreDeletedAndNotFollowed)
+{
+    makeDirectories(dir / "links");
+    fs::create_directory_symlink(dir / "tree", dir / "links/to directory");
+    fs::create_symlink("nowhere", dir / "links/to nowhere");
+
+    EXPECT_TRUE(removeTree(dir / "links", true, false));
+
+    EXPECT_FALSE(pathExists(dir / "links"));
+    EXPECT_TRUE(pathExists(dir / "tree/sub/deep/file"));
+}
+
+TEST_F(RemoveTreeTest, AFileThatCannotBeDeletedIsFalse)
+{
+    protect("tree/sub/deep");
+
+    EXPECT_FALSE(removeTree(dir / "tree/sub/deep", true, true));
+
+    EXPECT_TRUE(pathExists(dir / "tree/sub/deep/file"));
+}
+
+TEST_F(RemoveTreeTest, ADirectoryThatIsNotEmptyStaysWithoutAMessage)
+{
+    protect("tree/sub/deep");
+
+    EXPECT_FALSE(removeTree(dir / "tree/sub/deep", true, false));
+
+    EXPECT_EQ("DEL: " + dir / "tree/sub/deep/file" + "\n", log.text());
+}
+
+TEST_F(RemoveTreeTest, AFailureInASubdirectoryAloneIsHidden)
+{
+    protect("tree/sub/deep");
+
+    EXPECT_TRUE(removeTree(dir / "tree", true, true));
+
+    EXPECT_TRUE(pathExists(dir / "tree/sub/deep/file"));
+}
+
+TEST_F(RemoveTreeTest, ALaterSuccessHidesAnEarlierFailure)
+{
+    makeDirectories(dir / "mixed");
+    writeFile(dir / "mixed/file", "");
+    const auto lastName = [&] {
+        std::string name;
+        for (const auto& entry : fs::directory_iterator(dir / "mixed"))
+            name = entry.path().filename().string();
+        return name;
+    };
+    for (int i = 0; lastName() == "file" || i < 2; ++i)
+        makeDirectories(dir / "mixed/sub" + std::to_string(i));
+    protect("mixed");
+
+    EXPECT_TRUE(removeTree(dir / "mixed", true, true));
+
+    EXPECT_TRUE(pathExists(dir / "mixed/file"));
+}
+
+TEST_F(RemoveTreeTest, AnEntryWhoseStatusCannotBeReadIsFalse)
+{
+    ASSERT_EQ(0, chmod((dir / "tree/sub/deep").c_str(), 0444));
+    const OrdinaryRights rights;
+
+    EXPECT_FALSE(removeTree(dir / "tree/sub/deep", true, true));
+
+    EXPECT_EQ("", log.text());
+}
+
+TEST_F(RemoveTreeTest, TheDirectorysOwnStatusCountsAsWell)
+{
+    makeDirectories(dir / "empty");
+    ASSERT_EQ(0, chmod((dir / "empty").c_str(), 0444));
+    const OrdinaryRights rights;
+
+    EXPECT_FALSE(removeTree(dir / "empty", true, false));
+
+    EXPECT_FALSE(pathExists(dir / "empty"));
+    EXPECT_EQ("RMDIR: " + dir / "empty" + "\n", log.text());
+}
+
+TEST_F(RemoveTreeTest, RemovesADirectoryOfADirectory)
+{
+    EXPECT_EQ(0, removeDir(transaction, dir / "tree", "sub", true));
+
+    EXPECT_EQ(Lines({"d 0755 tree", "f 0644 tree/file"}), treeOf(dir.path()));
+}
+
+TEST_F(RemoveTreeTest, RemovesTheBaseItselfForAnEmptyName)
+{
+    EXPECT_EQ(0, removeDir(transaction, dir / "tree/sub/deep", "", false));
+
+    EXPECT_EQ("DEL: " + dir / "tree/sub/deep/file" + "\nRMDIR: " + dir / "tree/sub/deep" + "\n",
+              log.text());
+}
+
+TEST_F(RemoveTreeTest, RemovingADirectoryNeverFails)
+{
+    EXPECT_EQ(0, removeDir(transaction, dir / "tree", "sub", false));
+    EXPECT_EQ(0, removeDir(transaction, dir / "tree", "missing", true));
+
+    EXPECT_TRUE(pathExists(dir / "tree/sub/deep/file"));
+    EXPECT_FALSE(pathExists(dir / "tree/sub/file"));
+}
+
+TEST_F(RemoveTreeTest, NothingIsJournalled)
+{
+    EXPECT_EQ(0, removeDir(transaction, dir / "tree", "", true));
+
+    EXPECT_TRUE(transaction.journal.empty());
+}
+
+TEST_F(RemoveTreeTest, FilesCanBeRemovedFromTheirDirectories)
+{
+    EXPECT_EQ(0, removeFiles(dir / "tree", "sub", true));
+
+    EXPECT_EQ(Lines({"d 0755 tree", "f 0644 tree/file", "d 0755 tree/sub", "d 0755 tree/sub/deep"}),
+              treeOf(dir.path()));
+}
+
+TEST_F(RemoveTreeTest, FilesOfTheTopDirectoryAloneCanBeRemoved)
+{
+    EXPECT_EQ(0, removeFiles(dir / "tree", "", false));
+
+    EXPECT_EQ(Lines({"d 0755 tree", "d 0755 tree/sub", "d 0755 tree/sub/deep",
+                     "f 0644 tree/sub/deep/file", "f 0644 tree/sub/file"}),
+              treeOf(dir.path()));
+}
+
+TEST_F(RemoveTreeTest, RemovingFilesNeverFails)
+{
+    EXPECT_EQ(0, removeFiles(dir / "missing", "", true));
+}
+
+} // namespace
