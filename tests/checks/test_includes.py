@@ -14,7 +14,7 @@ ROWS = [
     "extraction scanner_control environment install_log template_variables tree_removal",
     "registry exploiters common_directory locations property_file",
     "file_operations transaction",
-    "zip_file settings build_stamp version file_codes paths text time_stamps scoped",
+    "zip_file settings build_stamp version file_codes paths text time_stamps scoped unwind_tables",
 ]
 ROW_OF = {name: number for number, row in enumerate(ROWS) for name in row.split()}
 
