@@ -1,13 +1,14 @@
 """Packing a tree into an SPB: the bytes of the archive, and what is refused."""
 
 import os
-import pty
 import struct
 import subprocess
 import zipfile
 from pathlib import Path
 
 import pytest
+
+import spb_tool
 
 REPOSITORY = Path(__file__).resolve().parents[2]
 PACK_TOOLKIT = REPOSITORY / "scripts" / "pack_toolkit.py"
@@ -259,9 +260,7 @@ def test_an_entry_name_of_2048_bytes_is_packed_and_a_longer_one_refused(tree, sp
     (directory / ("f" * (room + 1))).write_bytes(b"1")
 
     said = refusal(tree, spb)
-    assert said.endswith(
-        "f: the entry's name has 2049 bytes with the image root, more than 2048\n"
-    )
+    assert said.endswith("f: the entry's name has 2049 bytes with the image root, more than 2048\n")
     assert said.count("\n") == 1
 
 
@@ -350,33 +349,17 @@ def test_a_missing_output_file_is_a_usage_error(tree):
     assert run.stderr.startswith("usage: spb pack [-h] -o FILE [--stored] DIR\n")
 
 
-def pack_on_a_terminal(tree, spb):
-    """Packs with a terminal for standard error; returns what was shown there."""
-    ours, theirs = pty.openpty()
-    run = subprocess.Popen([PACK_TOOLKIT, tree, "-o", spb], stderr=theirs)
-    os.close(theirs)
-    shown = b""
-    try:
-        while piece := os.read(ours, 4096):
-            shown += piece
-    except OSError:  # the terminal's other end is closed
-        pass
-    os.close(ours)
-    assert run.wait() == 0
-    return shown
-
-
 def test_a_large_tree_shows_its_progress_on_a_terminal(tree, spb):
     plant(tree, {f"bin/{number}": b"1" for number in range(1000)})
 
-    shown = pack_on_a_terminal(tree, spb)
+    shown = spb_tool.shown_on_a_terminal("pack", tree, "-o", spb)
 
     assert shown.startswith(b"\rspb: packing, ")
     assert shown.endswith(b" %\x1b[K\r\x1b[K")
 
 
 def test_a_small_tree_is_packed_in_silence_on_a_terminal(tree, spb):
-    assert pack_on_a_terminal(tree, spb) == b""
+    assert spb_tool.shown_on_a_terminal("pack", tree, "-o", spb) == b""
 
 
 def test_a_large_tree_shows_no_progress_without_a_terminal(tree, spb):
