@@ -14,11 +14,13 @@ packages='
     g++
     g++-multilib
     googletest
+    groff-base
     lib32z1-dev
     libclang-rt-14-dev
     ninja-build
     python3
     python3-pytest
+    scdoc
     strace
     zlib1g-dev
 '

@@ -3,12 +3,16 @@
 import json
 import os
 import pty
+import runpy
 import subprocess
+from pathlib import Path
 
 import toolkit
 from spb import DEFLATED, IMAGE_ROOT, STORED, Archive
 
-TOOL = os.path.realpath(os.path.join(os.path.dirname(__file__), "../../tools/spb"))
+REPOSITORY = Path(__file__).resolve().parents[2]
+SCRIPTS = REPOSITORY / "scripts"
+TOOL = str(REPOSITORY / "tools" / "spb")
 
 FILES = {
     **toolkit.FILES,
@@ -58,3 +62,8 @@ def shown_on_a_terminal(*arguments):
     os.close(ours)
     assert process.wait() == 0
     return shown
+
+
+def codes():
+    """Every code that `spb check` can tell, and its kind."""
+    return runpy.run_path(TOOL)["CODES"]

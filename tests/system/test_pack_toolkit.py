@@ -53,11 +53,11 @@ def spb(tmp_path):
     return tmp_path / "toolkit.spb"
 
 
-def refusal(tree, spb):
+def refusal(tree, spb, *options):
     """Packs `tree`, which must fail and leave nothing; returns what was said."""
     before = set(spb.parent.iterdir())
 
-    run = pack(tree, spb)
+    run = pack(tree, spb, *options)
 
     assert run.returncode == 1
     assert run.stdout == ""
@@ -270,6 +270,15 @@ def test_a_file_of_2_gib_is_refused_before_it_is_read(tree, spb):
     assert refusal(tree, spb) == "spb: bin/huge: a file of 2 GiB or more cannot be installed\n"
 
 
+def test_a_package_of_2_gib_is_refused(tree, spb):
+    for name in "one", "two":
+        os.truncate(plant(tree, {f"bin/{name}": b"1"}) / "bin" / name, 2**30)
+
+    assert refusal(tree, spb, "--stored") == (
+        "spb: the package would reach 2 GiB, more than the installer can read\n"
+    )
+
+
 @pytest.mark.parametrize(
     "make, reason",
     [
@@ -289,6 +298,18 @@ def test_a_newline_in_a_name_is_refused(tree, spb):
 
     assert refusal(tree, spb) == (
         "spb: bin/a\\nb: a newline in a name would break the index of installed files\n"
+    )
+
+
+def test_a_file_name_that_leaves_no_room_for_a_backup_is_refused(tree, spb):
+    plant(tree, {"bin/" + "n" * 251: b"1"})
+    assert pack(tree, spb).returncode == 0
+
+    plant(tree, {"bin/" + "n" * 252: b"1"})
+
+    assert refusal(tree, spb) == (
+        f"spb: bin/{'n' * 252}: a file's name of more than 251 bytes leaves an upgrade no room for"
+        " a backup\n"
     )
 
 

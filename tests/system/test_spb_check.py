@@ -3,6 +3,7 @@
 import json
 import random
 import struct
+import subprocess
 
 import pytest
 
@@ -403,8 +404,13 @@ SURPRISES = {
         package({"install/trawlcfg.sh": b"cd '$(ZOR_DestinationDir)' '$(CorvanCommonDir)'\n"}),
         [("missing-placeholder", "install/trawlcfg.sh")],
     ),
+    "a placeholder that is filled in elsewhere only": (
+        package({"config/ZorTrace.properties": b"a=$(ZOR_DestinationDir)$(CorvanCommonDir)\n"
+                                               b"b=$(ZOR_ConfigRootDirectory)\n"}),
+        [("unknown-placeholder", "config/ZorTrace.properties")],
+    ),
     "a placeholder that nobody fills in": (
-        package({"config/ZorTrace.properties": b"a=$(ZOR_DestinationDir)$(FileSeparator)b\n"
+        package({"config/ZorTrace.properties": b"a=$(ZOR_DestinationDir)$(NoSuch)b\n"
                                                b"b=$(ZOR_ConfigRootDirectory)\n"}),
         [("unknown-placeholder", "config/ZorTrace.properties")],
     ),
@@ -499,7 +505,7 @@ def damaged(seed):
         start = dice.choice([0, central, len(content) - END_SIZE])
         content[dice.randrange(start, len(content))] = dice.choice([0, 1, 8, 47, 255])
     if dice.random() < 0.2:
-        del content[dice.randrange(len(content)):]
+        del content[dice.randrange(len(content)) :]
     return bytes(content)
 
 
@@ -512,6 +518,16 @@ def test_check_and_installer_agree_on_a_damaged_package(empty_machine, seed):
     # What a damaged scanner control does when it is called, nobody can tell beforehand.
     if "bin/trawlcfg" not in [entry for _, _, entry in findings]:
         assert (status == 2) == (outcome.status != 0), (findings, outcome.stdout)
+
+
+def test_the_packed_example_toolkit_has_nothing_to_tell_and_installs(empty_machine, tmp_path):
+    subprocess.run([spb_tool.SCRIPTS / "build_toolkit.sh", tmp_path / "toolkit"], check=True)
+    content = tmp_path / "toolkit.spb"
+    assert spb_tool.run("pack", tmp_path / "toolkit", "-o", content).returncode == 0
+
+    assert spb_tool.check(content) == (0, [])
+
+    assert install(empty_machine, content.read_bytes()).status == 0
 
 
 def test_findings_are_told_one_a_line(spb):
@@ -584,3 +600,14 @@ def test_a_large_package_shows_its_progress_on_a_terminal(spb):
 
     assert shown.startswith(b"\rspb: checking, ")
     assert shown.endswith(b" %\x1b[K\r\x1b[K")
+
+
+def test_every_code_has_a_case():
+    """So that no code is without its proof against the installer."""
+    met = {}
+    for findings in [findings for _, findings in FAILS.values()]:
+        met.update({code: kind for kind, code, _ in told(findings, "fails")})
+    for findings in [findings for _, findings in SURPRISES.values()]:
+        met.update({code: kind for kind, code, _ in told(findings, "surprises")})
+
+    assert met == spb_tool.codes()
