@@ -22,3 +22,8 @@ if(WZOR_SANITIZE)
 elseif(CMAKE_BUILD_TYPE STREQUAL "Release")
   include(cmake/shipping.cmake)
 endif()
+
+if(WZOR_FUZZ) # coverage for libFuzzer; its main() only goes into the fuzz targets
+  target_compile_options(wzor_options INTERFACE -fsanitize=fuzzer-no-link)
+  target_link_options(wzor_options INTERFACE -fsanitize=fuzzer-no-link)
+endif()
