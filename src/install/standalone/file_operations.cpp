@@ -23,6 +23,25 @@ ScopedFd openForWriting(const std::string& path)
     return ScopedFd(open(path.c_str(), O_WRONLY | O_CREAT | O_TRUNC | O_CLOEXEC, NewFileMode));
 }
 
+/// Opens `destination` for an extracted file, its old content backed up; returns 0, or the code of
+/// what failed.
+///
+/// Hardly ever anything lies there, so creating it comes first and looking at what is there only
+/// when that fails, whatever the reason: the second road tells it.
+int openDestination(FileTransaction& transaction, const std::string& destination, ScopedFd& file)
+{
+    file =
+        ScopedFd(open(destination.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_CLOEXEC, NewFileMode));
+    if (file.isOpen())
+        return FileOk;
+
+    const int backedUp = backupFile(transaction, destination);
+    if (backedUp != FileOk)
+        return backedUp;
+    file = openForWriting(destination);
+    return file.isOpen() ? FileOk : CannotOpenForWriting;
+}
+
 /// Writes all of `data`; returns 0 or the code of the failed write.
 int writeAll(int fd, const char* data, std::size_t size)
 {
@@ -131,13 +150,11 @@ int extractFile(FileTransaction& transaction, const ZipFile& archive, const ZipE
     const std::unique_ptr<InputStream> stream(archive.getInputStream(&entry));
     if (!stream)
         return CannotOpenForReading;
-    const int backedUp = backupFile(transaction, destination);
-    if (backedUp != FileOk)
-        return backedUp;
 
-    ScopedFd file = openForWriting(destination);
-    if (!file.isOpen())
-        return CannotOpenForWriting;
+    ScopedFd file(-1);
+    const int opened = openDestination(transaction, destination, file);
+    if (opened != FileOk)
+        return opened;
     record(transaction, Created, destination); // before its first byte: a rollback finds it
 
     const int code = writeContent(*stream, file.get());

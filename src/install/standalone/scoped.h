@@ -32,7 +32,11 @@ public:
     ScopedFd(ScopedFd&& other) noexcept : fd_(other.release()) {}
     ScopedFd(const ScopedFd&) = delete;
     ScopedFd& operator=(const ScopedFd&) = delete;
-    ScopedFd& operator=(ScopedFd&&) = delete;
+    ScopedFd& operator=(ScopedFd&& other) noexcept
+    {
+        std::swap(fd_, other.fd_);
+        return *this;
+    }
     ~ScopedFd()
     {
         if (isOpen())
