@@ -289,6 +289,23 @@ def test_a_property_file_that_cannot_be_saved_fails_the_installation(machine, na
 
 
 @pytest.mark.parametrize("name", ["Zor.properties", "ZorTrace.properties"])
+def test_a_directory_in_place_of_a_property_file_cannot_be_saved(machine, name):
+    path = "/opt/corvan/zor/config/" + name
+    machine.pack({f"config/{name}/": b""}, without=("config/" + name,))
+    before = machine.tree()
+
+    outcome = fail(machine)
+
+    # It opens for reading, and reads as a file without lines.
+    printed_lines(outcome, f"Customizing property file: {path}",
+                  f"Saving file {path} error: 21 (Is a directory)",
+                  "Could not save property file",
+                  "Installation failed, rolling back",
+                  "Done.")
+    rolled_back(machine, before, FILE_INDEX)
+
+
+@pytest.mark.parametrize("name", ["Zor.properties", "ZorTrace.properties"])
 def test_a_property_file_that_cannot_be_read_fails_the_installation(machine, name):
     path = "/home/ann/corvan/zor/config/" + name
     machine.pack(without=("config/" + name,))

@@ -153,3 +153,17 @@ Could not save script file /home/ann/corvan/zor/install/trawlcfg.sh
 Updating file with variables /home/ann/corvan/zor/install/rmdirs.sh
 """ in outcome.stdout
     assert machine.read("/home/ann/corvan/zor/install/trawlcfg.sh") == "$(ZOR_DestinationDir)\n"
+
+
+def test_a_directory_in_place_of_a_script_costs_nothing(machine):
+    machine.pack({"install/trawlcfg.sh/": b""}, without=("install/trawlcfg.sh",))
+
+    outcome = machine.run("i", "ABC", "-s", SPB)
+
+    assert outcome.status == 0
+    assert """
+Updating: /opt/corvan/zor/install/trawlcfg.sh
+Saving file /opt/corvan/zor/install/trawlcfg.sh error: 21 (Is a directory)
+Could not save script file /opt/corvan/zor/install/trawlcfg.sh
+Updating file with variables /opt/corvan/zor/install/rmdirs.sh
+""" in outcome.stdout
