@@ -7,7 +7,7 @@
 #include "settings.h"
 
 #include <cstdlib>
-#include <cstring>
+#include <deque>
 #include <iostream>
 
 namespace {
@@ -111,8 +111,9 @@ void setLibraryPath(const std::string& home)
     if (debugMode)
         *logstream << "Setting '" << LibraryPathName << "' to '" << setting << "'\n";
 
-    // The environment keeps pointing at the buffer: it stays for the rest of the process.
-    const int result = putenv(strdup(setting.c_str())); // NOLINT(clang-analyzer-unix.Malloc)
+    // The environment keeps pointing at the text: it stays for the rest of the process.
+    static auto& texts = *new std::deque<std::string>;
+    const int result = putenv(texts.emplace_back(setting).data());
     if (result != 0)
         *logstream << "Setting up the '" << LibraryPathName
                    << "' variable has failed. Error = " << result << '\n';
