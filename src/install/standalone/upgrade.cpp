@@ -114,19 +114,11 @@ int loadOrSay(PropertyFile& file, const std::string& path)
     return code;
 }
 
-/// Brings the installed "Zor.properties", the user's settings in it, to the package's version.
-/// `file` holds its lines afterwards, `kept` what it said about traces before.
-int upgradeProperties(PropertyFile& file, KeptTraceTexts& kept, const std::string& home,
-                      const InstallRegistry& package, const std::string& common)
+/// Edits the lines of the installed "Zor.properties", the user's settings among them, for the
+/// package's version.
+void upgradeProperties(PropertyFile& file, const std::string& home, const InstallRegistry& package,
+                       const std::string& common)
 {
-    const std::string path = joinPath(joinPath(home, spbCfgDir), zorProps);
-    *logstream << "Customizing properties file: " << path << '\n';
-    const int loaded = loadOrSay(file, path);
-    if (loaded != 0)
-        return loaded;
-
-    kept = {textOfKey(file, "trace_level"), textOfKey(file, "trace_file_path"),
-            textOfKey(file, "trace_file")};
     for (const char* const key : ObsoleteKeys)
         file.clearWhereKeyContains(key);
     setPackageVersion(file, package);
@@ -137,7 +129,6 @@ int upgradeProperties(PropertyFile& file, KeptTraceTexts& kept, const std::strin
     replaceAll(file, tokenCorvanCommonDir, common);
     replaceAll(file, tokenFileSeparator, "/");
     replaceAll(file, tokenScannerMode, fileScannerMode);
-    return saveOrSay(file, path);
 }
 
 /// Logs the trace directory that "Zor.properties" names, if it names one.
@@ -171,10 +162,20 @@ int upgradeTraceProperties(const KeptTraceTexts& kept, const std::string& home)
 /// Property files and scripts of the extracted package.
 int customizeDeployment(const std::string& home, const InstallRegistry& package, bool useCustomPath)
 {
-    const std::string common = readCommonDirectory(useCustomPath);
+    const std::string path = joinPath(joinPath(home, spbCfgDir), zorProps);
+    *logstream << "Customizing properties file: " << path << '\n';
     PropertyFile properties;
-    KeptTraceTexts kept;
-    int code = upgradeProperties(properties, kept, home, package, common);
+    int code = loadOrSay(properties, path);
+    if (code != 0)
+        return code;
+
+    const KeptTraceTexts kept = {textOfKey(properties, "trace_level"),
+                                 textOfKey(properties, "trace_file_path"),
+                                 textOfKey(properties, "trace_file")};
+    // Not before: the setting of the common directory may be written here.
+    const std::string common = readCommonDirectory(useCustomPath);
+    upgradeProperties(properties, home, package, common);
+    code = saveOrSay(properties, path);
     if (code != 0)
         return code;
 
