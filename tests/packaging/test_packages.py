@@ -30,6 +30,11 @@ INSTALLED = """\
 644 /usr/share/man/man8/wzorinst.8.gz
 """
 
+SPB_INSTALLED = """\
+755 /usr/bin/spb
+644 /usr/share/man/man1/spb.1.gz
+"""
+
 STATUS_REPORT = """\
 ZOR installer version: 22/12/02zor_9.2.30.0000
 Default install type: global
@@ -255,4 +260,4 @@ def test_install_goes_below_the_prefix_that_is_given(build, tmp_path):
     found = sorted(str(path.relative_to(tmp_path)) for path in tmp_path.rglob("*")
                    if not path.is_dir())
     assert found == sorted(line.split()[1].removeprefix("/usr/")
-                           for line in (INSTALLED + "755 /usr/bin/spb\n").splitlines())
+                           for line in (INSTALLED + SPB_INSTALLED).splitlines())
