@@ -283,6 +283,23 @@ def test_an_aborted_installation_leaves_what_it_had_done(machine):
     assert not machine.exists("/etc/zor")
 
 
+def test_an_abort_loses_no_trace_line(machine):
+    package = archive().add(IMAGE_ROOT + "bin/zz", b"0123456789", DEFLATED, size=9)
+
+    outcome = run(machine, package, "-v")
+
+    assert outcome.stdout.endswith("\nextractFile: /opt/corvan/zor/bin/zz\n")
+
+
+def test_an_abort_loses_no_line_of_the_log_file(machine):
+    package = archive().add(IMAGE_ROOT + "config/zz", b"0123456789", DEFLATED, size=9)
+
+    run(machine, package, "-o", "/tmp/log")
+
+    assert machine.read("/tmp/log").endswith("\nStarting file extraction...\n"
+                                             "Extracting configs to '/opt/corvan/zor/config'\n")
+
+
 @pytest.mark.parametrize("root", [
     "", "images/linux-ix86/", IMAGE_ROOT.replace("linux-ix86", "aix4-r1"),
     IMAGE_ROOT[1:], "/x" + IMAGE_ROOT, IMAGE_ROOT.upper()])

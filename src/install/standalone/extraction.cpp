@@ -65,7 +65,7 @@ int extractConfigs(FileTransaction& transaction, const ZipFile& archive, const s
     if (!freshInstall)
         appendToNameList(skipList, prefix + zorProps);
 
-    *logstream << "Extracting configs to '" << destination << "'\n";
+    *logstream << "Extracting configs to '" << destination << "'\n" << std::flush;
     return extractEntries(transaction, archive, prefix, destination, PublicMode, &skipList,
                           zor_file_handle, false);
 }
@@ -100,7 +100,7 @@ int extractDirs(FileTransaction& transaction, const ZipFile& archive, const std:
 int extractPackage(const std::string& spbPath, FileTransaction& transaction,
                    InstallRegistry& installation, bool freshInstall, const std::string* logPath)
 {
-    *logstream << "Starting file extraction...\n" << std::flush; // a damaged entry may end the run
+    *logstream << "Starting file extraction...\n" << std::flush; // an entry may end the process
     const ZipFile archive(spbPath.c_str());
     if (archive.entries().empty()) {
         *logstream << "*** Error: package not found or not valid.\n";

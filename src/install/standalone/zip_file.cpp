@@ -3,6 +3,7 @@
 
 #include <algorithm>
 #include <cassert>
+#include <cstdio>
 #include <cstring>
 #include <limits>
 
@@ -329,9 +330,11 @@ int X__DeflatedInputStream::read(char* buf, int len)
     // Deliberate: with `len` 0 or below this counts the room that the previous call left, and an
     // entry that inflates to more than its recorded size ends the program.
     const auto result = static_cast<int>(static_cast<unsigned>(len) - inflate_.avail_out);
-    if (!(available_ >= static_cast<unsigned>(result)))
+    if (!(available_ >= static_cast<unsigned>(result))) {
+        (void)std::fflush(nullptr); // what was printed so far; the abort would drop it
         __assert_fail("available_ >= (unsigned) result", "zip_file", 432,
                       "virtual int X__DeflatedInputStream::read(char*, int)");
+    }
     available_ -= static_cast<unsigned>(result);
     return result;
 }
