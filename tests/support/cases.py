@@ -1,0 +1,116 @@
+"""What the rules of the sweeps are made of: a run that met a failure, and what a rule is.
+
+A rule names one way in which the installer deliberately does less than "all or nothing", and
+excuses the difference at one path of a case only where everything that is known about the case
+speaks for it.
+"""
+
+from dataclasses import dataclass, field
+
+from roads import HOME
+
+BACKUP = ".bak"
+
+
+@dataclass(frozen=True)
+class Rule:
+    """`excuses` tells of a case and a path whether the rule excuses the difference there."""
+
+    name: str
+    reason: str
+    statuses: tuple
+    excuses: object
+
+
+class RuleBook(list):
+    """The rules of a sweep, in the order in which they are asked."""
+
+    def rule(self, name, reason, *statuses):
+        """Makes the decorated function a rule for runs that end with one of `statuses`."""
+        def add(function):
+            self.append(Rule(name, reason, statuses, function))
+            return function
+        return add
+
+    def first(self, case, path):
+        """The name of the first rule that excuses the difference at `path`, or None."""
+        return next((rule.name for rule in self
+                     if case.status in rule.statuses and rule.excuses(case, path)), None)
+
+
+@dataclass
+class Case:
+    """One run that met a failure: where, how it ended, and what it found and left."""
+
+    road: object
+    point: object
+    error: str
+    status: int
+    output: str
+    before: dict
+    after: dict
+    normal: dict  # what the undisturbed run leaves
+    package: dict  # the SPB's bytes and, by the path that it gets, each of its files
+    reference: object  # gives the tree of a run on a machine that differs in a named way
+    excused: dict = field(default_factory=dict)  # path to the rule's name
+    violations: list = field(default_factory=list)
+
+    @property
+    def wanted(self):
+        if self.status != 0:
+            return self.before
+        return self.reference("without its failure") if self.road.fails else self.normal
+
+    @property
+    def hit(self):
+        """The path of the failing call, without a slash at its end."""
+        return self.point.path.rstrip("/")
+
+    @property
+    def kind(self):
+        return self.point.kind
+
+    def hits_above(self, path):
+        """True when the call failed on `path` or on a directory that leads to it."""
+        return is_below(path, self.hit) and self.hit != ""
+
+    def content(self, path):
+        """The bytes found at `path` afterwards, or None."""
+        node = self.after.get(path)
+        return node.content if node and node.kind == "f" else None
+
+    def lost(self, path):
+        return path in self.wanted and path not in self.after
+
+    def new(self, path):
+        return path not in self.wanted and path in self.after
+
+    def unchanged(self, path):
+        """True when what the run found at `path` still is there, whatever its mode."""
+        found, got = self.before.get(path), self.after.get(path)
+        return (found is not None and got is not None and found.kind == got.kind
+                and found.content == got.content)
+
+    def says(self, text):
+        """True when the run printed `text`, or could not print."""
+        return text in self.output or self.hit == "standard output"
+
+    def only_mode_differs(self, path):
+        wanted, got = self.wanted.get(path), self.after.get(path)
+        return (wanted is not None and got is not None and wanted.kind == got.kind
+                and wanted.content == got.content)
+
+
+def is_below(path, directory):
+    return path == directory or path.startswith(directory + "/")
+
+
+def lines_of(content):
+    return content.split(b"\n")
+
+
+def contents_before(case, path):
+    """What a backup of `path` may hold: for a file of "config/xss" also what the package brings."""
+    node = case.before.get(path)
+    found = [node.content] if node else []
+    return found + [case.package[path]] if is_below(path, HOME + "/config/xss") else found

@@ -1,0 +1,206 @@
+"""The roads that the sweeps of failures take: what lies on the machine, and the command given.
+
+A `Road` is a command line of the installer together with the tree that it finds. The machine of a
+road is furnished once, with the real binary and the example toolkit, and kept as a tree; `restore`
+brings any machine back to such a tree, byte for byte and mode for mode.
+"""
+
+import os
+import re
+import subprocess
+import tempfile
+from dataclasses import dataclass, field
+
+import bubblewrap
+from machine import BINARY, ROOT, SPB, Machine, Node
+
+REPOSITORY = os.path.realpath(os.path.join(os.path.dirname(__file__), "../.."))
+
+HOME = "/opt/corvan/zor"
+INDEX = HOME + "/ZOR_files"
+CONTROL = HOME + "/bin/trawlcfg"
+CONTROL_STATE = HOME + "/config/trawlcfg.state"
+SETTINGS = HOME + "/config/Zor.properties"
+TRACE_SETTINGS = HOME + "/config/ZorTrace.properties"
+SCRIPTS = (HOME + "/install/trawlcfg.sh", HOME + "/install/rmdirs.sh")
+INSTALL_TYPE = HOME + "/install/zor_install.properties"
+SINGLE_USER_FLAG = HOME + "/config/SingleUserMode"
+PROBE = HOME + "/$_ZOR_$"
+REGISTRY = "/etc/zor/zor.ini"
+COMMON_SETTING = "/etc/kel/corvan/common/cfg/log.properties"
+SITE_COMMON = "/usr/kel/site/common"
+
+# Outside of what a tree shows, so that the number of commands plays no part in it.
+COMMAND_LOG = "/var/commands"
+
+OLD_FILE = HOME + "/bin/trawlold"
+OLD_PROPERTIES = HOME + "/properties/old.properties"
+OBSOLETE_FILES = tuple(HOME + "/bin/" + name
+                       for name in ("trawlnet", "libzor.so", "kpo_config.xml"))
+
+
+@dataclass(frozen=True)
+class Road:
+    """One way through the installer. `fails` tells how an undisturbed run ends."""
+
+    name: str
+    title: str
+    arguments: tuple
+    furnish: object
+    fails: bool = False
+    environment: dict = field(default_factory=dict)
+
+    def run(self, machine, tool=()):
+        """Runs the installer on `machine`, under the command `tool`."""
+        environment = {"ZOR_COMMAND_LOG": COMMAND_LOG, **self.environment}
+        return machine.execute([*tool, BINARY, *self.arguments], ROOT, 0o022, environment, (),
+                               False)
+
+
+def toolkit_package():
+    """The example toolkit as the bytes of an SPB."""
+    scripts = os.path.join(REPOSITORY, "scripts")
+    with tempfile.TemporaryDirectory(prefix="toolkit-") as directory:
+        tree, package = os.path.join(directory, "tree"), os.path.join(directory, "spb")
+        subprocess.run([os.path.join(scripts, "build_toolkit.sh"), tree], check=True)
+        subprocess.run([os.path.join(scripts, "pack_toolkit.py"), tree, "-o", package],
+                       check=True, stdout=subprocess.DEVNULL)
+        with open(package, "rb") as file:
+            return file.read()
+
+
+def new_machine(binary, package):
+    """An empty machine with `binary` and the package `package`."""
+    machine = Machine(binary)
+    machine.plant(SPB, package)
+    machine.make_directory("/var/strace", 0o777)
+    return machine
+
+
+# Furnishing.
+
+def nothing_installed(_):
+    """A machine that never saw the toolkit."""
+
+
+def two_exploiters(machine):
+    """A shared installation of this version, used by SHOP and DESK."""
+    machine.plant(COMMON_SETTING, f"# ours\ncorvan_common_dir={SITE_COMMON}\n", 0o664)
+    for exploiter in ("SHOP", "DESK"):
+        environment = {"ZOR_COMMAND_LOG": COMMAND_LOG}
+        outcome = machine.run("i", exploiter, "-s", SPB, environment=environment)
+        assert outcome.status == 0, outcome.stdout
+
+
+def register_version(machine, version, build_date):
+    text = machine.read(REGISTRY)
+    text = re.sub(r"(?m)^ZOR_Version = .*$", f"ZOR_Version = {version}", text)
+    text = re.sub(r"(?m)^ZOR_BuildDate = .*$", f"ZOR_BuildDate = {build_date}", text)
+    machine.plant(REGISTRY, text, 0o640)
+
+
+def older_version(machine):
+    """An older version with other contents and modes, files of its own and an owner's changes."""
+    two_exploiters(machine)
+    register_version(machine, "9.1.7.0003", "21/03/04")
+    for path, node in machine.tree(HOME).items():
+        if node.kind == "f" and path not in (INDEX, SETTINGS, INSTALL_TYPE, CONTROL_STATE):
+            machine.plant(path, node.content + b"# 9.1.7.0003\n", node.mode)
+    machine.change_mode(HOME + "/bin/trawlhw", 0o700)
+    machine.change_mode(HOME + "/config/ZorHWConfig.xml", 0o600)
+
+    for path in (*OBSOLETE_FILES, OLD_FILE, OLD_PROPERTIES):
+        machine.plant(path, "of 9.1.7.0003\n")
+    listed = machine.read(INDEX) + "".join(f"{path}\n" for path in (OLD_FILE, OLD_PROPERTIES))
+    machine.plant(INDEX, listed)
+
+    settings = machine.read(SETTINGS).replace("version=9.2.30.0000", "version=9.1.7.0003")
+    settings = settings.replace("fscanner.changepriority=normal", "fscanner.changepriority=low")
+    settings = settings.replace("swscanner.firsttimeonly=false\n", "")
+    machine.plant(SETTINGS, settings + "trawlnet.cputhreshold=1:1:1:1\nsite.note=kept\n")
+
+    machine.plant(HOME + "/bin/etc/site.conf", "of the owner\n")
+    machine.plant(HOME + "/config/site.xml", "<site/>\n")
+    machine.plant(HOME + "/cache_data/deep/old.cache", "stale\n")
+
+
+def newer_version(machine):
+    """An installation that is newer than the installer."""
+    older_version(machine)
+    register_version(machine, "9.9.0.0001", "23/01/02")
+
+
+def last_exploiter(machine):
+    """An older installation that only SHOP uses."""
+    older_version(machine)
+    machine.plant(REGISTRY, machine.read(REGISTRY).replace("SHOP:DESK:", "SHOP:"), 0o640)
+
+
+def with_registry_that_cannot_be_saved(furnish):
+    """A directory at the registry's backup name stops the last fatal step."""
+    def furnish_so(machine):
+        furnish(machine)
+        machine.make_directory(REGISTRY + ".bak")
+    return furnish_so
+
+
+ROADS = {road.name: road for road in (
+    Road("install", "fresh installation", ("i", "SHOP", "-s", SPB), nothing_installed),
+    Road("upgrade", "upgrade of an older version", ("i", "CLUB", "-s", SPB), older_version),
+    Road("register", "registration on a newer version", ("i", "CLUB", "-s", SPB), newer_version),
+    Road("unregister", "removal of one of two exploiters", ("r", "DESK"), two_exploiters),
+    Road("remove", "removal of the last exploiter", ("r", "SHOP"), last_exploiter),
+    Road("failing-install", "fresh installation whose last step fails",
+         ("i", "SHOP", "-s", SPB, "-r"), nothing_installed, True,
+         {"ZOR_FAIL": "-s common_trace_path:9"}),
+    Road("failing-upgrade", "upgrade whose last step fails", ("i", "CLUB", "-s", SPB),
+         with_registry_that_cannot_be_saved(older_version), True),
+    Road("failing-register", "registration whose last step fails", ("i", "CLUB", "-s", SPB),
+         with_registry_that_cannot_be_saved(newer_version), True),
+)}
+
+
+# Trees.
+
+def tree_of(machine):
+    """The machine's whole tree; the time in the index's first line is left out."""
+    tree = machine.tree()
+    if INDEX in tree:
+        node = tree[INDEX]
+        content = re.sub(rb"( installed on )[-0-9T:]+\n", rb"\1TIME\n", node.content, count=1)
+        tree[INDEX] = Node(node.kind, node.mode, content)
+    return tree
+
+
+def restore(machine, tree):
+    """Makes the machine's tree equal to `tree` again."""
+    now = tree_of(machine)
+    for path in sorted(now, reverse=True):
+        if path not in tree or tree[path].kind != now[path].kind:
+            machine.remove(path)
+    for path in sorted(tree):
+        if now.get(path) == tree[path]:
+            continue
+        node = tree[path]
+        if node.kind == "f":
+            machine.plant(path, node.content, node.mode)
+        elif node.kind == "d":
+            machine.make_directory(path, node.mode)
+            machine.change_mode(path, node.mode)
+        elif now.get(path) != node:
+            machine.link(path, node.content.decode())
+
+
+def differences(wanted, got):
+    """The paths at which two trees differ."""
+    return [path for path in sorted(set(wanted) | set(got)) if wanted.get(path) != got.get(path)]
+
+
+def furnished(road, binary, package):
+    """The tree of the machine on which `road` begins."""
+    machine = new_machine(binary, package)
+    try:
+        road.furnish(machine)
+        return tree_of(machine)
+    finally:
+        bubblewrap.delete_root(machine.root)

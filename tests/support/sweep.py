@@ -1,0 +1,195 @@
+"""What the sweeps of failures share: their command line, their machines, and their tables.
+
+A `Laboratory` has one machine a job; a `Bench` is one road on it: the tree that the road finds, the
+one that an undisturbed run leaves, the points of that run, and further trees to compare with.
+"""
+
+import argparse
+import collections
+import io
+import os
+import queue
+import subprocess
+import textwrap
+import threading
+import zipfile
+from concurrent.futures import ThreadPoolExecutor
+from dataclasses import replace
+
+import exemptions
+import failure_points
+from machine import SPB
+from roads import (COMMON_SETTING, CONTROL, HOME, INDEX, REGISTRY, REPOSITORY, ROADS, furnished,
+                   new_machine, restore, toolkit_package, tree_of)
+from spb import IMAGE_ROOT
+
+PRESETS = ("release", "release-i686")
+
+
+def arguments_of(description, roads):
+    """Parses a sweep's command line. `roads` are the names of those that it can take."""
+    parser = argparse.ArgumentParser(
+        description=description, formatter_class=argparse.RawDescriptionHelpFormatter)
+    binary = parser.add_mutually_exclusive_group()
+    binary.add_argument("--preset", choices=PRESETS, default=PRESETS[0],
+                        help="build and run the 64-bit or the 32-bit program (default: release)")
+    binary.add_argument("--binary", metavar="FILE", help="run this wzorinst instead")
+    parser.add_argument("--road", action="append", choices=roads, metavar="ROAD",
+                        help="take only this road; can be given again. Roads: " + ", ".join(
+                            f"{name} ({ROADS[name].title})" for name in roads))
+    parser.add_argument("--every", type=int, default=1, metavar="N",
+                        help="try every Nth point only")
+    parser.add_argument("--point", metavar="POINT",
+                        help="try only this point, as the list of violations names it, and show "
+                        "everything about it; with one --road")
+    parser.add_argument("--jobs", type=int, default=os.cpu_count(), metavar="N",
+                        help="runs at the same time (default: one a processor)")
+    arguments = parser.parse_args()
+    if arguments.every < 1 or arguments.jobs < 1:
+        parser.error("N must be at least 1")
+    if arguments.point and len(arguments.road or ()) != 1:
+        parser.error("--point needs one --road")
+    arguments.roads = [ROADS[name] for name in arguments.road or roads]
+    arguments.binary = os.path.realpath(arguments.binary or built(arguments.preset))
+    return arguments
+
+
+def built(preset):
+    """Builds the installer; returns its path."""
+    for command in (["cmake", "--preset", preset],
+                    ["cmake", "--build", "--preset", preset, "--target", "wzorinst"]):
+        subprocess.run(command, cwd=REPOSITORY, check=True, stdout=subprocess.DEVNULL)
+    return os.path.join(REPOSITORY, "build", preset, "src/install/standalone/wzorinst")
+
+
+class Laboratory:
+    """The binary, the package and the machines of a sweep; use it by `with`."""
+
+    def __init__(self, binary, jobs):
+        self.binary = binary
+        self.jobs = jobs
+        self.package = toolkit_package()
+
+    def __enter__(self):
+        self.all_machines = [new_machine(self.binary, self.package) for _ in range(self.jobs + 1)]
+        self.spare, *others = self.all_machines
+        self.free = queue.Queue()
+        for machine in others:
+            self.free.put(machine)
+        return self
+
+    def __exit__(self, *_):
+        for machine in self.all_machines:
+            machine.delete()
+
+    def run_all(self, jobs, work):
+        """The results of `work`(machine, job) for each job, in the order of the jobs."""
+        def on_a_free_machine(job):
+            machine = self.free.get()
+            try:
+                return work(machine, job)
+            finally:
+                self.free.put(machine)
+
+        with ThreadPoolExecutor(self.jobs) as pool:
+            return list(pool.map(on_a_free_machine, jobs))
+
+
+class Bench:
+    """One road of a laboratory."""
+
+    def __init__(self, laboratory, road):
+        self.road = road
+        self.spare = laboratory.spare
+        self.before = furnished(road, laboratory.binary, laboratory.package)
+        restore(self.spare, self.before)
+        self.undisturbed, self.points = failure_points.trace(road, self.spare)
+        self.normal = tree_of(self.spare)
+        assert self.undisturbed.status == int(road.fails), self.undisturbed.stdout
+        self.package = package_files(laboratory.package)
+        self.trees = {}
+        self.lock = threading.Lock()
+
+    def reference(self, name):
+        """The tree of a run on a machine that differs as `name` says."""
+        with self.lock:
+            if name not in self.trees:
+                restore(self.spare, self.before)
+                self.trees[name] = REFERENCES[name](self.road, self.spare)
+            return self.trees[name]
+
+
+def package_files(package):
+    """The package's bytes by SPB, and its files as they lie in it by the paths that they get."""
+    files = {SPB: package}
+    with zipfile.ZipFile(io.BytesIO(package)) as archive:
+        for name in archive.namelist():
+            if not name.endswith("/"):
+                files[HOME + "/" + name.removeprefix(IMAGE_ROOT)] = archive.read(name)
+    return files
+
+
+# Trees to compare with.
+
+def run_without(*paths):
+    """The tree that a road leaves on a machine without these paths."""
+    def run(road, machine):
+        for path in paths:
+            if machine.exists(path):
+                machine.remove(path)
+        road.run(machine)
+        return tree_of(machine)
+    return run
+
+
+def run_with_an_empty_index(road, machine):
+    machine.plant(INDEX, "", machine.mode(INDEX))
+    return run_without()(road, machine)
+
+
+def run_without_its_failure(road, machine):
+    return run_without(REGISTRY + ".bak")(replace(road, environment={}), machine)
+
+
+def run_twice(road, machine):
+    road.run(machine)
+    return run_without()(road, machine)
+
+
+REFERENCES = {
+    "without a registry": run_without(REGISTRY),
+    "without a scanner control": run_without(CONTROL),
+    "without a common setting": run_without(COMMON_SETTING),
+    "with an index that lists nothing": run_with_an_empty_index,
+    "without its failure": run_without_its_failure,
+    "the same command again": run_twice,
+}
+
+
+# Tables.
+
+def table(heading, rows):
+    """Lines of columns: the first to the left, all others to the right."""
+    texts = [[str(cell) for cell in row] for row in (heading, *rows)]
+    widths = [max(len(row[i]) for row in texts) for i in range(len(heading))]
+    return "".join(
+        "  ".join([row[0].ljust(widths[0])] +
+                  [cell.rjust(width) for cell, width in zip(row[1:], widths[1:])]).rstrip() + "\n"
+        for row in texts)
+
+
+def paragraph(first, text):
+    """`first` and, indented below it, `text`."""
+    return first + "\n" + textwrap.fill(text, 96, initial_indent="    ",
+                                        subsequent_indent="    ") + "\n"
+
+
+def print_exemptions(cases):
+    """Prints which rules excused something, in how many cases of which road, and which did not."""
+    used = collections.Counter()
+    for case in cases:
+        used.update({(name, case.road.name) for name in case.excused.values()})
+    print("Exemptions used (runs)\n")
+    for rule in [*exemptions.RULES, exemptions.KEPT_DIRECTORY]:
+        roads = [f"{road} {used[rule.name, road]}" for road in ROADS if used[rule.name, road]]
+        print(paragraph(f"{rule.name}: {', '.join(roads) or 'none'}", rule.reason))
