@@ -118,7 +118,7 @@ int copyFile(const std::string& source, const std::string& destination)
 
 int backupFile(FileTransaction& transaction, const std::string& path)
 {
-    if (!transaction.backup || !pathExists(path))
+    if (!transaction.backup || pathIsMissing(path))
         return FileOk;
 
     const std::string backup = backupName(path);

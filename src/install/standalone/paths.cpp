@@ -1,5 +1,7 @@
 #include "paths.h"
 
+#include <cerrno>
+
 #include <unistd.h>
 
 std::string joinPath(const std::string& directory, std::string_view name)
@@ -31,4 +33,11 @@ std::string backupName(const std::string& path)
 bool pathExists(const std::string& path)
 {
     return access(path.c_str(), F_OK) == 0;
+}
+
+bool pathIsMissing(const std::string& path)
+{
+    if (pathExists(path))
+        return false;
+    return errno == ENOENT || errno == ENOTDIR || errno == ELOOP || errno == ENAMETOOLONG;
 }

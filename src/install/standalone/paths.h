@@ -22,3 +22,7 @@ inline constexpr std::string_view BackupSuffix = ".bak";
 
 /// True when something exists at `path`, links followed: a dangling link does not.
 [[nodiscard]] bool pathExists(const std::string& path);
+
+/// True when surely nothing exists at `path`, links followed. A path that cannot be looked at, for
+/// example because the disk fails, neither exists nor is missing: what lies there must be kept.
+[[nodiscard]] bool pathIsMissing(const std::string& path);

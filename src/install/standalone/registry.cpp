@@ -95,7 +95,7 @@ bool isUpgradeNeeded(const InstallRegistry& installed, const InstallRegistry& pa
 int writeRegistry(FileTransaction& transaction, const std::string& path,
                   const InstallRegistry& registry)
 {
-    const bool keepsBackup = transaction.backup && pathExists(path);
+    const bool keepsBackup = transaction.backup && !pathIsMissing(path);
     if (keepsBackup) {
         const int code = backupCopy(transaction, path);
         if (code != FileOk)

@@ -1,0 +1,51 @@
+"""Runs that meet one failing system call: what the sweeps of failures rely on."""
+
+import pytest
+
+import failure_points
+import sweep
+from checks import same_tree
+from roads import HOME, REGISTRY, ROADS, restore, tree_of
+
+
+@pytest.fixture(scope="module")
+def laboratory(binary):
+    with sweep.Laboratory(binary, 1) as made:
+        yield made
+
+
+def point_on(bench, kind, path):
+    """The last point of `kind` on `path` before the modes of the tree are set."""
+    return [point for point in bench.points
+            if point.kind == kind and point.path == path and not point.late][-1]
+
+
+def fail(bench, kind, path, error):
+    """Runs the road of `bench` with this call failing; returns the outcome and the tree."""
+    restore(bench.spare, bench.before)
+    point = point_on(bench, kind, path)
+    outcome = failure_points.run_failing(bench.road, bench.spare, point, error)
+    return outcome, tree_of(bench.spare)
+
+
+@pytest.mark.parametrize("error", ["EIO", "EACCES"])
+def test_a_file_that_cannot_be_looked_at_is_backed_up_all_the_same(laboratory, error):
+    bench = sweep.Bench(laboratory, ROADS["failing-upgrade"])
+    scanner = HOME + "/bin/trawlhw"
+
+    outcome, after = fail(bench, "access", scanner, error)
+
+    assert outcome.status == 1
+    assert after.get(scanner) == bench.before[scanner]
+    assert after[scanner].content.endswith(b"# 9.1.7.0003\n")
+
+
+@pytest.mark.parametrize("error", ["EIO", "EACCES"])
+def test_a_registry_that_cannot_be_looked_at_is_not_overwritten_without_a_backup(laboratory, error):
+    bench = sweep.Bench(laboratory, ROADS["failing-register"])
+
+    outcome, after = fail(bench, "access", REGISTRY, error)
+
+    assert "*** Error: could not open or write to INI file. Error = 2\n" in outcome.stdout
+    assert outcome.status == 1
+    same_tree(after, bench.before)
