@@ -1,11 +1,12 @@
-"""Runs that meet one failing system call: what the sweeps of failures rely on."""
+"""Runs that meet one failing system call, or are killed: what the sweeps of failures rely on."""
 
 import pytest
 
 import failure_points
 import sweep
 from checks import same_tree
-from roads import HOME, REGISTRY, ROADS, restore, tree_of
+from machine import SPB
+from roads import COMMAND_LOG, HOME, REGISTRY, ROADS, SETTINGS, restore, tree_of
 
 
 @pytest.fixture(scope="module")
@@ -60,3 +61,43 @@ def test_a_rollback_gives_the_registry_its_mode_back(laboratory):
     assert outcome.status == 1
     assert after[REGISTRY].mode == 0o640
     same_tree(after, bench.before)
+
+
+# A removal that was killed. The second run refuses, because the scanner control is gone.
+
+def kill_removal_before(bench, path):
+    restore(bench.spare, bench.before)
+    failure_points.run_killed(bench.road, bench.spare, point_on(bench, "unlink", path))
+    refused = bench.road.run(bench.spare)
+    assert "*** Error: INI file not found: nothing to remove.\n" in refused.stdout
+    assert refused.status == 1
+
+
+def run(machine, *arguments):
+    return machine.run(*arguments, environment={"ZOR_COMMAND_LOG": COMMAND_LOG}).status
+
+
+def test_a_removal_killed_before_the_settings_went_is_finished_by_a_repair_and_a_removal(
+        laboratory):
+    bench = sweep.Bench(laboratory, ROADS["remove"])
+    kill_removal_before(bench, SETTINGS)
+
+    assert run(bench.spare, "i", "SHOP", "-s", SPB) == 0
+    assert run(bench.spare, "r", "SHOP") == 0
+
+    left = [path for path in tree_of(bench.spare) if path not in bench.normal]
+    assert left == []
+
+
+def test_a_removal_killed_after_the_settings_went_is_finished_once_its_registry_is_deleted(
+        laboratory):
+    bench = sweep.Bench(laboratory, ROADS["remove"])
+    kill_removal_before(bench, HOME + "/config/ZorHWConfig.xml")
+
+    assert run(bench.spare, "i", "SHOP", "-s", SPB) == 1
+    bench.spare.remove(REGISTRY)
+    assert run(bench.spare, "i", "SHOP", "-s", SPB) == 0
+    assert run(bench.spare, "r", "SHOP") == 0
+
+    left = [path for path in tree_of(bench.spare) if path not in bench.normal]
+    assert left == []

@@ -1,0 +1,194 @@
+"""Where a killed run and the same command after it do not end as an undisturbed run, and why.
+
+The journal lives in memory, so a run that is killed undoes nothing; the same command does the work
+again. Each rule names one place where that cannot lead to the same tree, and excuses a difference
+only if the state that the kill left shows that it was killed there. Left-over backups are counted,
+not excused: they must be old contents that the second run did not touch.
+"""
+
+from dataclasses import dataclass, field
+
+from cases import BACKUP, RuleBook, contents_before, lines_of
+from roads import (COMMON_SETTING, CONTROL, CONTROL_STATE, INDEX, INSTALL_TYPE, REGISTRY,
+                   SETTINGS, TRACE_SETTINGS, differences)
+
+
+@dataclass
+class Interruption:
+    """A run killed just before the call of `point`, and the same command after it.
+
+    `between` is the tree that the kill left, `status` and `after` are those of the second run.
+    """
+
+    road: object
+    point: object
+    status: int
+    output: str
+    before: dict
+    between: dict
+    after: dict
+    normal: dict
+    package: dict
+    reference: object
+    excused: dict = field(default_factory=dict)  # path to the rule's name
+    violations: list = field(default_factory=list)
+    backups: list = field(default_factory=list)
+
+    @property
+    def installs(self):
+        return self.road.arguments[0] == "i"
+
+    @property
+    def removes_all(self):
+        return self.road.name == "remove"
+
+    def was_empty(self, path):
+        """True when the kill left `path` without content."""
+        node = self.between.get(path)
+        return node is not None and node.kind == "f" and node.content == b""
+
+
+RULES = RuleBook()
+rule = RULES.rule
+
+
+def lines_at(tree, path):
+    return set(lines_of(tree[path].content)) if path in tree else set()
+
+
+def key_of(line):
+    return line.partition(b"=")[0].strip()
+
+
+@rule("the registry was being written",
+      "zor.ini is truncated and then written at once; killed in between, it is empty and counts as "
+      "none. i then makes a fresh installation for its exploiter alone (the scanners stay as they "
+      "were, disabled if an upgrade was killed), r has nothing to remove. Until then, zor.ini.bak "
+      "holds the old registry.", 0, 1)
+def registry_was_being_written(case, path):
+    if not case.was_empty(REGISTRY) or REGISTRY not in case.before:
+        return False
+    if case.between.get(REGISTRY + BACKUP) != case.before[REGISTRY]:
+        return False
+    if not case.installs:
+        return case.status == 1 and not differences(case.between, case.after)
+    if path == CONTROL_STATE:
+        return case.after.get(path) == case.between.get(path)
+    return case.after.get(path) == case.reference("without a registry").get(path)
+
+
+@rule("the installation was registered already",
+      "A fresh installation that is killed behind the writing of zor.ini is found by the second "
+      "run, which upgrades it: the settings have the keys that an upgrade adds, "
+      "ZorTrace.properties is that of an upgrade, the cache is gone.", 0)
+def was_registered_already(case, path):
+    if not is_finished_installation(case):
+        return False
+    return case.after.get(path) == case.reference("the same command again").get(path)
+
+
+@rule("what only a fresh installation makes",
+      "Behind the registry come the install type and the common trace path. An upgrade makes "
+      "neither, so what the killed run had not made is missing.", 0)
+def only_fresh_installations_make_it(case, path):
+    if not is_finished_installation(case):
+        return False
+    if path in (INSTALL_TYPE, CONTROL_STATE):
+        return case.between.get(path) != case.normal[path]
+    missing = lines_at(case.normal, INDEX) - lines_at(case.after, INDEX)
+    return path == INDEX and missing == {INSTALL_TYPE.encode()} and (
+        missing.isdisjoint(lines_at(case.between, INDEX)))
+
+
+def is_finished_installation(case):
+    return case.road.name == "install" and REGISTRY in case.between and not case.was_empty(REGISTRY)
+
+
+@rule("the index was being written",
+      "An installation truncates the index when extraction begins and completes it when it ends; "
+      "killed in between, it has lost what earlier versions had listed beyond this package.", 0)
+def index_was_being_written(case, path):
+    if path != INDEX or not case.installs:
+        return False
+    missing = lines_at(case.normal, INDEX) - lines_at(case.after, INDEX)
+    return (missing <= lines_at(case.before, INDEX) - lines_at(case.between, INDEX)
+            and lines_at(case.after, INDEX) <= lines_at(case.normal, INDEX))
+
+
+@rule("the settings were being written",
+      "Zor.properties is truncated and then written line by line; killed in between, the lines "
+      "behind are lost, the owner's too. The second run adds the missing keys with their defaults, "
+      "and ZorTrace.properties follows what the settings then say about traces.", 0)
+def settings_were_being_written(case, path):
+    if case.road.name != "upgrade" or SETTINGS not in case.between:
+        return False
+    written, whole = case.between[SETTINGS].content, case.normal[SETTINGS].content
+    if written == whole or not whole.startswith(written):
+        return False
+    if path == SETTINGS:
+        added = case.after[path].content.removeprefix(written)
+        keys = {key_of(line) for line in lines_of(whole)}
+        return (case.after[path].content.startswith(written)
+                and all(key_of(line) in keys for line in lines_of(added)))
+    changed = lines_at(case.normal, path) ^ lines_at(case.after, path)
+    return path == TRACE_SETTINGS and all(
+        key_of(line) == b"handlers.traceFile.fileName"
+        or b".loggers.trcLogger.level" in key_of(line) for line in changed)
+
+
+@rule("the common setting was being written",
+      "log.properties is created and then written; killed in between, it is empty, which counts as "
+      "the default, and the second run takes it as it is.", 0)
+def setting_was_being_written(case, path):
+    return (path == COMMON_SETTING and path not in case.before and case.was_empty(path)
+            and case.after[path] == case.between[path])
+
+
+@rule("the index was being rewritten for a removal",
+      "A removal truncates the index to write it anew; killed in between, the second run knows the "
+      "installer's own files only, and leaves the others.", 0)
+def index_was_being_rewritten(case, path):
+    return (case.removes_all and case.was_empty(INDEX)
+            and case.after.get(path)
+            == case.reference("with an index that lists nothing").get(path))
+
+
+@rule("the scanner control was deleted already",
+      "A removal deletes the scanner control with the other files, the registry last. Killed in "
+      "between, the installation counts as broken and the second run refuses to remove it: it "
+      "changes nothing. While Zor.properties is left, i repairs it and then r removes it; "
+      "afterwards zor.ini must be deleted by hand before i and r help.", 1)
+def control_was_deleted_already(case, _):
+    return (case.removes_all and CONTROL not in case.between and REGISTRY in case.between
+            and not differences(case.between, case.after))
+
+
+@rule("the registry was deleted already",
+      "The registry is the last file that a removal deletes: the second run finds nothing to "
+      "remove and ends with status 1. Only its empty directory can be left.", 1)
+def registry_was_deleted_already(case, _):
+    left = differences(case.normal, case.after)
+    return (case.removes_all and REGISTRY not in case.between and left in ([], ["/etc/zor"])
+            and not differences(case.between, case.after))
+
+
+def is_left_backup(case, path):
+    """True for a backup that the killed run made and the second one did not touch."""
+    return (path.endswith(BACKUP) and path not in case.normal
+            and case.after.get(path) == case.between.get(path)
+            and case.after[path].content in contents_before(case, path.removesuffix(BACKUP)))
+
+
+def judge(case):
+    """Fills in the left-over backups, what is excused by which rule, and what by none."""
+    paths = differences(case.normal, case.after)
+    case.backups = [path for path in paths if path in case.after and is_left_backup(case, path)]
+    paths = [path for path in paths if path not in case.backups]
+    if case.status != 0:
+        paths.append("(status)")
+    for path in paths:
+        name = RULES.first(case, path)
+        if name:
+            case.excused[path] = name
+        else:
+            case.violations.append(path)
