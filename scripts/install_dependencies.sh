@@ -22,6 +22,7 @@ packages='
     python3-pytest
     scdoc
     strace
+    time
     zlib1g-dev
 '
 
