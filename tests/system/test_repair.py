@@ -229,3 +229,26 @@ def test_a_per_user_installation_is_repaired_too(machine):
     assert outcome.status == 0
     printed_lines(outcome, "ZOR broken in existing location, forcing update.")
     assert machine.exists("/home/ann/corvan/zor/bin/trawlcfg")
+
+
+def test_files_in_a_directory_that_must_not_be_searched_cannot_be_opened(machine):
+    assert machine.run("i", "ABC", "-s", SPB, user=ANN).status == 0
+    machine.change_mode("/home/ann/corvan/zor/bin", 0o600)
+
+    outcome = machine.run("i", "ABC", "-s", SPB, user=ANN)
+
+    assert outcome.status == 1
+    printed_lines(outcome, "ZOR broken in existing location, forcing update.",
+                  "Bin dir file extraction failed",
+                  "File extraction failed, error = 2 (Cannot open file for writing)")
+
+
+def test_a_registry_that_must_not_be_searched_for_cannot_be_opened(machine):
+    assert machine.run("i", "ABC", "-s", SPB, user=ANN).status == 0
+    machine.change_mode("/home/ann/.zor", 0o600)
+
+    outcome = machine.run("i", "ABC", "-s", SPB, user=ANN)
+
+    assert outcome.status == 1
+    printed_lines(outcome, "INI file not found or outdated (code=1)",
+                  "*** Error: could not open or write to INI file. Error = 2")

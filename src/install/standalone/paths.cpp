@@ -41,3 +41,8 @@ bool pathIsMissing(const std::string& path)
         return false;
     return errno == ENOENT || errno == ENOTDIR || errno == ELOOP || errno == ENAMETOOLONG;
 }
+
+bool pathIsBarred(const std::string& path)
+{
+    return !pathExists(path) && errno == EACCES;
+}

@@ -26,3 +26,6 @@ inline constexpr std::string_view BackupSuffix = ".bak";
 /// True when surely nothing exists at `path`, links followed. A path that cannot be looked at, for
 /// example because the disk fails, neither exists nor is missing: what lies there must be kept.
 [[nodiscard]] bool pathIsMissing(const std::string& path);
+
+/// True when the way to `path` must not be searched: nothing there can be seen, moved or opened.
+[[nodiscard]] bool pathIsBarred(const std::string& path);

@@ -95,7 +95,8 @@ bool isUpgradeNeeded(const InstallRegistry& installed, const InstallRegistry& pa
 int writeRegistry(FileTransaction& transaction, const std::string& path,
                   const InstallRegistry& registry)
 {
-    const bool keepsBackup = transaction.backup && !pathIsMissing(path);
+    const bool keepsBackup =
+        transaction.backup && !pathIsMissing(path) && !pathIsBarred(path); // the open tells
     if (keepsBackup) {
         const int code = backupCopy(transaction, path);
         if (code != FileOk)
