@@ -67,8 +67,12 @@ OBSOLETE_FILE = Rule(
     lambda path, before, after: os.path.basename(path) in OBSOLETE_FILES and before and not after)
 
 MAIN_PROPERTY_FILE = Rule(
-    "an upgrade edits the installed Zor.properties in place, without the journal",
+    "a Zor.properties that is not extracted is edited in place, without the journal",
     lambda path, before, after: path.endswith("/config/Zor.properties") and before and after)
+
+TRACE_PROPERTY_FILE = Rule(
+    "a ZorTrace.properties that is not extracted is edited in place, without the journal",
+    lambda path, before, after: path.endswith("/config/ZorTrace.properties") and before and after)
 
 SCRIPTS_OF_OLD = Rule(
     "a script that the package does not carry is edited in place, without the journal",
