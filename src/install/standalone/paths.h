@@ -10,11 +10,10 @@ inline constexpr std::string_view BackupSuffix = ".bak";
 /// `directory`, a "/" unless it already ends with one, `name`.
 [[nodiscard]] std::string joinPath(const std::string& directory, std::string_view name);
 
-/// As joinPath(), but an empty `name` gives `directory` unchanged. Completes the set: the flows
-/// of the installer reach it through the removal of directories only.
+/// As joinPath(), but an empty `name` gives `directory` unchanged.
 [[nodiscard]] std::string joinPathOptional(const std::string& directory, std::string_view name);
 
-/// True when `path` ends with "/". No flow calls it but joinPath().
+/// True when `path` ends with "/".
 [[nodiscard]] bool endsWithSlash(const std::string& path);
 
 /// `path` followed by BackupSuffix.
