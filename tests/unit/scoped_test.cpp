@@ -105,6 +105,19 @@ TEST(ScopedFdTest, HandsItsDescriptorOverWhenItIsMoved)
     EXPECT_FALSE(isOpen(fd));
 }
 
+TEST(ScopedFdTest, ClosesItsDescriptorWhenItIsGivenAnother)
+{
+    ScopedFd scoped(openDescriptor());
+    const int first = scoped.get();
+    const int second = openDescriptor();
+
+    scoped = ScopedFd(second);
+
+    EXPECT_EQ(second, scoped.get());
+    EXPECT_FALSE(isOpen(first));
+    EXPECT_TRUE(isOpen(second));
+}
+
 TEST(ScopedUmaskTest, RestoresThePreviousUmask)
 {
     const ScopedUmask outer(027);
