@@ -82,10 +82,10 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
     file.write(input.data(), input.size());
 
     // An empty line of one byte is a text of 32, held twice and a half while the list grows. Every
-    // line can be set to the value, every byte be replaced.
-    const ResourceBound bound(64 * KiB + 256 * size +
-                                  input.size() * (key.size() + value.size() + replacement.size()),
-                              200);
+    // line can be set to the value and every byte be replaced, and a line is held in several texts
+    // while it changes.
+    const std::size_t operands = key.size() + value.size() + replacement.size();
+    const ResourceBound bound(64 * KiB + 256 * size + 8 * input.size() * operands, 200);
     PropertyFile properties;
     checkLoadAndSave(file, properties);
     const std::size_t count = properties.lines.size();
