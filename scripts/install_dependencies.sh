@@ -13,9 +13,11 @@ packages='
     cppcheck
     g++
     g++-multilib
+    gcovr
     googletest
     groff-base
     lib32z1-dev
+    libc6-dbg
     libclang-rt-14-dev
     ninja-build
     python3
@@ -23,6 +25,7 @@ packages='
     scdoc
     strace
     time
+    valgrind
     zlib1g-dev
 '
 
