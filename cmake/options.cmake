@@ -27,3 +27,8 @@ if(WZOR_FUZZ) # coverage for libFuzzer; its main() only goes into the fuzz targe
   target_compile_options(wzor_options INTERFACE -fsanitize=fuzzer-no-link)
   target_link_options(wzor_options INTERFACE -fsanitize=fuzzer-no-link)
 endif()
+
+if(WZOR_COVERAGE)
+  target_compile_options(wzor_options INTERFACE --coverage)
+  target_link_options(wzor_options INTERFACE --coverage)
+endif()

@@ -36,6 +36,9 @@ SKELETON = {
     "/var": 0o755,
 }
 
+# Nothing that a test looks at.
+COUNTS = "/var/counts"
+
 NAME_SERVICES = "passwd: files\ngroup: files\nhosts: files\n"
 
 
@@ -140,6 +143,10 @@ def command_line(root, command, *, uid, environment, directory="/tmp", read_only
     line += ["--proc", "/proc", "--dev", "/dev"]
     for inside, host in (read_only or {}).items():
         line += ["--ro-bind", host, inside]
+    if counts := os.environ.get("WZOR_COUNTS"):
+        # Where a build that counts what runs adds its counts (scripts/coverage).
+        line += ["--bind", counts, COUNTS]
+        environment = {**environment, "GCOV_PREFIX": COUNTS}
     if writable is not None:
         for path in writable:
             line += ["--bind", at(root, path), path]
