@@ -11,7 +11,7 @@ set(CPACK_RELEASE_TIME ${WZOR_RELEASE_TIME})
 
 set(CPACK_PACKAGE_NAME wzorinst)
 set(CPACK_PACKAGE_VENDOR "The maintainers of wzorinst")
-set(CPACK_PACKAGE_CONTACT "The maintainers of wzorinst <root@localhost>")
+set(CPACK_PACKAGE_CONTACT "The maintainers of wzorinst <wzorinst@localhost>")
 set(WZORINST_SUMMARY "installer of the ZOR inventory-scanning toolkit")
 set(SPB_SUMMARY "packs, lists and checks the packages that wzorinst installs")
 set(DEBUG_SUMMARY "debug symbols of wzorinst")

@@ -227,12 +227,21 @@ def test_the_archive_unpacks_into_a_directory_of_its_name(packages, names):
         sorted(INSTALLED.replace("/usr/", f"{top}/").splitlines(keepends=True)))
 
 
-def test_the_tool_for_spbs_is_a_package_of_any_architecture_that_needs_python(packages):
+def test_the_tool_for_spbs_is_a_deb_of_any_architecture_that_needs_python(packages, root):
     deb = packages / f"wzorinst-spb_{VERSION}-1_all.deb"
-    rpm_package = packages / f"wzorinst-spb-{VERSION}-1.noarch.rpm"
 
+    dpkg(root, "--install", deb)
+
+    assert installed_files(root) == SPB_INSTALLED
     assert (debian_fields(deb)["Architecture"], debian_fields(deb)["Depends"]) == ("all", "python3")
-    assert "/usr/bin/python3" in rpm_query(rpm_package, "--requires").split()
+
+
+def test_the_tool_for_spbs_is_an_rpm_of_any_architecture_that_needs_python(packages):
+    package = packages / f"wzorinst-spb-{VERSION}-1.noarch.rpm"
+
+    assert "/usr/bin/python3" in rpm_query(package, "--requires").split()
+    assert rpm_query(package, "--list").split() == [line.split()[1]
+                                                    for line in SPB_INSTALLED.splitlines()]
 
 
 def test_the_debug_symbols_lie_where_a_debugger_looks_for_them(packages, names, root):
