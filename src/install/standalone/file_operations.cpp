@@ -132,7 +132,7 @@ int backupFile(FileTransaction& transaction, const std::string& path)
     const std::string backup = backupName(path);
     (void)unlink(backup.c_str()); // of an older run; if it stays, the rename tells
     if (std::rename(path.c_str(), backup.c_str()) != 0)
-        return pathIsBarred(path) ? FileOk : CannotRename; // barred: as good as missing
+        return CannotRename;
 
     // Only now: an entry without its backup would have nothing to restore.
     record(transaction, BackedUp, path);

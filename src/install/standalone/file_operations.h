@@ -22,9 +22,8 @@
 
 /// Moves what lies at `path` to its backup name and journals that; an older backup is deleted.
 ///
-/// Does nothing when the transaction keeps no backups, when nothing exists there, or when the way
-/// to it must not be searched: opening it will tell. What cannot be looked at for other reasons is
-/// taken to exist. Returns 0 or CannotRename (9).
+/// Does nothing when the transaction keeps no backups or surely nothing can be reached there
+/// (pathIsMissing()). Afterwards nothing lies at `path`. Returns 0 or CannotRename (9).
 [[nodiscard]] int backupFile(FileTransaction& transaction, const std::string& path);
 
 /// Copies the file at `path` to its backup name, for a caller that overwrites it next: journals the

@@ -39,10 +39,9 @@ bool pathIsMissing(const std::string& path)
 {
     if (pathExists(path))
         return false;
-    return errno == ENOENT || errno == ENOTDIR || errno == ELOOP || errno == ENAMETOOLONG;
-}
-
-bool pathIsBarred(const std::string& path)
-{
-    return !pathExists(path) && errno == EACCES;
+    // A refusal is asked for twice: it must be the machine's rule, and no answer of a failing disk.
+    if (errno == EACCES && pathExists(path))
+        return false;
+    return errno == ENOENT || errno == ENOTDIR || errno == ELOOP || errno == ENAMETOOLONG ||
+           errno == EACCES;
 }

@@ -22,9 +22,8 @@ inline constexpr std::string_view BackupSuffix = ".bak";
 /// True when something exists at `path`, links followed: a dangling link does not.
 [[nodiscard]] bool pathExists(const std::string& path);
 
-/// True when surely nothing exists at `path`, links followed. A path that cannot be looked at, for
-/// example because the disk fails, neither exists nor is missing: what lies there must be kept.
+/// True when surely nothing can be reached at `path`, links followed: there is nothing, or the way
+/// to it must not be searched, so that nothing there could be moved or opened either. A path that
+/// cannot be looked at for another reason, on a failing disk say, is not missing: what lies there
+/// must be kept.
 [[nodiscard]] bool pathIsMissing(const std::string& path);
-
-/// True when the way to `path` must not be searched: nothing there can be seen, moved or opened.
-[[nodiscard]] bool pathIsBarred(const std::string& path);

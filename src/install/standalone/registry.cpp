@@ -95,8 +95,7 @@ bool isUpgradeNeeded(const InstallRegistry& installed, const InstallRegistry& pa
 int writeRegistry(FileTransaction& transaction, const std::string& path,
                   const InstallRegistry& registry)
 {
-    const bool keepsBackup =
-        transaction.backup && !pathIsMissing(path) && !pathIsBarred(path); // the open tells
+    const bool keepsBackup = transaction.backup && !pathIsMissing(path);
     if (keepsBackup) {
         const int code = backupCopy(transaction, path);
         if (code != FileOk)
