@@ -215,6 +215,14 @@ def property_writes_are_not_checked(case, path):
             and lacks_lines_only(content, case.normal[path].content))
 
 
+@rule("a restored registry has the mode of its copy",
+      "The registry's backup is a copy, made under the process umask; a rollback puts the copy back.",
+      1)
+def restored_registry_has_the_mode_of_its_copy(case, path):
+    return (path == REGISTRY and case.only_mode_differs(path)
+            and case.after[path].mode == 0o644)
+
+
 @rule("the second pass over \"config/xss\" takes the backup",
       "Its files are extracted twice; the second backup replaces the first, so a rollback from "
       "then on deletes them.", 1)
@@ -294,9 +302,10 @@ def unreadable_control(case, path):
       "A removal that cannot save the registry leaves it as it then is; the old one lies complete "
       "in zor.ini.bak.", 1)
 def removal_is_not_rolled_back(case, path):
+    copy = case.after.get(REGISTRY + BACKUP)
     return (case.road.arguments[0] == "r" and path in (REGISTRY, REGISTRY + BACKUP)
             and case.hit == REGISTRY and case.kind in ("open to create", "write", "close")
-            and case.after.get(REGISTRY + BACKUP) == case.before[REGISTRY])
+            and copy is not None and copy.content == case.before[REGISTRY].content)
 
 
 KEPT_DIRECTORY = Rule(

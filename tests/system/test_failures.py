@@ -52,17 +52,6 @@ def test_a_registry_that_cannot_be_looked_at_is_not_overwritten_without_a_backup
     same_tree(after, bench.before)
 
 
-def test_a_rollback_gives_the_registry_its_mode_back(laboratory):
-    bench = sweep.Bench(laboratory, ROADS["register"])
-
-    outcome, after = fail(bench, "write", REGISTRY, "ENOSPC")
-
-    assert "*** Error: could not open or write to INI file. Error = 5\n" in outcome.stdout
-    assert outcome.status == 1
-    assert after[REGISTRY].mode == 0o640
-    same_tree(after, bench.before)
-
-
 # A removal that was killed. The second run refuses, because the scanner control is gone.
 
 def kill_removal_before(bench, path):

@@ -91,14 +91,6 @@ int writeContent(InputStream& stream, int destination)
     }
 }
 
-/// Gives `copy`, which a rollback would make the file again, the permission bits of `original`.
-void copyMode(const std::string& original, const std::string& copy)
-{
-    struct stat status = {};
-    if (stat(original.c_str(), &status) == 0)
-        (void)chmod(copy.c_str(), status.st_mode & 07777); // the content is what counts
-}
-
 int createIfMissing(FileTransaction& transaction, const std::string& path, mode_t mode)
 {
     if (path.empty() || pathExists(path))
@@ -147,7 +139,6 @@ int backupCopy(FileTransaction& transaction, const std::string& path)
         (void)unlink(backup.c_str()); // a partial copy restores nothing
         return code;
     }
-    copyMode(path, backup);
     record(transaction, BackedUp, path);
     record(transaction, Created, path);
     return FileOk;

@@ -27,8 +27,7 @@
 [[nodiscard]] int backupFile(FileTransaction& transaction, const std::string& path);
 
 /// Copies the file at `path` to its backup name, for a caller that overwrites it next: journals the
-/// backup and then `path` as created. The backup has the file's mode, whatever the umask, since a
-/// rollback makes it the file again. Does not look at the transaction's backup flag.
+/// backup and then `path` as created. Does not look at the transaction's backup flag.
 ///
 /// Returns 0 or the code of copyFile(); the backup name is then deleted.
 [[nodiscard]] int backupCopy(FileTransaction& transaction, const std::string& path);
