@@ -91,8 +91,11 @@ class Laboratory:
             finally:
                 self.free.put(machine)
 
-        with ThreadPoolExecutor(self.jobs) as pool:
+        pool = ThreadPoolExecutor(self.jobs)
+        try:
             return list(pool.map(on_a_free_machine, jobs))
+        finally:
+            pool.shutdown(cancel_futures=True)  # of an interrupted sweep: not the rest as well
 
 
 class Bench:
