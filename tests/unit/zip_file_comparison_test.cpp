@@ -1,10 +1,12 @@
-// The deflated stream beside its plain model, on random entries, sound and damaged.
+// The deflated stream, and the files that are extracted, beside the stream's plain model, on random
+// entries, sound and damaged.
 //
 // Each entry comes from a seed of its own: its content, how it was compressed, what is wrong with
 // it, and the calls that read it. A long run, and a single entry again:
 //
 //     WZOR_STREAM_ENTRIES=50000 unit_tests --gtest_filter='StreamComparison*'
 //     WZOR_STREAM_ENTRIES=1 WZOR_STREAM_SEED=1234 unit_tests --gtest_filter='StreamComparison*'
+#include "file_operations.h"
 #include "reference_inflate_stream.h"
 #include "sample_bytes.h"
 #include "test_files.h"
@@ -20,6 +22,7 @@
 #include <string>
 #include <vector>
 
+#include <sys/wait.h>
 #include <unistd.h>
 #include <zlib.h>
 
@@ -69,7 +72,7 @@ std::size_t anySize(Dice& dice)
     case 3:
         return static_cast<std::size_t>(8192 * dice.between(1, 6) + dice.between(-300, 300));
     default:
-        return 1 + dice.below(150000);
+        return 1 + dice.below(dice.oneIn(6) ? 500000 : 150000);
     }
 }
 
@@ -282,10 +285,15 @@ std::uint32_t numberFromEnvironment(const char* name, std::uint32_t fallback)
 
 class StreamComparisonTest : public testing::Test {
 protected:
-    std::unique_ptr<InputStream> openSample(const Sample& sample)
+    void writeSample(const Sample& sample) const
     {
         (void)unlink(path.c_str()); // some file systems write a file out when it is truncated
         writeFile(path, sample.archive);
+    }
+
+    std::unique_ptr<InputStream> openSample(const Sample& sample) const
+    {
+        writeSample(sample);
         return std::unique_ptr<InputStream>(ZipFile(path.c_str()).getInputStream(&sample.entry));
     }
 
@@ -374,6 +382,68 @@ TEST_F(StreamComparisonTest, TheProgramEndsWhereTheModelSaysSo)
         EXPECT_EXIT(readToTheEnd(), testing::KilledBySignal(SIGABRT),
                     "Assertion `available_ >= \\(unsigned\\) result' failed")
             << seed;
+    }
+}
+
+class ExtractionComparisonTest : public StreamComparisonTest {
+protected:
+    /// What a run that reads the sample in blocks leaves in a file; `aborts` tells whether the
+    /// program ends over it.
+    static std::string expectedFile(const Sample& sample, bool& aborts)
+    {
+        ReferenceInflateStream model = modelOf(sample);
+        std::string content;
+        for (;;) {
+            const Answer answer = make({8192}, model);
+            aborts = model.aborted();
+            if (aborts || answer.count == 0)
+                return content;
+            content += answer.bytes;
+        }
+    }
+
+    /// Extracts the sample in a process of its own, since that may end it; returns the wait status.
+    int extractApart(const Sample& sample) const
+    {
+        const pid_t child = fork();
+        if (child == 0) {
+            (void)close(STDERR_FILENO); // the assertion's message
+            _exit(extract(sample));
+        }
+        int status = -1;
+        (void)waitpid(child, &status, 0);
+        return status;
+    }
+
+    int extract(const Sample& sample) const
+    {
+        FileTransaction transaction;
+        return extractFile(transaction, ZipFile(path.c_str()), sample.entry, destination, 0600);
+    }
+
+    std::string destination = dir / "extracted";
+};
+
+TEST_F(ExtractionComparisonTest, TheFileHoldsWhatTheModelDelivers)
+{
+    const std::uint32_t entries = numberFromEnvironment("WZOR_STREAM_ENTRIES", 1500);
+    const std::uint32_t first = numberFromEnvironment("WZOR_STREAM_SEED", FirstSeed);
+
+    for (std::uint32_t seed = first; seed != first + entries; ++seed) {
+        const Sample sample = makeSample(seed);
+        writeSample(sample);
+        (void)unlink(destination.c_str());
+        bool aborts = false;
+        const std::string expected = expectedFile(sample, aborts);
+
+        const int status = aborts ? extractApart(sample) : extract(sample);
+
+        const std::string again =
+            "run again: WZOR_STREAM_ENTRIES=1 WZOR_STREAM_SEED=" + std::to_string(seed) + " (" +
+            sample.wounds + ")";
+        ASSERT_TRUE(aborts ? WIFSIGNALED(status) && WTERMSIG(status) == SIGABRT : status == 0)
+            << again;
+        ASSERT_TRUE(expected == readFile(destination)) << again;
     }
 }
 

@@ -1,7 +1,9 @@
 #include "file_operations.h"
 
+#include "file_writing.h"
 #include "paths.h"
 #include "scoped.h"
+#include "sound_entry.h"
 
 #include <cerrno>
 #include <cstdio>
@@ -42,25 +44,6 @@ int openDestination(FileTransaction& transaction, const std::string& destination
     return file.isOpen() ? FileOk : CannotOpenForWriting;
 }
 
-/// Writes all of `data`; returns 0 or the code of the failed write.
-int writeAll(int fd, const char* data, std::size_t size)
-{
-    while (size != 0) {
-        const ssize_t count = write(fd, data, size);
-        if (count <= 0)
-            return writeErrorCode(count < 0 ? errno : EIO);
-        data += count;
-        size -= static_cast<std::size_t>(count);
-    }
-    return FileOk;
-}
-
-/// Closes a file that was written: a file system may tell only now that the last block failed.
-int closeWritten(ScopedFd& file)
-{
-    return close(file.release()) == 0 ? FileOk : writeErrorCode(errno);
-}
-
 int copyContent(int source, int destination)
 {
     char block[CopyBlockSize];
@@ -99,6 +82,20 @@ int createIfMissing(FileTransaction& transaction, const std::string& path, mode_
         return CannotCreateDirectory;
     record(transaction, DirectoryCreated, path);
     return FileOk;
+}
+
+/// Writes `entry`, at whose data `source` stands, to the new file `destination`.
+int writeEntry(const ZipFile& archive, const ZipEntry& entry, int source, int destination)
+{
+    const int copied = copySoundEntry(source, entry, destination);
+    if (copied != EntryNotSound)
+        return copied;
+
+    // Damaged: what is left of it is what its stream delivers in blocks of ExtractBlockSize.
+    if (lseek(destination, 0, SEEK_SET) != 0 || ftruncate(destination, 0) != 0)
+        return writeErrorCode(errno);
+    const std::unique_ptr<InputStream> stream(archive.getInputStream(&entry));
+    return stream ? writeContent(*stream, destination) : CannotOpenForReading;
 }
 
 } // namespace
@@ -147,8 +144,8 @@ int backupCopy(FileTransaction& transaction, const std::string& path)
 int extractFile(FileTransaction& transaction, const ZipFile& archive, const ZipEntry& entry,
                 const std::string& destination, mode_t mode)
 {
-    const std::unique_ptr<InputStream> stream(archive.getInputStream(&entry));
-    if (!stream)
+    const ScopedFd source = archive.openEntry(&entry);
+    if (!source.isOpen())
         return CannotOpenForReading;
 
     ScopedFd file(-1);
@@ -157,7 +154,7 @@ int extractFile(FileTransaction& transaction, const ZipFile& archive, const ZipE
         return opened;
     record(transaction, Created, destination); // before its first byte: a rollback finds it
 
-    const int code = writeContent(*stream, file.get());
+    const int code = writeEntry(archive, entry, source.get(), file.get());
     if (code != FileOk)
         return code;
     if (mode != 0)

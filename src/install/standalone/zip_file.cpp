@@ -356,27 +356,29 @@ const ZipEntry* ZipFile::findEntry(const std::string& name) const
     return found == entries_.end() ? nullptr : &*found;
 }
 
-InputStream* ZipFile::getInputStream(const ZipEntry* entry) const
+ScopedFd ZipFile::openEntry(const ZipEntry* entry) const
 {
     if (entry == nullptr || entry->compressedSize == 0 || entry->uncompressedSize == 0)
-        return nullptr;
+        return ScopedFd(-1);
+    if (entry->method != 0 && entry->method != 8)
+        return ScopedFd(-1);
 
     ScopedFd file = openArchive(path_.c_str());
+    // A seek that fails is not looked at: the entry then starts at the archive's first byte.
+    if (file.isOpen() && entry->dataOffset < SeekLimit)
+        (void)::lseek(file.get(), entry->dataOffset, SEEK_SET);
+    return file;
+}
+
+InputStream* ZipFile::getInputStream(const ZipEntry* entry) const
+{
+    ScopedFd file = openEntry(entry);
     if (!file.isOpen())
         return nullptr;
-    // A seek that fails is not looked at: the stream then starts at the archive's first byte.
-    if (entry->dataOffset < SeekLimit)
-        (void)::lseek(file.get(), entry->dataOffset, SEEK_SET);
-
-    switch (entry->method) {
-    case 0:
+    if (entry->method == 0)
         return new X__StoredInputStream(std::move(file), entry->uncompressedSize);
-    case 8:
-        return new X__DeflatedInputStream(std::move(file), entry->compressedSize,
-                                          entry->uncompressedSize);
-    default:
-        return nullptr;
-    }
+    return new X__DeflatedInputStream(std::move(file), entry->compressedSize,
+                                      entry->uncompressedSize);
 }
 
 int ZipFile::readDirectory(const char* path, std::vector<ZipEntry>& entries)

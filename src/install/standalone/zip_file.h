@@ -129,6 +129,10 @@ public:
     /// cannot be opened.
     [[nodiscard]] InputStream* getInputStream(const ZipEntry* entry) const;
 
+    /// The archive, open at the first data byte of `entry`; not open where getInputStream() returns
+    /// null.
+    [[nodiscard]] ScopedFd openEntry(const ZipEntry* entry) const;
+
     /// Fills `entries` from the archive at `path` (null is allowed): from its central directory,
     /// or, when that cannot be used, from its local headers. Returns a ZipCode (0 to 8); `entries`
     /// is empty for every code but 0.

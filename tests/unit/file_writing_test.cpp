@@ -1,0 +1,84 @@
+#include "file_codes.h"
+#include "file_writing.h"
+#include "scoped.h"
+#include "test_files.h"
+
+#include <gtest/gtest.h>
+
+#include <string>
+
+#include <fcntl.h>
+
+namespace {
+
+class FileWritingTest : public testing::Test {
+protected:
+    TempDir dir;
+    std::string path = dir / "file";
+};
+
+TEST_F(FileWritingTest, WriteAllWritesEveryByte)
+{
+    const std::string data(300000, 'x');
+    const ScopedFd file(open(path.c_str(), O_WRONLY | O_CREAT, 0600));
+
+    EXPECT_EQ(0, writeAll(file.get(), data.data(), data.size()));
+
+    EXPECT_TRUE(data == readFile(path));
+}
+
+TEST_F(FileWritingTest, WriteAllGoesOnAfterAShortWrite)
+{
+    int ends[2] = {-1, -1};
+    ASSERT_EQ(0, pipe2(ends, O_NONBLOCK));
+    const ScopedFd reader(ends[0]);
+    const ScopedFd writer(ends[1]);
+    const std::string data(1000000, 'x'); // more than a pipe takes
+
+    // The first write is short, the next one fails: the pipe is full.
+    EXPECT_EQ(5, writeAll(writer.get(), data.data(), data.size()));
+
+    char byte = 0;
+    EXPECT_EQ(1, read(reader.get(), &byte, 1));
+}
+
+TEST_F(FileWritingTest, WriteAllOfNothingSucceeds)
+{
+    EXPECT_EQ(0, writeAll(-1, nullptr, 0));
+}
+
+TEST_F(FileWritingTest, WriteAllTellsThatTheDiskIsFull)
+{
+    const ScopedFd full(open("/dev/full", O_WRONLY));
+
+    EXPECT_EQ(6, writeAll(full.get(), "x", 1));
+}
+
+TEST_F(FileWritingTest, WriteAllTellsThatAFileCannotBeWritten)
+{
+    writeFile(path, "old");
+    const ScopedFd readOnly(open(path.c_str(), O_RDONLY));
+
+    EXPECT_EQ(5, writeAll(readOnly.get(), "x", 1));
+
+    EXPECT_EQ("old", readFile(path));
+}
+
+TEST_F(FileWritingTest, CloseWrittenGivesTheFileUp)
+{
+    ScopedFd file(open(path.c_str(), O_WRONLY | O_CREAT, 0600));
+
+    EXPECT_EQ(0, closeWritten(file));
+
+    EXPECT_FALSE(file.isOpen());
+}
+
+TEST_F(FileWritingTest, CloseWrittenTellsThatClosingFailed)
+{
+    ScopedFd closed(open(path.c_str(), O_WRONLY | O_CREAT, 0600));
+    ASSERT_EQ(0, close(closed.get()));
+
+    EXPECT_EQ(5, closeWritten(closed));
+}
+
+} // namespace
