@@ -24,6 +24,22 @@ def test_a_shared_installation_makes_its_tree(machine):
     same_text(machine.listing("/etc", "/opt", "/usr/kel"), SHARED_TREE)
 
 
+def test_a_reader_of_the_output_that_goes_away_does_not_end_the_installation(machine):
+    script = """
+        mkfifo /tmp/output
+        (exec 4</tmp/output) &
+        exec 3>/tmp/output
+        wait
+        "$0" "$@" >&3
+        echo "status $?"
+    """
+
+    outcome = machine.run_in_shell(script, "i", "ABC", "-s", SPB)
+
+    same_text(outcome.stdout, "status 0\n")
+    same_text(machine.listing("/etc", "/opt", "/usr/kel"), SHARED_TREE)
+
+
 def test_a_shared_installation_leaves_homes_and_temporary_directory_alone(machine):
     before = machine.tree("/home", "/root", "/tmp")
 

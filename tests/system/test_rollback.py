@@ -192,6 +192,18 @@ def test_a_file_too_large_for_the_process_fails_the_extraction(machine):
     rolled_back(machine, before)
 
 
+def test_a_limit_on_the_size_of_files_does_not_end_the_run_halfway(machine):
+    before = machine.tree()
+
+    # Without the trap above, a write beyond the limit sends a signal.
+    outcome = machine.run_in_shell("ulimit -f 8; exec \"$0\" \"$@\"", "i", "ABC", "-s", SPB)
+
+    assert outcome.status == 1
+    printed_lines(outcome, "File extraction failed, error = 5 (Cannot write file)")
+    printed_lines(outcome, "Installation failed, rolling back", "Done.")
+    rolled_back(machine, before)
+
+
 def test_a_full_disk_fails_the_extraction(machine):
     machine.pack({"bin/large": b"0123456789" * 20000})
 

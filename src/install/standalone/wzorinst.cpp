@@ -13,11 +13,24 @@
 #include "transaction.h"
 
 #include <clocale>
+#include <csignal>
 #include <ostream>
 #include <string>
 #include <string_view>
 
 namespace {
+
+/// Makes writes that end a process by a signal fail instead, so that the run goes on or is undone:
+/// to a pipe whose reader has gone, and beyond the largest file that the caller allows.
+void letWritesFail()
+{
+    for (const int number : {SIGPIPE, SIGXFSZ}) {
+        // A handler of our own: unlike an ignored signal, the commands that we run do not inherit
+        // it. What the caller ignores stays ignored.
+        if (std::signal(number, [](int) {}) == SIG_IGN)
+            (void)std::signal(number, SIG_IGN); // was possible before
+    }
+}
 
 /// Completes the layout names that depend on one another.
 void completeLayoutNames()
@@ -98,6 +111,7 @@ int installOrUpgrade(Discovery& found, InstallRegistry& request)
 int main(int argc, char** argv)
 {
     (void)std::setlocale(LC_ALL, "C"); // the start-up locale; cannot fail
+    letWritesFail();
     if (!isRoot())
         localInstall = true;
     if (argc == 2 && std::string_view(argv[1]) == "t")
