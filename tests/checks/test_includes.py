@@ -13,8 +13,9 @@ ROWS = [
     "installation fresh_install upgrade removal",
     "extraction scanner_control environment install_log template_variables tree_removal",
     "registry exploiters common_directory locations property_file",
-    "file_operations transaction",
-    "zip_file settings build_stamp version file_codes paths text time_stamps scoped unwind_tables",
+    "file_operations sound_entry transaction",
+    "zip_file settings build_stamp version file_codes file_writing paths text time_stamps scoped"
+    " unwind_tables",
 ]
 ROW_OF = {name: number for number, row in enumerate(ROWS) for name in row.split()}
 

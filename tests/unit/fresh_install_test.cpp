@@ -450,16 +450,17 @@ TEST_F(FreshInstallTest, APropertyFileThatCannotBeSavedFailsTheInstallation)
     EXPECT_FALSE(pathExists("/etc/zor"));
 }
 
-TEST_F(FreshInstallTest, ARegistryDirectoryThatCannotBeMadeIsCode11)
+TEST_F(FreshInstallTest, ARegistryDirectoryThatCannotBeMadeShowsWhenTheRegistryIsSaved)
 {
     ASSERT_EQ(0, chmod("/etc", 0555));
     {
         const OrdinaryRights rights;
-        EXPECT_EQ(11, install());
+        EXPECT_EQ(2, install());
     }
     ASSERT_EQ(0, chmod("/etc", 0755));
 
-    EXPECT_FALSE(logHolds("Saving INI file"));
+    EXPECT_TRUE(logHolds("Saving INI file to /etc/zor/zor.ini\n"
+                         "*** Error: could not open or write to INI file. Error = 2\n"));
     EXPECT_FALSE(pathExists(Home + "/install/zor_install.properties"));
 }
 

@@ -89,13 +89,13 @@ int registerInstallation(FileTransaction& transaction, InstallRegistry& registry
         registry.exploiters.clear();
     registry.exploiters += ":";
 
-    int code = FileOk;
     {
         const ScopedUmask mask(globalFilesUmask);
-        code =
-            createFullPath(transaction, registryDirectory(localInstall), RegistryDirMode, nullptr);
+        // If it fails, the save says so.
+        (void)createFullPath(transaction, registryDirectory(localInstall), RegistryDirMode,
+                             nullptr);
     }
-    return code != FileOk ? code : saveRegistry(transaction, registry);
+    return saveRegistry(transaction, registry);
 }
 
 /// Records whether the installation is the shared or a per-user one. Not journalled; a failure is
