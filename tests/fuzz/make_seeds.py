@@ -104,7 +104,7 @@ def entry_stream():
         seeds[f"noise_{how}"] = entry(DEFLATED, how, len(NOISE), deflate(NOISE), offset=3)
         seeds[f"more_{how}"] = entry(DEFLATED, how, 100, deflate(TEXT))
         seeds[f"truncated_{how}"] = entry(DEFLATED, how, 1 << 14, deflate(bytes(1 << 14))[:-4])
-    for size in (8191, 8192, 8193, 16384, 65536):
+    for size in (8191, 8192, 8193, 16384, 65536, 131072, 300000):
         seeds[f"zeros_{size}"] = entry(DEFLATED, 0, size, deflate(bytes(size)))
     seeds["empty"] = entry(STORED, 0, 0, b"")
     seeds["short"] = entry(STORED, 0, 5000, NOISE)
