@@ -61,16 +61,23 @@ struct Sample {
 
 // Contents and their compression.
 
+/// A size about as large as a few blocks of `block` bytes, by at most `away` off.
+std::size_t sizeNearBlocks(Dice& dice, int block, int most, int away)
+{
+    const int size = block * dice.between(1, most) + dice.between(-away, away);
+    return static_cast<std::size_t>(size);
+}
+
 std::size_t anySize(Dice& dice)
 {
     switch (dice.below(5)) {
     case 0:
         return 1 + dice.below(600);
     case 1:
-        return static_cast<std::size_t>(4096 * dice.between(1, 4) + dice.between(-20, 20));
+        return sizeNearBlocks(dice, 4096, 4, 20);
     case 2:
     case 3:
-        return static_cast<std::size_t>(8192 * dice.between(1, 6) + dice.between(-300, 300));
+        return sizeNearBlocks(dice, 8192, 6, 300);
     default:
         return 1 + dice.below(dice.oneIn(6) ? 500000 : 150000);
     }
@@ -101,7 +108,7 @@ std::string anyContent(Dice& dice)
 }
 
 /// Deflates `content` with parameters of every kind, in one go or with flushes between.
-std::string anyDeflate(Dice& dice, std::string content)
+std::string anyDeflate(Dice& dice, const std::string& content)
 {
     z_stream stream = {};
     EXPECT_EQ(Z_OK, deflateInit2(&stream, dice.between(0, 9), Z_DEFLATED, -dice.between(9, 15),
@@ -112,7 +119,7 @@ std::string anyDeflate(Dice& dice, std::string content)
     std::string data(2 * content.size() + 100000, '\0');
     stream.next_out = reinterpret_cast<Bytef*>(data.data());
     stream.avail_out = static_cast<uInt>(data.size());
-    stream.next_in = reinterpret_cast<Bytef*>(content.data());
+    stream.next_in = reinterpret_cast<Bytef*>(const_cast<char*>(content.data()));
     for (std::size_t done = 0; done < content.size(); done += step) {
         stream.avail_in = static_cast<uInt>(std::min(step, content.size() - done));
         EXPECT_EQ(Z_OK, deflate(&stream, flush));

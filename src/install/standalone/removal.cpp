@@ -135,7 +135,7 @@ void removeRegistry()
 }
 
 /// Deletes the installation, for which no exploiter is left.
-int removeToolkit(FileTransaction& transaction, InstallRegistry& registry,
+int removeToolkit(FileTransaction& transaction, const InstallRegistry& registry,
                   const std::string* logPath)
 {
     const std::string& home = registry.homeDirectory;

@@ -47,7 +47,7 @@ std::string printSettings()
                << "Install type: " << installTypeName(localInstall) << '\n'
                << "Register exploiter: " << (skipExploiterRegistration ? "no" : "yes") << '\n';
     // Asked once a run: without a home directory it prints a line of its own.
-    const std::string defaultDir = defaultInstallDir(localInstall);
+    std::string defaultDir = defaultInstallDir(localInstall);
     *logstream << "Default dest: " << defaultDir << '\n'
                << "INI location: " << registryPath(localInstall) << '\n';
     return defaultDir;
