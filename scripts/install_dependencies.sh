@@ -5,6 +5,7 @@
 set -eu
 
 packages='
+    bash-completion
     bubblewrap
     clang
     clang-format
@@ -19,9 +20,11 @@ packages='
     lib32z1-dev
     libc6-dbg
     libclang-rt-14-dev
+    man-db
     ninja-build
     python3
     python3-pytest
+    rpm
     scdoc
     strace
     time
