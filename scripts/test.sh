@@ -1,11 +1,12 @@
 #!/bin/sh
-# Builds and runs every test: sanitized 64-bit, 64-bit and 32-bit as they ship.
-# Usage: scripts/test.sh [preset...]     (default: dev release release-i686)
+# Builds and runs every test: fuzz targets for ten seconds each, sanitized 64-bit, 64-bit and 32-bit
+# as they ship.
+# Usage: scripts/test.sh [preset...]     (default: fuzz dev release release-i686)
 set -eu
 cd "$(dirname "$0")/.."
 scripts/install_dependencies.sh
 
-[ $# -gt 0 ] || set -- dev release release-i686
+[ $# -gt 0 ] || set -- fuzz dev release release-i686
 for preset in "$@"; do
     echo "== $preset"
     cmake --preset "$preset" >/dev/null
