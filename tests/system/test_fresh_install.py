@@ -478,6 +478,19 @@ def test_the_permission_pass_sets_the_mode_of_a_directory_that_was_there(machine
 
 
 @pytest.mark.parametrize("path, mode", [
+    ("install/trawlcfg.sh", 0o750), ("config/ZorHWConfig.xml", 0o644),
+    ("config/Zor.properties", 0o644), ("config/ZorTrace.properties", 0o644)])
+def test_the_permission_pass_sets_the_mode_of_a_file_that_the_package_does_not_carry(
+        machine, path, mode):
+    machine.pack(without=(path,))
+    machine.plant("/opt/corvan/zor/" + path, "text\n", 0o604)
+
+    install(machine)
+
+    assert machine.mode("/opt/corvan/zor/" + path) == mode
+
+
+@pytest.mark.parametrize("path, mode", [
     ("logs", 0o777), ("_uninst", 0o750), ("bin/plugins", 0o755), ("bin/customscanners", 0o777)])
 def test_the_permission_pass_takes_files_as_well(machine, path, mode):
     machine.plant("/opt/corvan/zor/" + path, "text", 0o600)
