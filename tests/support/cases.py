@@ -50,7 +50,7 @@ class Case:
     before: dict
     after: dict
     normal: dict  # what the undisturbed run leaves
-    package: dict  # the SPB's bytes and, by the path that it gets, each of its files
+    package: dict  # each SPB's bytes and, by the path that it gets, each file's
     reference: object  # gives the tree of a run on a machine that differs in a named way
     excused: dict = field(default_factory=dict)  # path to the rule's name
     violations: list = field(default_factory=list)

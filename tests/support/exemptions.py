@@ -10,9 +10,8 @@ import os
 import re
 
 from cases import BACKUP, Rule, RuleBook, contents_before, is_below, lines_of
-from machine import SPB
 from roads import (COMMON_SETTING, CONTROL, CONTROL_STATE, HOME, INDEX, INSTALL_TYPE,
-                   OBSOLETE_FILES, PROBE, REGISTRY, SCRIPTS, SETTINGS, SINGLE_USER_FLAG,
+                   OBSOLETE_FILES, PACKAGES, PROBE, REGISTRY, SCRIPTS, SETTINGS, SINGLE_USER_FLAG,
                    TRACE_SETTINGS, differences)
 
 RULES = RuleBook()
@@ -216,8 +215,8 @@ def property_writes_are_not_checked(case, path):
 
 
 @rule("a restored registry has the mode of its copy",
-      "The registry's backup is a copy, made under the process umask; a rollback puts the copy back.",
-      1)
+      "The registry's backup is a copy, made under the process umask; a rollback puts the copy "
+      "back.", 1)
 def restored_registry_has_the_mode_of_its_copy(case, path):
     return (path == REGISTRY and case.only_mode_differs(path)
             and case.after[path].mode == 0o644)
@@ -252,10 +251,10 @@ def scripts_are_best_effort(case, path):
       "A read error or failed seek in the package ends the entry's data without an error.", 0)
 def damaged_entry_is_shorter(case, path):
     content = case.content(path)
-    if case.hit != SPB or case.kind not in ("read", "lseek") or path != case.point.entry:
+    if case.hit not in PACKAGES or case.kind not in ("read", "lseek"):
         return False
-    return content is not None and (case.package[path].startswith(content)
-                                    or case.package[SPB].startswith(content))
+    return path == case.point.entry and content is not None and (
+        case.package[path].startswith(content) or case.package[case.hit].startswith(content))
 
 
 @rule("a scanner control that does not run changes no state",

@@ -12,8 +12,7 @@ import re
 import signal
 from dataclasses import dataclass, replace
 
-from machine import SPB
-from roads import INDEX
+from roads import INDEX, PACKAGES
 
 TRACE = "/var/strace/trace"
 TIME_LIMIT = 30  # seconds
@@ -26,6 +25,7 @@ ERRORS = {
     "close": ("EIO", "ENOSPC"),
     "fchmod": ("EIO",),
     "fstat": ("EIO",),
+    "ftruncate": ("EIO",),
     "getdents64": ("EIO",),
     "lseek": ("EIO",),
     "mkdir": ("EIO", "ENOSPC", "EACCES"),
@@ -34,13 +34,15 @@ ERRORS = {
     "read": ("EIO",),
     "rename": ("EIO", "ENOSPC", "EACCES"),
     "rmdir": ("EIO", "EACCES"),
+    "sendfile": ("EIO", "ENOSPC", "EACCES"),
     "stat": ("EIO", "EACCES"),
     "unlink": ("EIO", "EACCES"),
     "write": ("EIO", "ENOSPC", "EACCES"),
 }
 
 # The kernel's names, of both builds, that go by another name above.
-KINDS = {"_llseek": "lseek", "openat": "open", "pread64": "read"}
+KINDS = {"_llseek": "lseek", "ftruncate64": "ftruncate", "openat": "open", "pread64": "read",
+         "sendfile64": "sendfile"}
 
 # Calls that a trace of files and descriptors shows as well, but that touch no file system.
 NOT_OF_FILES = {"execve", "fcntl", "fcntl64", "mmap", "mmap2"}
@@ -124,13 +126,13 @@ def with_entries(points):
     """Tells the points between an entry's opening and its closing which file it becomes."""
     entry, result = "", []
     for number, point in enumerate(points):
-        if point.path == SPB and point.kind == "open":
+        if point.path in PACKAGES and point.kind == "open":
             after = points[number + 1:]
-            created = next((p for p in after if p.kind == "open to create" or p.path == SPB
-                            and p.kind == "close"), point)
+            created = next((p for p in after if p.kind == "open to create"
+                            or p.path == point.path and p.kind == "close"), point)
             entry = created.path if created.kind == "open to create" else ""
         result.append(replace(point, entry=entry))
-        if point.path == SPB and point.kind == "close":
+        if point.path in PACKAGES and point.kind == "close":
             entry = ""
     return result
 

@@ -30,6 +30,10 @@ REGISTRY = "/etc/zor/zor.ini"
 COMMON_SETTING = "/etc/kel/corvan/common/cfg/log.properties"
 SITE_COMMON = "/usr/kel/site/common"
 
+# The same toolkit, its files stored instead of deflated.
+STORED_SPB = "/media/stored.spb"
+PACKAGES = (SPB, STORED_SPB)
+
 # Outside of what a tree shows, so that the number of commands plays no part in it.
 COMMAND_LOG = "/var/commands"
 
@@ -57,22 +61,26 @@ class Road:
                                False)
 
 
-def toolkit_package():
-    """The example toolkit as the bytes of an SPB."""
+def toolkit_packages():
+    """The example toolkit as SPBs: their bytes by the paths that they get on a machine."""
     scripts = os.path.join(REPOSITORY, "scripts")
     with tempfile.TemporaryDirectory(prefix="toolkit-") as directory:
         tree, package = os.path.join(directory, "tree"), os.path.join(directory, "spb")
         subprocess.run([os.path.join(scripts, "build_toolkit.sh"), tree], check=True)
-        subprocess.run([os.path.join(scripts, "pack_toolkit.py"), tree, "-o", package],
-                       check=True, stdout=subprocess.DEVNULL)
-        with open(package, "rb") as file:
-            return file.read()
+        packages = {}
+        for path, options in ((SPB, ()), (STORED_SPB, ("--stored",))):
+            subprocess.run([os.path.join(scripts, "pack_toolkit.py"), tree, "-o", package,
+                            *options], check=True, stdout=subprocess.DEVNULL)
+            with open(package, "rb") as file:
+                packages[path] = file.read()
+        return packages
 
 
-def new_machine(binary, package):
-    """An empty machine with `binary` and the package `package`."""
+def new_machine(binary, packages):
+    """An empty machine with `binary` and `packages`."""
     machine = Machine(binary)
-    machine.plant(SPB, package)
+    for path, content in packages.items():
+        machine.plant(path, content)
     machine.make_directory("/var/strace", 0o777)
     return machine
 
@@ -145,7 +153,7 @@ def with_registry_that_cannot_be_saved(furnish):
 
 
 ROADS = {road.name: road for road in (
-    Road("install", "fresh installation", ("i", "SHOP", "-s", SPB), nothing_installed),
+    Road("install", "fresh installation", ("i", "SHOP", "-s", STORED_SPB), nothing_installed),
     Road("upgrade", "upgrade of an older version", ("i", "CLUB", "-s", SPB), older_version),
     Road("register", "registration on a newer version", ("i", "CLUB", "-s", SPB), newer_version),
     Road("unregister", "removal of one of two exploiters", ("r", "DESK"), two_exploiters),
@@ -196,9 +204,9 @@ def differences(wanted, got):
     return [path for path in sorted(set(wanted) | set(got)) if wanted.get(path) != got.get(path)]
 
 
-def furnished(road, binary, package):
+def furnished(road, binary, packages):
     """The tree of the machine on which `road` begins."""
-    machine = new_machine(binary, package)
+    machine = new_machine(binary, packages)
     try:
         road.furnish(machine)
         return tree_of(machine)

@@ -20,7 +20,7 @@ import exemptions
 import failure_points
 from machine import SPB
 from roads import (COMMON_SETTING, CONTROL, HOME, INDEX, REGISTRY, REPOSITORY, ROADS, furnished,
-                   new_machine, restore, toolkit_package, tree_of)
+                   new_machine, restore, toolkit_packages, tree_of)
 from spb import IMAGE_ROOT
 
 PRESETS = ("release", "release-i686")
@@ -63,15 +63,15 @@ def built(preset):
 
 
 class Laboratory:
-    """The binary, the package and the machines of a sweep; use it by `with`."""
+    """The binary, the packages and the machines of a sweep; use it by `with`."""
 
     def __init__(self, binary, jobs):
         self.binary = binary
         self.jobs = jobs
-        self.package = toolkit_package()
+        self.packages = toolkit_packages()
 
     def __enter__(self):
-        self.all_machines = [new_machine(self.binary, self.package) for _ in range(self.jobs + 1)]
+        self.all_machines = [new_machine(self.binary, self.packages) for _ in range(self.jobs + 1)]
         self.spare, *others = self.all_machines
         self.free = queue.Queue()
         for machine in others:
@@ -104,12 +104,12 @@ class Bench:
     def __init__(self, laboratory, road):
         self.road = road
         self.spare = laboratory.spare
-        self.before = furnished(road, laboratory.binary, laboratory.package)
+        self.before = furnished(road, laboratory.binary, laboratory.packages)
         restore(self.spare, self.before)
         self.undisturbed, self.points = failure_points.trace(road, self.spare)
         self.normal = tree_of(self.spare)
         assert self.undisturbed.status == int(road.fails), self.undisturbed.stdout
-        self.package = package_files(laboratory.package)
+        self.package = package_files(laboratory.packages)
         self.trees = {}
         self.lock = threading.Lock()
 
@@ -122,10 +122,10 @@ class Bench:
             return self.trees[name]
 
 
-def package_files(package):
-    """The package's bytes by SPB, and its files as they lie in it by the paths that they get."""
-    files = {SPB: package}
-    with zipfile.ZipFile(io.BytesIO(package)) as archive:
+def package_files(packages):
+    """The packages' bytes by their paths, and their files' bytes by the paths that these get."""
+    files = dict(packages)
+    with zipfile.ZipFile(io.BytesIO(packages[SPB])) as archive:
         for name in archive.namelist():
             if not name.endswith("/"):
                 files[HOME + "/" + name.removeprefix(IMAGE_ROOT)] = archive.read(name)
