@@ -391,7 +391,7 @@ TEST_F(ExtractFileTest, AWriteThatIsDeniedIsCode7AndItsFileIsRecorded)
 {
     EXPECT_TRUE(passesInChild([&] {
         const std::string path = dir / "package.spb";
-        writeFile(path, zipBytes({{storedItem("a", "new")}}));
+        writeFile(path, zipBytes({{deflatedItem("a", "new")}}));
         const ZipFile archive(path.c_str());
         failSystemCall(SYS_write, EACCES);
 
@@ -405,7 +405,7 @@ TEST_F(ExtractFileTest, AnyOtherFailureToWriteIsCode5)
 {
     EXPECT_TRUE(passesInChild([&] {
         const std::string path = dir / "package.spb";
-        writeFile(path, zipBytes({{storedItem("a", "new")}}));
+        writeFile(path, zipBytes({{deflatedItem("a", "new")}}));
         const ZipFile archive(path.c_str());
         failSystemCall(SYS_write, EIO);
 

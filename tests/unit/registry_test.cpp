@@ -217,7 +217,7 @@ TEST_F(RegistryTest, ParsingPrintsNothing)
 
 // The decision between two builds.
 
-class UpgradeDecisionTest : public testing::Test {
+class IsUpgradeNeededTest : public testing::Test {
 protected:
     static bool isNeeded(const ZorVersion& installed, const std::string& installedDate,
                          const ZorVersion& package, const std::string& packageDate)
@@ -232,18 +232,18 @@ protected:
     }
 };
 
-TEST_F(UpgradeDecisionTest, AnOlderVersionIsUpgradedWhateverTheDates)
+TEST_F(IsUpgradeNeededTest, AnOlderVersionIsUpgradedWhateverTheDates)
 {
     EXPECT_TRUE(isNeeded({9, 2, 29, 9, 9}, "23/01/01", {9, 2, 30, 0, 0}, "22/12/02"));
 }
 
-TEST_F(UpgradeDecisionTest, ANewerVersionIsNotUpgradedWhateverTheDates)
+TEST_F(IsUpgradeNeededTest, ANewerVersionIsNotUpgradedWhateverTheDates)
 {
     EXPECT_FALSE(isNeeded({9, 2, 30, 1, 0}, "21/01/01", {9, 2, 30, 0, 0}, "22/12/02"));
     EXPECT_FALSE(isNeeded({9, 2, 30, 0, 1}, "21/01/01", {9, 2, 30, 0, 0}, "22/12/02"));
 }
 
-TEST_F(UpgradeDecisionTest, TheSameVersionIsUpgradedUnlessItsBuildIsLater)
+TEST_F(IsUpgradeNeededTest, TheSameVersionIsUpgradedUnlessItsBuildIsLater)
 {
     const ZorVersion version = {9, 2, 30, 0, 0};
 
@@ -252,7 +252,7 @@ TEST_F(UpgradeDecisionTest, TheSameVersionIsUpgradedUnlessItsBuildIsLater)
     EXPECT_FALSE(isNeeded(version, "22/12/03", version, "22/12/02"));
 }
 
-TEST_F(UpgradeDecisionTest, ADateThatIsNoneCountsAsTheEarliest)
+TEST_F(IsUpgradeNeededTest, ADateThatIsNoneCountsAsTheEarliest)
 {
     const ZorVersion version = {9, 2, 30, 0, 0};
 

@@ -92,7 +92,8 @@ int writeEntry(const ZipFile& archive, const ZipEntry& entry, int source, int de
         return copied;
 
     // Damaged: what is left of it is what its stream delivers in blocks of ExtractBlockSize.
-    if (lseek(destination, 0, SEEK_SET) != 0 || ftruncate(destination, 0) != 0)
+    // A device has nothing to take back, and says EINVAL.
+    if (lseek(destination, 0, SEEK_SET) != 0 || (ftruncate(destination, 0) != 0 && errno != EINVAL))
         return writeErrorCode(errno);
     const std::unique_ptr<InputStream> stream(archive.getInputStream(&entry));
     return stream ? writeContent(*stream, destination) : CannotOpenForReading;
