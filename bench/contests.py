@@ -164,12 +164,16 @@ class Bench:
         self.empty_target()
         with tempfile.NamedTemporaryFile("r") as file:
             run("/usr/bin/strace", "-c", "-U", "calls,name", "-o", file.name, *command)
-            rows = [line.split() for line in file.read().splitlines()[2:]]
-        return {row[1]: int(row[0]) for row in rows if len(row) == 2 and row[1] != "total"}
+            rows = [line.split() for line in file.read().splitlines()]
+        return {row[1]: int(row[0]) for row in rows if row[0].isdigit() and row[1] != "total"}
 
     def run(self):
         plan = self.plan
         results = {"contests": [], "growth": [], "instructions": [], "system_calls": []}
+        for package in plan["system_calls"]:
+            results["system_calls"].append(self.system_calls(package))
+        for package, preset in plan["instructions"]:
+            results["instructions"].append(self.instructions(package, preset))
         contests = results["contests"]
         for kind, package, preset, opponent in plan["contests"]:
             if kind == "install":
@@ -183,10 +187,6 @@ class Bench:
                 contests += self.fixed_cost(preset)
         for packages, kinds in plan["growth"]:
             results["growth"] += self.growth(packages, kinds)
-        for package, preset in plan["instructions"]:
-            results["instructions"].append(self.instructions(package, preset))
-        for package in plan["system_calls"]:
-            results["system_calls"].append(self.system_calls(package))
         return results
 
 
