@@ -10,6 +10,7 @@
 #include "zip_file.h"
 
 #include <iostream>
+#include <memory>
 #include <set>
 
 #include <unistd.h>
@@ -101,8 +102,8 @@ int extractPackage(const std::string& spbPath, FileTransaction& transaction,
                    InstallRegistry& installation, bool freshInstall, const std::string* logPath)
 {
     *logstream << "Starting file extraction...\n" << std::flush; // an entry may end the process
-    const ZipFile archive(spbPath.c_str());
-    if (archive.entries().empty()) {
+    auto archive = std::make_unique<const ZipFile>(spbPath.c_str());
+    if (archive->entries().empty()) {
         *logstream << "*** Error: package not found or not valid.\n";
         return CannotOpenForReading;
     }
@@ -113,8 +114,9 @@ int extractPackage(const std::string& spbPath, FileTransaction& transaction,
         openTransientIndex(transaction, *logPath);
     }
 
-    const int code = extractDirs(transaction, archive, installation.homeDirectory, freshInstall);
+    const int code = extractDirs(transaction, *archive, installation.homeDirectory, freshInstall);
 
+    archive.reset(); // a long list of entries makes room for as long an index
     closeTransientIndex();
     if (logPath != nullptr) {
         const ScopedUmask mask(globalFilesUmask);
