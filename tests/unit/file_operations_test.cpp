@@ -323,6 +323,26 @@ TEST_F(ExtractFileTest, OverwritesInPlaceInATransactionWithoutBackups)
     EXPECT_EQ("2 " + dir / "file" + "\n", journalText(transaction));
 }
 
+TEST_F(ExtractFileTest, AnArchiveThatAnEntryReplacesIsReadAnew)
+{
+    const std::string path = dir / "package.spb";
+    writeFile(path, zipBytes({{storedItem("a", "first"), storedItem("b", "replacing"),
+                               storedItem("c", "third"), storedItem("d", "fourth")}}));
+    const ZipFile archive(path.c_str());
+    const auto extract = [&](std::size_t index, const std::string& destination) {
+        return extractFile(transaction, archive, archive.entries().at(index), destination, 0644);
+    };
+
+    EXPECT_EQ(0, extract(0, dir / "a"));
+    EXPECT_EQ(0, extract(1, path));
+    EXPECT_EQ(0, extract(2, dir / "c"));
+    ASSERT_EQ(0, unlink(path.c_str()));
+    EXPECT_EQ(0, extract(3, dir / "a")); // replaces a file: the next one opens the archive again
+    EXPECT_EQ(1, extract(0, dir / "e"));
+
+    EXPECT_EQ("", readFile(dir / "c")) << "what replaced the archive is too short for it";
+}
+
 TEST_F(ExtractFileTest, SetsExactlyTheModeWhateverTheUmask)
 {
     (void)umask(077);

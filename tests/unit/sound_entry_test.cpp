@@ -127,6 +127,38 @@ TEST_F(SoundEntryTest, AStoredEntryOfTwoGibibytesIsLeftToItsStream)
     EXPECT_EQ("", readFile(destination));
 }
 
+TEST_F(SoundEntryTest, AnOffsetThatCannotBeReachedIsTheStartOfTheArchive)
+{
+    const std::string data = rawDeflate("text");
+    for (const std::uint32_t offset : {0x80000000U, 0xFFFFFFFFU}) {
+        ZipEntry stored = entryOf(0, 5, 5);
+        ZipEntry deflated = entryOf(8, data.size(), 4);
+        stored.dataOffset = deflated.dataOffset = offset;
+
+        EXPECT_EQ(0, copy("the first bytes", stored)) << offset;
+        EXPECT_EQ("the f", readFile(destination)) << offset;
+        ASSERT_EQ(0, unlink(destination.c_str()));
+        EXPECT_EQ(0, copy(data, deflated)) << offset;
+        EXPECT_EQ("text", readFile(destination)) << offset;
+        ASSERT_EQ(0, unlink(destination.c_str()));
+    }
+}
+
+TEST_F(SoundEntryTest, AnEntryIsReadFromItsPlaceWhereverTheArchiveStands)
+{
+    writeFile(source, "before and the entry behind");
+    const ScopedFd archive(open(source.c_str(), O_RDONLY));
+    ASSERT_EQ(3, lseek(archive.get(), 3, SEEK_SET));
+    ZipEntry entry = entryOf(0, 9, 9);
+    entry.dataOffset = 11;
+    const ScopedFd file(open(destination.c_str(), O_WRONLY | O_CREAT, 0600));
+
+    EXPECT_EQ(0, copySoundEntry(archive.get(), entry, file.get()));
+
+    EXPECT_EQ("the entry", readFile(destination));
+    EXPECT_EQ(3, lseek(archive.get(), 0, SEEK_CUR));
+}
+
 TEST_F(SoundEntryTest, AFullDiskIsToldForADeflatedEntry)
 {
     const ScopedFd full(open("/dev/full", O_WRONLY));

@@ -25,18 +25,20 @@ ScopedFd openForWriting(const std::string& path)
     return ScopedFd(open(path.c_str(), O_WRONLY | O_CREAT | O_TRUNC | O_CLOEXEC, NewFileMode));
 }
 
-/// Opens `destination` for an extracted file, its old content backed up; returns 0, or the code of
-/// what failed.
+/// Opens `destination` for a file that is extracted from `archive`, its old content backed up;
+/// returns 0, or the code of what failed.
 ///
 /// Hardly ever anything lies there, so creating it comes first and looking at what is there only
 /// when that fails, whatever the reason: the second road tells it.
-int openDestination(FileTransaction& transaction, const std::string& destination, ScopedFd& file)
+int openDestination(FileTransaction& transaction, const ZipFile& archive,
+                    const std::string& destination, ScopedFd& file)
 {
     file =
         ScopedFd(open(destination.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_CLOEXEC, NewFileMode));
     if (file.isOpen())
         return FileOk;
 
+    archive.reopenForNextEntry(); // it may be what is moved away
     const int backedUp = backupFile(transaction, destination);
     if (backedUp != FileOk)
         return backedUp;
@@ -84,7 +86,7 @@ int createIfMissing(FileTransaction& transaction, const std::string& path, mode_
     return FileOk;
 }
 
-/// Writes `entry`, at whose data `source` stands, to the new file `destination`.
+/// Writes `entry`, which lies in the open archive `source`, to the new file `destination`.
 int writeEntry(const ZipFile& archive, const ZipEntry& entry, int source, int destination)
 {
     const int copied = copySoundEntry(source, entry, destination);
@@ -145,17 +147,17 @@ int backupCopy(FileTransaction& transaction, const std::string& path)
 int extractFile(FileTransaction& transaction, const ZipFile& archive, const ZipEntry& entry,
                 const std::string& destination, mode_t mode)
 {
-    const ScopedFd source = archive.openEntry(&entry);
-    if (!source.isOpen())
+    const auto source = archive.openEntry(&entry);
+    if (!source)
         return CannotOpenForReading;
 
     ScopedFd file(-1);
-    const int opened = openDestination(transaction, destination, file);
+    const int opened = openDestination(transaction, archive, destination, file);
     if (opened != FileOk)
         return opened;
     record(transaction, Created, destination); // before its first byte: a rollback finds it
 
-    const int code = writeEntry(archive, entry, source.get(), file.get());
+    const int code = writeEntry(archive, entry, source->get(), file.get());
     if (code != FileOk)
         return code;
     if (mode != 0)

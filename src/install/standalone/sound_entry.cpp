@@ -19,8 +19,9 @@ constexpr std::size_t PieceSize = std::size_t{128} * 1024;
 /// Inflates the raw deflated data of one entry, piece by piece.
 class PieceReader {
 public:
-    /// Reads `packedSize` bytes from where `archive` stands.
-    PieceReader(int archive, std::uint32_t packedSize) : archive_(archive), packedLeft_(packedSize)
+    /// Reads the data of `entry` from `archive`.
+    PieceReader(int archive, const ZipEntry& entry)
+        : archive_(archive), at_(dataStart(entry)), packedLeft_(entry.compressedSize)
     {
         status_ = inflateInit2(&inflate_, -15);
     }
@@ -48,15 +49,18 @@ private:
     void refill()
     {
         static unsigned char input[InputSize];
-        const ssize_t count = read(archive_, input, std::min<std::size_t>(InputSize, packedLeft_));
+        const ssize_t count =
+            pread(archive_, input, std::min<std::size_t>(InputSize, packedLeft_), at_);
         if (count <= 0)
             return;
+        at_ += count;
         packedLeft_ -= static_cast<std::uint32_t>(count);
         inflate_.next_in = input;
         inflate_.avail_in = static_cast<uInt>(count);
     }
 
     int archive_;
+    off_t at_;
     std::uint32_t packedLeft_; ///< compressed bytes that are not read yet
     int status_;               ///< last answer of zlib
     z_stream inflate_ = {};
@@ -65,7 +69,7 @@ private:
 int copyDeflated(int archive, const ZipEntry& entry, int destination)
 {
     static unsigned char piece[PieceSize];
-    PieceReader reader(archive, entry.compressedSize);
+    PieceReader reader(archive, entry);
     std::uint32_t room = entry.uncompressedSize;
     do {
         const std::size_t count = reader.next(piece);
@@ -84,9 +88,10 @@ int copyStored(int archive, const ZipEntry& entry, int destination)
 {
     if (entry.uncompressedSize > std::numeric_limits<std::int32_t>::max())
         return EntryNotSound;
+    off_t at = dataStart(entry);
     std::size_t left = entry.uncompressedSize;
     while (left != 0) {
-        const ssize_t count = sendfile(destination, archive, nullptr, left);
+        const ssize_t count = sendfile(destination, archive, &at, left);
         if (count < 0)
             return EntryNotSound;
         if (count == 0) // a short archive reads as a shorter entry

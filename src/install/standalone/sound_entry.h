@@ -11,8 +11,8 @@ struct ZipEntry;
 /// What copySoundEntry() returns beside the codes of file_codes.h.
 inline constexpr int EntryNotSound = -1;
 
-/// Writes the content of `entry`, at whose first data byte `archive` stands, to the empty file
-/// `destination`.
+/// Writes the content of `entry` of `archive` to the empty file `destination`. The place where
+/// `archive` stands is neither used nor changed.
 ///
 /// Returns 0; the code of a failed write (5, 6, 7); or EntryNotSound (-1): `destination` may then
 /// hold anything, and only the entry's stream tells what belongs there.

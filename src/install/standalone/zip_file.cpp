@@ -52,6 +52,13 @@ ScopedFd openArchive(const char* path)
     return ScopedFd(::open(path, O_RDONLY | O_CLOEXEC));
 }
 
+/// Whether there is a stream for `entry`.
+bool isReadable(const ZipEntry* entry)
+{
+    return entry != nullptr && entry->compressedSize != 0 && entry->uncompressedSize != 0 &&
+           (entry->method == 0 || entry->method == 8);
+}
+
 /// Reads an archive's headers from a window of the file, so that one system call serves many.
 class HeaderReader {
 public:
@@ -235,6 +242,11 @@ int scanLocalHeaders(HeaderReader& reader, std::vector<ZipEntry>& entries)
 
 } // namespace
 
+std::int64_t dataStart(const ZipEntry& entry)
+{
+    return entry.dataOffset < SeekLimit ? entry.dataOffset : 0;
+}
+
 X__StoredInputStream::X__StoredInputStream(ScopedFd file, std::uint32_t size)
     : file_(std::move(file)), remaining_(static_cast<std::int32_t>(size))
 {
@@ -357,25 +369,26 @@ const ZipEntry* ZipFile::findEntry(const std::string& name) const
     return found == entries_.end() ? nullptr : &*found;
 }
 
-ScopedFd ZipFile::openEntry(const ZipEntry* entry) const
+std::shared_ptr<const ScopedFd> ZipFile::openEntry(const ZipEntry* entry) const
 {
-    if (entry == nullptr || entry->compressedSize == 0 || entry->uncompressedSize == 0)
-        return ScopedFd(-1);
-    if (entry->method != 0 && entry->method != 8)
-        return ScopedFd(-1);
-
-    ScopedFd file = openArchive(path_.c_str());
-    // A seek that fails is not looked at: the entry then starts at the archive's first byte.
-    if (file.isOpen() && entry->dataOffset < SeekLimit)
-        (void)::lseek(file.get(), entry->dataOffset, SEEK_SET);
-    return file;
+    if (!isReadable(entry))
+        return nullptr;
+    if (!file_) {
+        auto file = std::make_shared<const ScopedFd>(openArchive(path_.c_str()));
+        if (file->isOpen())
+            file_ = std::move(file);
+    }
+    return file_;
 }
 
 InputStream* ZipFile::getInputStream(const ZipEntry* entry) const
 {
-    ScopedFd file = openEntry(entry);
+    if (!isReadable(entry))
+        return nullptr;
+    ScopedFd file = openArchive(path_.c_str());
     if (!file.isOpen())
         return nullptr;
+    (void)::lseek(file.get(), dataStart(*entry), SEEK_SET); // deliberate: not looked at
     if (entry->method == 0)
         return new X__StoredInputStream(std::move(file), entry->uncompressedSize);
     return new X__DeflatedInputStream(std::move(file), entry->compressedSize,

@@ -8,6 +8,7 @@
 #include "scoped.h"
 
 #include <cstdint>
+#include <memory>
 #include <string>
 #include <vector>
 
@@ -107,9 +108,14 @@ private:
     unsigned char input_[4096];
 };
 
+/// Where the data of `entry` begins in its archive. A seek to 2^31 or beyond fails, which nobody
+/// looks at: such an entry begins at the archive's first byte.
+[[nodiscard]] std::int64_t dataStart(const ZipEntry& entry);
+
 /// An archive and the list of its entries.
 ///
-/// Holds no open file: the archive is open inside readDirectory() and inside each stream only.
+/// Each stream opens the archive by itself. openEntry() keeps it open between its calls: to open it
+/// anew for each of many small entries costs as much as to write some of them.
 class ZipFile {
 public:
     /// Reads the directory of the archive at `path`. Entries stay empty when there is none to read.
@@ -129,9 +135,12 @@ public:
     /// cannot be opened.
     [[nodiscard]] InputStream* getInputStream(const ZipEntry* entry) const;
 
-    /// The archive, open at the first data byte of `entry`; not open where getInputStream() returns
-    /// null.
-    [[nodiscard]] ScopedFd openEntry(const ZipEntry* entry) const;
+    /// The archive, to read `entry` from dataStart() on without moving the descriptor, which all
+    /// callers share; null where getInputStream() returns null.
+    [[nodiscard]] std::shared_ptr<const ScopedFd> openEntry(const ZipEntry* entry) const;
+
+    /// Lets the next openEntry() open what then lies at the archive's path.
+    void reopenForNextEntry() const { file_.reset(); }
 
     /// Fills `entries` from the archive at `path` (null is allowed): from its central directory,
     /// or, when that cannot be used, from its local headers. Returns a ZipCode (0 to 8); `entries`
@@ -144,4 +153,5 @@ public:
 private:
     std::string path_;
     std::vector<ZipEntry> entries_;
+    mutable std::shared_ptr<const ScopedFd> file_; ///< of openEntry(); null when it is to open
 };
