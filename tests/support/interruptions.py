@@ -68,7 +68,8 @@ def key_of(line):
 def registry_was_being_written(case, path):
     if not case.was_empty(REGISTRY) or REGISTRY not in case.before:
         return False
-    if case.between.get(REGISTRY + BACKUP) != case.before[REGISTRY]:
+    backup = case.between.get(REGISTRY + BACKUP)  # a copy, with a mode of its own
+    if backup is None or backup.content != case.before[REGISTRY].content:
         return False
     if not case.installs:
         return case.status == 1 and not differences(case.between, case.after)
