@@ -93,10 +93,11 @@ class Bench:
 
     # The contests.
 
-    def install(self, package, preset, opponent):
-        ours = Contestant("wzorinst", self.installer(preset, "i", package))
+    def install(self, package, preset, opponent, program="wzorinst"):
+        ours = Contestant(program, self.installer(preset, "i", package, program))
         theirs = Contestant(opponent, self.unpacker(opponent, preset, package))
-        return self.contest(package, "install", preset, ours, theirs, self.plan["pairs"])
+        kind = "install" if program == "wzorinst" else "install, commands aside"
+        return self.contest(package, kind, preset, ours, theirs, self.plan["pairs"])
 
     def upgrade(self, package, preset, opponent):
         again = self.installer(preset, "i", package)
@@ -178,6 +179,8 @@ class Bench:
         for kind, package, preset, opponent in plan["contests"]:
             if kind == "install":
                 contests.append(self.install(package, preset, opponent))
+            elif kind == "install, commands aside":
+                contests.append(self.install(package, preset, opponent, "wzorinst_no_commands"))
             elif kind == "upgrade":
                 contests.append(self.upgrade(package, preset, opponent))
             elif kind == "removal":
