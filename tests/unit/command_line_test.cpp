@@ -34,6 +34,7 @@ protected:
         std::vector<std::string> texts = {"wzorinst"};
         texts.insert(texts.end(), arguments.begin(), arguments.end());
         std::vector<char*> argv;
+        argv.reserve(texts.size() + 1);
         for (std::string& text : texts)
             argv.push_back(text.data());
         argv.push_back(nullptr);
