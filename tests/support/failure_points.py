@@ -42,7 +42,7 @@ ERRORS = {
 
 # The kernel's names, of both builds, that go by another name above.
 KINDS = {"_llseek": "lseek", "ftruncate64": "ftruncate", "openat": "open", "pread64": "read",
-         "sendfile64": "sendfile"}
+         "renameat2": "rename", "sendfile64": "sendfile"}
 
 # Calls that a trace of files and descriptors shows as well, but that touch no file system.
 NOT_OF_FILES = {"execve", "fcntl", "fcntl64", "mmap", "mmap2"}

@@ -171,6 +171,18 @@ TEST_F(BackupFileTest, ReplacesAnOlderBackup)
     EXPECT_FALSE(pathExists(dir / "file"));
 }
 
+TEST_F(BackupFileTest, AnOlderBackupThatIsTheSameFileDoesNotKeepItInPlace)
+{
+    const std::string path = dir / "file";
+    writeFile(path, "old");
+    ASSERT_EQ(0, link(path.c_str(), (path + ".bak").c_str()));
+
+    EXPECT_EQ(0, backupFile(transaction, path));
+
+    EXPECT_FALSE(pathExists(path));
+    EXPECT_EQ("old", readFile(path + ".bak"));
+}
+
 TEST_F(BackupFileTest, AFileThatCannotBeMovedIsCode9AndHasNoEntry)
 {
     writeFile(dir / "file", "old");
@@ -337,7 +349,7 @@ TEST_F(ExtractFileTest, AnArchiveThatAnEntryReplacesIsReadAnew)
     EXPECT_EQ(0, extract(1, path));
     EXPECT_EQ(0, extract(2, dir / "c"));
     ASSERT_EQ(0, unlink(path.c_str()));
-    EXPECT_EQ(0, extract(3, dir / "a")); // replaces a file: the next one opens the archive again
+    EXPECT_EQ(0, extract(3, dir / "a")); // replaces a file: the next one looks for the archive
     EXPECT_EQ(1, extract(0, dir / "e"));
 
     EXPECT_EQ("", readFile(dir / "c")) << "what replaced the archive is too short for it";

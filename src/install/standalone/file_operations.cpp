@@ -25,24 +25,33 @@ ScopedFd openForWriting(const std::string& path)
     return ScopedFd(open(path.c_str(), O_WRONLY | O_CREAT | O_TRUNC | O_CLOEXEC, NewFileMode));
 }
 
+/// True when the last file of the journal took the place of another.
+bool lastReplacedAnother(const FileTransaction& transaction)
+{
+    const auto& journal = transaction.journal;
+    return journal.size() >= 2 && journal[journal.size() - 2].kind == BackedUp;
+}
+
 /// Opens `destination` for a file that is extracted from `archive`, its old content backed up;
 /// returns 0, or the code of what failed.
 ///
-/// Hardly ever anything lies there, so creating it comes first and looking at what is there only
-/// when that fails, whatever the reason: the second road tells it.
+/// Into a new installation hardly anything is in the way, so creating it comes first, and looking
+/// at what is there only when that fails, whatever the reason: the second road tells it. Where the
+/// last file replaced another, this one is expected to as well.
 int openDestination(FileTransaction& transaction, const ZipFile& archive,
                     const std::string& destination, ScopedFd& file)
 {
-    file =
-        ScopedFd(open(destination.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_CLOEXEC, NewFileMode));
+    constexpr int CreateOnly = O_WRONLY | O_CREAT | O_EXCL | O_CLOEXEC;
+    if (!lastReplacedAnother(transaction))
+        file = ScopedFd(open(destination.c_str(), CreateOnly, NewFileMode));
     if (file.isOpen())
         return FileOk;
 
-    archive.reopenForNextEntry(); // it may be what is moved away
     const int backedUp = backupFile(transaction, destination);
     if (backedUp != FileOk)
         return backedUp;
     file = openForWriting(destination);
+    archive.fileWasReplaced();
     return file.isOpen() ? FileOk : CannotOpenForWriting;
 }
 
@@ -122,9 +131,11 @@ int backupFile(FileTransaction& transaction, const std::string& path)
         return FileOk;
 
     const std::string backup = backupName(path);
-    (void)unlink(backup.c_str()); // of an older run; if it stays, the rename tells
-    if (std::rename(path.c_str(), backup.c_str()) != 0)
-        return CannotRename;
+    if (renameat2(AT_FDCWD, path.c_str(), AT_FDCWD, backup.c_str(), RENAME_NOREPLACE) != 0) {
+        (void)unlink(backup.c_str()); // of an older run; if it stays, the rename tells
+        if (std::rename(path.c_str(), backup.c_str()) != 0)
+            return CannotRename;
+    }
 
     // Only now: an entry without its backup would have nothing to restore.
     record(transaction, BackedUp, path);

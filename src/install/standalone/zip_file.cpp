@@ -8,6 +8,7 @@
 #include <limits>
 
 #include <fcntl.h>
+#include <sys/stat.h>
 
 namespace {
 
@@ -379,6 +380,15 @@ std::shared_ptr<const ScopedFd> ZipFile::openEntry(const ZipEntry* entry) const
             file_ = std::move(file);
     }
     return file_;
+}
+
+void ZipFile::fileWasReplaced() const
+{
+    struct stat held = {};
+    struct stat named = {};
+    if (!file_ || fstat(file_->get(), &held) != 0 || stat(path_.c_str(), &named) != 0 ||
+        held.st_ino != named.st_ino || held.st_dev != named.st_dev)
+        file_.reset();
 }
 
 InputStream* ZipFile::getInputStream(const ZipEntry* entry) const

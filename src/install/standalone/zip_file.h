@@ -139,8 +139,9 @@ public:
     /// callers share; null where getInputStream() returns null.
     [[nodiscard]] std::shared_ptr<const ScopedFd> openEntry(const ZipEntry* entry) const;
 
-    /// Lets the next openEntry() open what then lies at the archive's path.
-    void reopenForNextEntry() const { file_.reset(); }
+    /// To be called when a file was replaced, which may be the archive: lets the next openEntry()
+    /// open what then lies at the archive's path.
+    void fileWasReplaced() const;
 
     /// Fills `entries` from the archive at `path` (null is allowed): from its central directory,
     /// or, when that cannot be used, from its local headers. Returns a ZipCode (0 to 8); `entries`
