@@ -56,7 +56,7 @@ TEST_F(SoundEntryTest, ADeflatedEntryArrivesWhole)
 TEST_F(SoundEntryTest, ADeflatedEntryOfManyPiecesArrivesWhole)
 {
     // More than one read and more than one piece, the last one full or nearly so.
-    for (const std::size_t size : {131071, 131072, 131073, 393216, 1000000}) {
+    for (const std::size_t size : {131071U, 131072U, 131073U, 393216U, 1000000U}) {
         const std::string content = textBytes(size / 2, 2) + noiseBytes(size - size / 2, 3);
         const std::string data = rawDeflate(content);
 
