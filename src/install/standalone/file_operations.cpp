@@ -17,6 +17,7 @@ namespace {
 
 constexpr mode_t NewFileMode = 0666;
 constexpr mode_t NewDirectoryMode = 0777;
+constexpr int CreateOnly = O_WRONLY | O_CREAT | O_EXCL | O_CLOEXEC;
 constexpr int CopyBlockSize = 4096;
 constexpr int ExtractBlockSize = 8192;
 
@@ -41,7 +42,6 @@ bool lastReplacedAnother(const FileTransaction& transaction)
 int openDestination(FileTransaction& transaction, const ZipFile& archive,
                     const std::string& destination, ScopedFd& file)
 {
-    constexpr int CreateOnly = O_WRONLY | O_CREAT | O_EXCL | O_CLOEXEC;
     if (!lastReplacedAnother(transaction))
         file = ScopedFd(open(destination.c_str(), CreateOnly, NewFileMode));
     if (file.isOpen())
