@@ -7,7 +7,7 @@ speaks for it.
 
 from dataclasses import dataclass, field
 
-from roads import HOME
+from scenarios import HOME
 
 BACKUP = ".bak"
 
@@ -42,7 +42,7 @@ class RuleBook(list):
 class Case:
     """One run that met a failure: where, how it ended, and what it found and left."""
 
-    road: object
+    scenario: object
     point: object
     error: str
     status: int
@@ -59,7 +59,7 @@ class Case:
     def wanted(self):
         if self.status != 0:
             return self.before
-        return self.reference("without its failure") if self.road.fails else self.normal
+        return self.reference("without its failure") if self.scenario.fails else self.normal
 
     @property
     def hit(self):

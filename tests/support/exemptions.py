@@ -10,9 +10,9 @@ import os
 import re
 
 from cases import BACKUP, Rule, RuleBook, contents_before, is_below, lines_of
-from roads import (COMMON_SETTING, CONTROL, CONTROL_STATE, HOME, INDEX, INSTALL_TYPE,
-                   OBSOLETE_FILES, PACKAGES, PROBE, REGISTRY, SCRIPTS, SETTINGS, SINGLE_USER_FLAG,
-                   TRACE_SETTINGS, differences)
+from scenarios import (COMMON_SETTING, CONTROL, CONTROL_STATE, HOME, INDEX, INSTALL_TYPE,
+                       OBSOLETE_FILES, PACKAGES, PROBE, REGISTRY, SCRIPTS, SETTINGS,
+                       SINGLE_USER_FLAG, TRACE_SETTINGS, differences)
 
 RULES = RuleBook()
 rule = RULES.rule
@@ -84,7 +84,7 @@ def rollback_step_fails(case, path):
       "What a removal cannot look at or delete stays, with what lies below; it succeeds all the "
       "same.", 0)
 def removal_is_best_effort(case, path):
-    if case.road.arguments[0] != "r" or not (case.hits_above(path) or is_below(case.hit, path)):
+    if case.scenario.arguments[0] != "r" or not (case.hits_above(path) or is_below(case.hit, path)):
         return False
     if case.hit == INDEX:
         return path == INDEX and case.kind == "unlink" and is_index(case.content(path))
@@ -132,7 +132,7 @@ def index_is_best_effort(case, path):
       "A removal whose index cannot be read lists only the installer's own files and leaves the "
       "rest; one whose index is empty takes every file in the known places.", 0)
 def removal_goes_by_the_index(case, path):
-    if case.road.arguments[0] != "r" or case.hit != INDEX:
+    if case.scenario.arguments[0] != "r" or case.hit != INDEX:
         return False
     short = case.reference("with an index that lists nothing")
     return (case.after.get(path) == short.get(path)
@@ -283,7 +283,7 @@ def scratch_file_stays(case, path):
 def unreadable_registry(case, _):
     unreadable = case.hit == REGISTRY and case.kind in ("open", "read")
     unwritable = case.hit == PROBE and case.kind in OPENINGS
-    return (case.road.arguments[0] == "i" and (unreadable or unwritable)
+    return (case.scenario.arguments[0] == "i" and (unreadable or unwritable)
             and not differences(case.reference("without a registry"), case.after))
 
 
@@ -291,7 +291,8 @@ def unreadable_registry(case, _):
       "i then repairs the installation with its own version and registers that, also in place of a "
       "newer one.", 0)
 def unreadable_control(case, path):
-    if case.road.arguments[0] != "i" or case.hit != CONTROL or case.kind not in ("access", "stat"):
+    if (case.scenario.arguments[0] != "i" or case.hit != CONTROL
+            or case.kind not in ("access", "stat")):
         return False
     repaired = case.reference("without a scanner control")
     return path == REGISTRY and case.after[path] == repaired[path]
@@ -302,7 +303,7 @@ def unreadable_control(case, path):
       "in zor.ini.bak.", 1)
 def removal_is_not_rolled_back(case, path):
     copy = case.after.get(REGISTRY + BACKUP)
-    return (case.road.arguments[0] == "r" and path in (REGISTRY, REGISTRY + BACKUP)
+    return (case.scenario.arguments[0] == "r" and path in (REGISTRY, REGISTRY + BACKUP)
             and case.hit == REGISTRY and case.kind in ("open to create", "write", "close")
             and copy is not None and copy.content == case.before[REGISTRY].content)
 

@@ -12,7 +12,7 @@ import re
 import signal
 from dataclasses import dataclass, replace
 
-from roads import INDEX, PACKAGES
+from scenarios import INDEX, PACKAGES
 
 TRACE = "/var/strace/trace"
 TIME_LIMIT = 30  # seconds
@@ -146,24 +146,24 @@ def strace(*options):
 TRACING = strace("-e", "trace=%file,%desc,getuid,getuid32")
 
 
-def trace(road, machine):
-    """Runs `road` undisturbed; returns the outcome and the points of the run."""
-    outcome = road.run(machine, TRACING)
+def trace(scenario, machine):
+    """Runs `scenario` undisturbed; returns the outcome and the points of the run."""
+    outcome = scenario.run(machine, TRACING)
     return outcome, points_of(machine.read(TRACE))
 
 
-def run_failing(road, machine, point, error):
-    """Runs `road` with the call of `point` failing with `error`."""
-    outcome = road.run(machine, strace("-e", f"trace={point.name}", "-e",
+def run_failing(scenario, machine, point, error):
+    """Runs `scenario` with the call of `point` failing with `error`."""
+    outcome = scenario.run(machine, strace("-e", f"trace={point.name}", "-e",
                                        f"inject={point.name}:error={error}:when={point.count}"))
     hit = [line for line in machine.read(TRACE).splitlines() if line.endswith("(INJECTED)")]
     assert len(hit) == 1, f"{point.label} was not met as expected: {hit}"
     return outcome
 
 
-def run_killed(road, machine, point):
-    """Runs `road` and kills the installer just before the call of `point` is made."""
-    outcome = road.run(machine, strace("-e", f"trace={point.name}", "-e",
+def run_killed(scenario, machine, point):
+    """Runs `scenario` and kills the installer just before the call of `point` is made."""
+    outcome = scenario.run(machine, strace("-e", f"trace={point.name}", "-e",
                                        f"inject={point.name}:signal=KILL:when={point.count}"))
     met = outcome.status == 128 + signal.SIGKILL and machine.read(TRACE).endswith("= ?\n")
     assert met, f"{point.label} was not met as expected: status {outcome.status}"

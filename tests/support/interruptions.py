@@ -9,8 +9,8 @@ not excused: they must be old contents that the second run did not touch.
 from dataclasses import dataclass, field
 
 from cases import BACKUP, RuleBook, contents_before, lines_of
-from roads import (COMMON_SETTING, CONTROL, CONTROL_STATE, INDEX, INSTALL_TYPE, REGISTRY,
-                   SETTINGS, TRACE_SETTINGS, differences)
+from scenarios import (COMMON_SETTING, CONTROL, CONTROL_STATE, INDEX, INSTALL_TYPE, REGISTRY,
+                       SETTINGS, TRACE_SETTINGS, differences)
 
 
 @dataclass
@@ -20,7 +20,7 @@ class Interruption:
     `between` is the tree that the kill left, `status` and `after` are those of the second run.
     """
 
-    road: object
+    scenario: object
     point: object
     status: int
     output: str
@@ -36,11 +36,11 @@ class Interruption:
 
     @property
     def installs(self):
-        return self.road.arguments[0] == "i"
+        return self.scenario.arguments[0] == "i"
 
     @property
     def removes_all(self):
-        return self.road.name == "remove"
+        return self.scenario.name == "remove"
 
     def was_empty(self, path):
         """True when the kill left `path` without content."""
@@ -102,7 +102,8 @@ def only_fresh_installations_make_it(case, path):
 
 
 def is_finished_installation(case):
-    return case.road.name == "install" and REGISTRY in case.between and not case.was_empty(REGISTRY)
+    return (case.scenario.name == "install" and REGISTRY in case.between
+            and not case.was_empty(REGISTRY))
 
 
 @rule("the index was being written",
@@ -121,7 +122,7 @@ def index_was_being_written(case, path):
       "behind are lost, the owner's too. The second run adds the missing keys with their defaults, "
       "and ZorTrace.properties follows what the settings then say about traces.", 0)
 def settings_were_being_written(case, path):
-    if case.road.name != "upgrade" or SETTINGS not in case.between:
+    if case.scenario.name != "upgrade" or SETTINGS not in case.between:
         return False
     written, whole = case.between[SETTINGS].content, case.normal[SETTINGS].content
     if written == whole or not whole.startswith(written):

@@ -1,6 +1,6 @@
 """What the sweeps of failures share: their command line, their machines, and their tables.
 
-A `Laboratory` has one machine a job; a `Bench` is one road on it: the tree that the road finds, the
+A `Laboratory` has one machine a job; a `Bench` is one scenario on it: the tree that it finds, the
 one that an undisturbed run leaves, the points of that run, and further trees to compare with.
 """
 
@@ -19,37 +19,37 @@ from dataclasses import replace
 import exemptions
 import failure_points
 from machine import SPB
-from roads import (COMMON_SETTING, CONTROL, HOME, INDEX, REGISTRY, REPOSITORY, ROADS, furnished,
-                   new_machine, restore, toolkit_packages, tree_of)
+from scenarios import (COMMON_SETTING, CONTROL, HOME, INDEX, REGISTRY, REPOSITORY, SCENARIOS,
+                       furnished, new_machine, restore, toolkit_packages, tree_of)
 from spb import IMAGE_ROOT
 
 PRESETS = ("release", "release-i686")
 
 
-def arguments_of(description, roads):
-    """Parses a sweep's command line. `roads` are the names of those that it can take."""
+def arguments_of(description, scenarios):
+    """Parses a sweep's command line. `scenarios` are the names of those that it can take."""
     parser = argparse.ArgumentParser(
         description=description, formatter_class=argparse.RawDescriptionHelpFormatter)
     binary = parser.add_mutually_exclusive_group()
     binary.add_argument("--preset", choices=PRESETS, default=PRESETS[0],
                         help="build and run the 64-bit or the 32-bit program (default: release)")
     binary.add_argument("--binary", metavar="FILE", help="run this wzorinst instead")
-    parser.add_argument("--road", action="append", choices=roads, metavar="ROAD",
-                        help="take only this road; can be given again. Roads: " + ", ".join(
-                            f"{name} ({ROADS[name].title})" for name in roads))
+    parser.add_argument("--scenario", action="append", choices=scenarios, metavar="SCENARIO",
+                        help="take only this scenario; can be given again. Scenarios: " + ", ".join(
+                            f"{name} ({SCENARIOS[name].title})" for name in scenarios))
     parser.add_argument("--every", type=int, default=1, metavar="N",
                         help="try every Nth point only")
     parser.add_argument("--point", metavar="POINT",
                         help="try only this point, as the list of violations names it, and show "
-                        "everything about it; with one --road")
+                        "everything about it; with one --scenario")
     parser.add_argument("--jobs", type=int, default=os.cpu_count(), metavar="N",
                         help="runs at the same time (default: one a processor)")
     arguments = parser.parse_args()
     if arguments.every < 1 or arguments.jobs < 1:
         parser.error("N must be at least 1")
-    if arguments.point and len(arguments.road or ()) != 1:
-        parser.error("--point needs one --road")
-    arguments.roads = [ROADS[name] for name in arguments.road or roads]
+    if arguments.point and len(arguments.scenario or ()) != 1:
+        parser.error("--point needs one --scenario")
+    arguments.scenarios = [SCENARIOS[name] for name in arguments.scenario or scenarios]
     arguments.binary = os.path.realpath(arguments.binary or built(arguments.preset))
     return arguments
 
@@ -99,16 +99,16 @@ class Laboratory:
 
 
 class Bench:
-    """One road of a laboratory."""
+    """One scenario of a laboratory."""
 
-    def __init__(self, laboratory, road):
-        self.road = road
+    def __init__(self, laboratory, scenario):
+        self.scenario = scenario
         self.spare = laboratory.spare
-        self.before = furnished(road, laboratory.binary, laboratory.packages)
+        self.before = furnished(scenario, laboratory.binary, laboratory.packages)
         restore(self.spare, self.before)
-        self.undisturbed, self.points = failure_points.trace(road, self.spare)
+        self.undisturbed, self.points = failure_points.trace(scenario, self.spare)
         self.normal = tree_of(self.spare)
-        assert self.undisturbed.status == int(road.fails), self.undisturbed.stdout
+        assert self.undisturbed.status == int(scenario.fails), self.undisturbed.stdout
         self.package = package_files(laboratory.packages)
         self.trees = {}
         self.lock = threading.Lock()
@@ -118,7 +118,7 @@ class Bench:
         with self.lock:
             if name not in self.trees:
                 restore(self.spare, self.before)
-                self.trees[name] = REFERENCES[name](self.road, self.spare)
+                self.trees[name] = REFERENCES[name](self.scenario, self.spare)
             return self.trees[name]
 
 
@@ -135,28 +135,28 @@ def package_files(packages):
 # Trees to compare with.
 
 def run_without(*paths):
-    """The tree that a road leaves on a machine without these paths."""
-    def run(road, machine):
+    """The tree that a scenario leaves on a machine without these paths."""
+    def run(scenario, machine):
         for path in paths:
             if machine.exists(path):
                 machine.remove(path)
-        road.run(machine)
+        scenario.run(machine)
         return tree_of(machine)
     return run
 
 
-def run_with_an_empty_index(road, machine):
+def run_with_an_empty_index(scenario, machine):
     machine.plant(INDEX, "", machine.mode(INDEX))
-    return run_without()(road, machine)
+    return run_without()(scenario, machine)
 
 
-def run_without_its_failure(road, machine):
-    return run_without(REGISTRY + ".bak")(replace(road, environment={}), machine)
+def run_without_its_failure(scenario, machine):
+    return run_without(REGISTRY + ".bak")(replace(scenario, environment={}), machine)
 
 
-def run_twice(road, machine):
-    road.run(machine)
-    return run_without()(road, machine)
+def run_twice(scenario, machine):
+    scenario.run(machine)
+    return run_without()(scenario, machine)
 
 
 REFERENCES = {
@@ -188,11 +188,12 @@ def paragraph(first, text):
 
 
 def print_exemptions(cases):
-    """Prints which rules excused something, in how many cases of which road, and which did not."""
+    """Prints which rules excused something, in how many cases of which scenario."""
     used = collections.Counter()
     for case in cases:
-        used.update({(name, case.road.name) for name in case.excused.values()})
+        used.update({(name, case.scenario.name) for name in case.excused.values()})
     print("Exemptions used (runs)\n")
     for rule in [*exemptions.RULES, exemptions.KEPT_DIRECTORY]:
-        roads = [f"{road} {used[rule.name, road]}" for road in ROADS if used[rule.name, road]]
-        print(paragraph(f"{rule.name}: {', '.join(roads) or 'none'}", rule.reason))
+        scenarios = [f"{scenario} {used[rule.name, scenario]}" for scenario in SCENARIOS
+                     if used[rule.name, scenario]]
+        print(paragraph(f"{rule.name}: {', '.join(scenarios) or 'none'}", rule.reason))

@@ -6,7 +6,7 @@ import failure_points
 import sweep
 from checks import same_tree
 from machine import SPB
-from roads import COMMAND_LOG, HOME, REGISTRY, ROADS, SETTINGS, restore, tree_of
+from scenarios import COMMAND_LOG, HOME, REGISTRY, SCENARIOS, SETTINGS, restore, tree_of
 
 
 @pytest.fixture(scope="module")
@@ -22,16 +22,16 @@ def point_on(bench, kind, path):
 
 
 def fail(bench, kind, path, error):
-    """Runs the road of `bench` with this call failing; returns the outcome and the tree."""
+    """Runs the scenario of `bench` with this call failing; returns the outcome and the tree."""
     restore(bench.spare, bench.before)
     point = point_on(bench, kind, path)
-    outcome = failure_points.run_failing(bench.road, bench.spare, point, error)
+    outcome = failure_points.run_failing(bench.scenario, bench.spare, point, error)
     return outcome, tree_of(bench.spare)
 
 
 @pytest.mark.parametrize("error", ["EIO", "EACCES"])
 def test_a_file_that_cannot_be_looked_at_is_backed_up_all_the_same(laboratory, error):
-    bench = sweep.Bench(laboratory, ROADS["failing-upgrade"])
+    bench = sweep.Bench(laboratory, SCENARIOS["failing-upgrade"])
     scanner = HOME + "/bin/trawlhw"
 
     outcome, after = fail(bench, "access", scanner, error)
@@ -43,7 +43,7 @@ def test_a_file_that_cannot_be_looked_at_is_backed_up_all_the_same(laboratory, e
 
 @pytest.mark.parametrize("error", ["EIO", "EACCES"])
 def test_a_registry_that_cannot_be_looked_at_is_not_overwritten_without_a_backup(laboratory, error):
-    bench = sweep.Bench(laboratory, ROADS["failing-register"])
+    bench = sweep.Bench(laboratory, SCENARIOS["failing-register"])
 
     outcome, after = fail(bench, "access", REGISTRY, error)
 
@@ -56,8 +56,8 @@ def test_a_registry_that_cannot_be_looked_at_is_not_overwritten_without_a_backup
 
 def kill_removal_before(bench, path):
     restore(bench.spare, bench.before)
-    failure_points.run_killed(bench.road, bench.spare, point_on(bench, "unlink", path))
-    refused = bench.road.run(bench.spare)
+    failure_points.run_killed(bench.scenario, bench.spare, point_on(bench, "unlink", path))
+    refused = bench.scenario.run(bench.spare)
     assert "*** Error: INI file not found: nothing to remove.\n" in refused.stdout
     assert refused.status == 1
 
@@ -68,7 +68,7 @@ def run(machine, *arguments):
 
 def test_a_removal_killed_before_the_settings_went_is_finished_by_a_repair_and_a_removal(
         laboratory):
-    bench = sweep.Bench(laboratory, ROADS["remove"])
+    bench = sweep.Bench(laboratory, SCENARIOS["remove"])
     kill_removal_before(bench, SETTINGS)
 
     assert run(bench.spare, "i", "SHOP", "-s", SPB) == 0
@@ -80,7 +80,7 @@ def test_a_removal_killed_before_the_settings_went_is_finished_by_a_repair_and_a
 
 def test_a_removal_killed_after_the_settings_went_is_finished_once_its_registry_is_deleted(
         laboratory):
-    bench = sweep.Bench(laboratory, ROADS["remove"])
+    bench = sweep.Bench(laboratory, SCENARIOS["remove"])
     kill_removal_before(bench, HOME + "/config/ZorHWConfig.xml")
 
     assert run(bench.spare, "i", "SHOP", "-s", SPB) == 1

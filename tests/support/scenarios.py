@@ -1,8 +1,8 @@
-"""The roads that the sweeps of failures take: what lies on the machine, and the command given.
+"""The scenarios of the sweeps: what is on the machine, and the command given.
 
-A `Road` is a command line of the installer together with the tree that it finds. The machine of a
-road is furnished once, with the real binary and the example toolkit, and kept as a tree; `restore`
-brings any machine back to such a tree, byte for byte and mode for mode.
+A `Scenario` is a command line of the installer together with the tree that it finds. Its machine is
+furnished once, with the real binary and the example toolkit, and kept as a tree; `restore` brings
+any machine back to such a tree, byte for byte and mode for mode.
 """
 
 import os
@@ -44,7 +44,7 @@ OBSOLETE_FILES = tuple(HOME + "/bin/" + name
 
 
 @dataclass(frozen=True)
-class Road:
+class Scenario:
     """One way through the installer. `fails` tells how an undisturbed run ends."""
 
     name: str
@@ -152,18 +152,19 @@ def with_registry_that_cannot_be_saved(furnish):
     return furnish_so
 
 
-ROADS = {road.name: road for road in (
-    Road("install", "fresh installation", ("i", "SHOP", "-s", STORED_SPB), nothing_installed),
-    Road("upgrade", "upgrade of an older version", ("i", "CLUB", "-s", SPB), older_version),
-    Road("register", "registration on a newer version", ("i", "CLUB", "-s", SPB), newer_version),
-    Road("unregister", "removal of one of two exploiters", ("r", "DESK"), two_exploiters),
-    Road("remove", "removal of the last exploiter", ("r", "SHOP"), last_exploiter),
-    Road("failing-install", "fresh installation whose last step fails",
+SCENARIOS = {scenario.name: scenario for scenario in (
+    Scenario("install", "fresh installation", ("i", "SHOP", "-s", STORED_SPB), nothing_installed),
+    Scenario("upgrade", "upgrade of an older version", ("i", "CLUB", "-s", SPB), older_version),
+    Scenario("register", "registration on a newer version", ("i", "CLUB", "-s", SPB),
+             newer_version),
+    Scenario("unregister", "removal of one of two exploiters", ("r", "DESK"), two_exploiters),
+    Scenario("remove", "removal of the last exploiter", ("r", "SHOP"), last_exploiter),
+    Scenario("failing-install", "fresh installation whose last step fails",
          ("i", "SHOP", "-s", SPB, "-r"), nothing_installed, True,
          {"ZOR_FAIL": "-s common_trace_path:9"}),
-    Road("failing-upgrade", "upgrade whose last step fails", ("i", "CLUB", "-s", SPB),
+    Scenario("failing-upgrade", "upgrade whose last step fails", ("i", "CLUB", "-s", SPB),
          with_registry_that_cannot_be_saved(older_version), True),
-    Road("failing-register", "registration whose last step fails", ("i", "CLUB", "-s", SPB),
+    Scenario("failing-register", "registration whose last step fails", ("i", "CLUB", "-s", SPB),
          with_registry_that_cannot_be_saved(newer_version), True),
 )}
 
@@ -204,11 +205,11 @@ def differences(wanted, got):
     return [path for path in sorted(set(wanted) | set(got)) if wanted.get(path) != got.get(path)]
 
 
-def furnished(road, binary, packages):
-    """The tree of the machine on which `road` begins."""
+def furnished(scenario, binary, packages):
+    """The tree of the machine on which `scenario` begins."""
     machine = new_machine(binary, packages)
     try:
-        road.furnish(machine)
+        scenario.furnish(machine)
         return tree_of(machine)
     finally:
         bubblewrap.delete_root(machine.root)
