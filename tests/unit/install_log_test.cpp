@@ -36,6 +36,11 @@ protected:
     std::string index = dir / "ZOR_files";
 };
 
+TEST_F(InstallLogTest, TheSingleUserFlagIsAFileOfTheConfiguration)
+{
+    EXPECT_EQ("/opt/corvan/zor/config/SingleUserMode", singleUserFlagPath("/opt/corvan/zor"));
+}
+
 // Reading.
 
 TEST_F(InstallLogTest, EmptyLinesAndCommentsAreNoFiles)

@@ -25,6 +25,12 @@ private:
 
 using LocationsTest = MachineTest;
 
+TEST(LocationNamesTest, TheRegistryOfAUserIsBelowItsHomeDirectory)
+{
+    EXPECT_EQ("/home/ann/.zor/zor.ini", registryPathBelow("/home/ann"));
+    EXPECT_EQ("/.zor/zor.ini", registryPathBelow("/"));
+}
+
 TEST(LocationNamesTest, TheNamesHaveTheirTexts)
 {
     EXPECT_EQ("zor.ini", ZorIniName);

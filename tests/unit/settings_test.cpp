@@ -97,4 +97,15 @@ TEST(SettingsTest, SingleUserModeAsksForNoFlagByItself)
     EXPECT_FALSE(createSingleUserModeFile);
 }
 
+TEST(SettingsTest, TheLayoutNamesAreCompletedWithTheirDirectories)
+{
+    const SettingsGuard guard;
+
+    completeLayoutNames();
+
+    EXPECT_EQ("bin/trawlcfg", trawlcfgExe);
+    EXPECT_EQ("bin/trawlfs", trawlfsExe);
+    EXPECT_EQ("/home/zorbuild/zor_src_dir/ZOR/zor_pkgs/images/linux-ix86/", spbFileRoot);
+}
+
 } // namespace

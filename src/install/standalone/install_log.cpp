@@ -20,11 +20,6 @@ constexpr const char* SingleUserFlagName = "SingleUserMode";
 constexpr mode_t IndexDirectoryMode = 0755;
 constexpr mode_t IndexFileMode = 0644;
 
-std::string singleUserFlagPath(const std::string& home)
-{
-    return joinPath(joinPath(home, spbCfgDir), SingleUserFlagName);
-}
-
 } // namespace
 
 void readFileIndex(const std::string& path, std::set<std::string>& files)
@@ -91,6 +86,11 @@ void closeTransientIndex()
         return;
     (void)std::fclose(zor_file_handle); // the final index is written from what arrived
     zor_file_handle = nullptr;
+}
+
+std::string singleUserFlagPath(const std::string& home)
+{
+    return joinPath(joinPath(home, spbCfgDir), SingleUserFlagName);
 }
 
 void detectSingleUserMode(const std::string& home)

@@ -34,6 +34,9 @@ void openTransientIndex(FileTransaction& transaction, const std::string& path);
 /// Closes `zor_file_handle`, if it is open, and makes it null.
 void closeTransientIndex();
 
+/// The path of the single-user flag of the installation in `home`.
+[[nodiscard]] std::string singleUserFlagPath(const std::string& home);
+
 /// Turns single-user mode on when the installation in `home` carries the flag.
 void detectSingleUserMode(const std::string& home);
 

@@ -18,6 +18,7 @@ namespace {
 
 constexpr const char* GlobalInstallDir = "/opt/corvan/zor";
 constexpr const char* GlobalRegistryDir = "/etc/zor";
+constexpr const char* LocalRegistryDirName = ".zor";
 
 } // namespace
 
@@ -58,13 +59,18 @@ std::string defaultInstallDir(bool local)
 std::string registryDirectory(bool local)
 {
     const std::string home = local ? homeDirectory() : std::string();
-    return home.empty() ? GlobalRegistryDir : joinPath(home, ".zor");
+    return home.empty() ? GlobalRegistryDir : joinPath(home, LocalRegistryDirName);
 }
 
 std::string registryPath(bool local)
 {
     const std::string directory = registryDirectory(local);
     return directory.empty() ? std::string() : joinPath(directory, ZorIniName);
+}
+
+std::string registryPathBelow(const std::string& home)
+{
+    return joinPath(joinPath(home, LocalRegistryDirName), ZorIniName);
 }
 
 int installedTypeOf(const std::string& targetDir)

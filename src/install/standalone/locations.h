@@ -37,6 +37,9 @@ enum InstalledType : int {
 /// The registry file; empty when its directory is.
 [[nodiscard]] std::string registryPath(bool local);
 
+/// The registry file of the user whose home directory is `home`.
+[[nodiscard]] std::string registryPathBelow(const std::string& home);
+
 /// The install type that the property file of the installation in `targetDir` records: an
 /// InstalledType (0 to 2). A file without the key counts as global.
 [[nodiscard]] int installedTypeOf(const std::string& targetDir);

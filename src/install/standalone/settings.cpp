@@ -41,3 +41,10 @@ void enterSingleUserMode()
     EtcDirMode = 0755;
     applySingleUserMode = true;
 }
+
+void completeLayoutNames()
+{
+    trawlcfgExe = spbBinDir + "/" + trawlcfgExe;
+    trawlfsExe = spbBinDir + "/" + trawlfsExe;
+    spbFileRoot += interp + "/";
+}

@@ -70,5 +70,9 @@ inline const std::string installProps = "zor_install.properties";
 inline const std::string UninstallFileName = "_uninst";
 inline const std::string ZOR_FILE_INDEX = "ZOR_files";
 
+/// Completes the layout names that depend on one another. To be called once, before any of them is
+/// used.
+void completeLayoutNames();
+
 /// The index of installed files while an extraction writes it; null at all other times.
 extern std::FILE* zor_file_handle;

@@ -32,14 +32,6 @@ void letWritesFail()
     }
 }
 
-/// Completes the layout names that depend on one another.
-void completeLayoutNames()
-{
-    trawlcfgExe = spbBinDir + "/" + trawlcfgExe;
-    trawlfsExe = spbBinDir + "/" + trawlfsExe;
-    spbFileRoot += interp + "/";
-}
-
 /// Prints the settings of this run; returns the default destination, one of them.
 std::string printSettings()
 {
