@@ -4,15 +4,11 @@ import json
 import os
 import re
 import subprocess
-import sys
-from pathlib import Path
 
 import pytest
 
-REPOSITORY = Path(__file__).resolve().parents[2]
-sys.path.insert(0, str(REPOSITORY / "tests/support"))
-
-from machine import ROOT, SPB, Machine  # noqa: E402 (needs the path above)
+from harness import REPOSITORY
+from harness.machine import ROOT, SPB, Machine
 
 DOCUMENTS = sorted([*REPOSITORY.glob("*.md"), *REPOSITORY.glob("docs/*.md")])
 IDS = [str(path.relative_to(REPOSITORY)) for path in DOCUMENTS]

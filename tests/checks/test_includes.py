@@ -1,11 +1,12 @@
-"""Includes of the installer run one way: down the rows of docs/architecture.md, never in a circle."""
+"""Includes point down the rows of docs/architecture.md and never form a cycle."""
 
 import re
-from pathlib import Path
 
 import pytest
 
-SOURCES = Path(__file__).resolve().parents[2] / "src/install/standalone"
+from harness import REPOSITORY
+
+SOURCES = REPOSITORY / "src/install/standalone"
 
 # From top to bottom; what one row holds may include its own row and the lower ones.
 ROWS = [

@@ -1,4 +1,4 @@
-#!/usr/bin/python3
+#!/usr/bin/python3 -B
 """Writes the seed corpora of the fuzz targets: make_seeds.py DIR
 
 Each target finds its inputs in a directory of its name below DIR. The archives come from the
@@ -9,11 +9,8 @@ import os
 import struct
 import sys
 
-sys.dont_write_bytecode = True
-sys.path.insert(0, os.path.join(os.path.dirname(os.path.abspath(__file__)), "../support"))
-
-import toolkit  # noqa: E402 (needs the path above)
-from spb import DEFLATED, STORED, Archive, deflate  # noqa: E402
+from harness import toolkit
+from harness.zip_archive import DEFLATED, STORED, Archive, deflate
 
 TEXT = b"One line like the next.\n" * 40
 NOISE = bytes(value * 73 & 0xFF for value in range(1000))

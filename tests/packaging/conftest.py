@@ -4,20 +4,18 @@ The environment variable WZORINST names the binary under test, WZOR_BUILD its bu
 """
 
 import os
-import sys
 from pathlib import Path
 
 import pytest
 
-sys.path.insert(0, os.path.join(os.path.dirname(__file__), "../support"))
-
-from machine import Machine  # noqa: E402 (needs the path above)
+from harness import REPOSITORY
+from harness.machine import Machine
 
 
 @pytest.fixture(scope="session")
 def tree():
     """The source tree."""
-    return Path(__file__).resolve().parents[2]
+    return REPOSITORY
 
 
 @pytest.fixture(scope="session")

@@ -11,10 +11,10 @@ import select
 import subprocess
 
 import pytest
-
-import bubblewrap
-from machine import BINARY, Machine
 from parser_options import parser_options
+
+from harness import bubblewrap
+from harness.machine import BINARY, Machine
 
 DEADLINE = 30  # seconds until a bash that does not answer fails its test
 

@@ -5,7 +5,6 @@ import re
 import subprocess
 
 import pytest
-
 from parser_options import parser_options
 
 

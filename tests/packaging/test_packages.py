@@ -12,7 +12,7 @@ from pathlib import Path
 
 import pytest
 
-import bubblewrap
+from harness import bubblewrap
 
 VERSION = "9.2.30"
 

@@ -5,13 +5,10 @@ The environment variable WZORINST names the binary under test.
 
 import os
 import shlex
-import sys
 
 import pytest
 
-sys.path.insert(0, os.path.join(os.path.dirname(__file__), "../support"))
-
-from machine import Machine  # noqa: E402 (needs the path above)
+from harness.machine import Machine
 
 
 @pytest.fixture(scope="session")

@@ -2,8 +2,8 @@
 
 import pytest
 
-from checks import not_printed, printed, printed_lines, same_text
-from machine import ANN, SPB
+from harness.checks import not_printed, printed, printed_lines, same_text
+from harness.machine import ANN, SPB
 
 USAGE = """\
 Usage: wzorinst i|r|t <exploiterID> [-o <log file>] [-s <spblock_path>] [-d <target_dir>] \

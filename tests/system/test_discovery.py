@@ -2,8 +2,8 @@
 
 import pytest
 
-from checks import not_printed, printed, printed_lines, same_text, same_tree
-from machine import ANN, SPB, STRANGER
+from harness.checks import not_printed, printed, printed_lines, same_text, same_tree
+from harness.machine import ANN, SPB, STRANGER
 
 NOT_REGISTERED = """\
 ZOR not installed for exploiter XYZ, nothing to do

@@ -2,9 +2,9 @@
 
 import pytest
 
-from checks import not_printed, printed_lines, same_lines
-from machine import ANN, SPB
-from toolkit import archive
+from harness.checks import not_printed, printed_lines, same_lines
+from harness.machine import ANN, SPB
+from harness.toolkit import archive
 
 
 def install(machine, *options, **how):

@@ -3,11 +3,11 @@
 import os
 import shutil
 import subprocess
-from pathlib import Path
 
 import pytest
 
-REPOSITORY = Path(__file__).resolve().parents[2]
+from harness import REPOSITORY
+
 BUILD_TOOLKIT = REPOSITORY / "scripts" / "build_toolkit.sh"
 
 

@@ -4,10 +4,10 @@ import random
 
 import pytest
 
-from checks import not_printed, printed_lines, same_text, same_tree
-from machine import ANN, SPB
-from spb import DEFLATED, IMAGE_ROOT, SIZES_FOLLOW_THE_DATA, STORED
-from toolkit import archive
+from harness.checks import not_printed, printed_lines, same_text, same_tree
+from harness.machine import ANN, SPB
+from harness.toolkit import archive
+from harness.zip_archive import DEFLATED, IMAGE_ROOT, SIZES_FOLLOW_THE_DATA, STORED
 
 HOME = "/opt/corvan/zor"
 

@@ -2,11 +2,10 @@
 
 import pytest
 
-import failure_points
-import sweep
-from checks import same_tree
-from machine import SPB
-from scenarios import COMMAND_LOG, HOME, REGISTRY, SCENARIOS, SETTINGS, restore, tree_of
+from harness import failure_points, sweep
+from harness.checks import same_tree
+from harness.machine import SPB
+from harness.scenarios import COMMAND_LOG, HOME, REGISTRY, SCENARIOS, SETTINGS, restore, tree_of
 
 
 @pytest.fixture(scope="module")

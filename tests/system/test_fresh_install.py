@@ -2,9 +2,9 @@
 
 import pytest
 
-from checks import not_printed, printed, printed_lines, same_lines, same_text
-from machine import ANN, ROOT, SPB, STRANGER
-from shared_installation import SHARED_INDEX, SHARED_TRANSCRIPT, SHARED_TREE
+from harness.checks import not_printed, printed, printed_lines, same_lines, same_text
+from harness.machine import ANN, ROOT, SPB, STRANGER
+from harness.shared_installation import SHARED_INDEX, SHARED_TRANSCRIPT, SHARED_TREE
 
 
 def install(machine, *options, **how):

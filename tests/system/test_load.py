@@ -2,9 +2,9 @@
 
 import pytest
 
-import load
-from load import Load
-from machine import SPB
+from harness import load
+from harness.load import Load
+from harness.machine import SPB
 
 # What the installer may hold for one entry, sanitizers included, and for everything else.
 KIB_AN_ENTRY = 1

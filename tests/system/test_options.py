@@ -2,9 +2,9 @@
 
 import pytest
 
-from checks import not_printed, printed, printed_lines, same_lines, same_text, same_tree
-from machine import ANN, SPB
-from shared_installation import SHARED_INDEX, SHARED_TREE
+from harness.checks import not_printed, printed, printed_lines, same_lines, same_text, same_tree
+from harness.machine import ANN, SPB
+from harness.shared_installation import SHARED_INDEX, SHARED_TREE
 
 
 def install(machine, *options, **how):

@@ -8,9 +8,8 @@ from pathlib import Path
 
 import pytest
 
-import spb_tool
+from harness import REPOSITORY, spb_tool
 
-REPOSITORY = Path(__file__).resolve().parents[2]
 PACK_TOOLKIT = REPOSITORY / "scripts" / "pack_toolkit.py"
 ROOT = "/home/zorbuild/zor_src_dir/ZOR/zor_pkgs/images/linux-ix86/"
 

@@ -10,7 +10,7 @@ import os
 
 import pytest
 
-from life import Life
+from harness.life import Life
 
 FIRST = int(os.environ.get("WZOR_FIRST_LIFE", "1"))
 LIVES = int(os.environ.get("WZOR_LIVES", "150"))

@@ -2,9 +2,9 @@
 
 import pytest
 
-from checks import not_printed, printed, printed_lines, same_text, same_tree
-from machine import ANN, SPB
-from rollback import FILE_INDEX, PROPERTIES_DIRECTORY, XSS_FILES, rolled_back
+from harness.checks import not_printed, printed, printed_lines, same_text, same_tree
+from harness.machine import ANN, SPB
+from harness.rollback import FILE_INDEX, PROPERTIES_DIRECTORY, XSS_FILES, rolled_back
 
 HOME = "/opt/corvan/zor"
 CONTROL = HOME + "/bin/trawlcfg"

@@ -2,10 +2,18 @@
 
 import pytest
 
-from checks import not_printed, printed, printed_lines, same_lines, same_text, same_tree
-from machine import ANN, SPB
-from rollback import (COMMON_SETTING, FILE_INDEX, INSTALL_TYPE_FILE, OLDER_BACKUP, REGISTRY_MODE,
-                      SINGLE_USER_FLAG, XSS_FILES, rolled_back)
+from harness.checks import not_printed, printed, printed_lines, same_lines, same_text, same_tree
+from harness.machine import ANN, SPB
+from harness.rollback import (
+    COMMON_SETTING,
+    FILE_INDEX,
+    INSTALL_TYPE_FILE,
+    OLDER_BACKUP,
+    REGISTRY_MODE,
+    SINGLE_USER_FLAG,
+    XSS_FILES,
+    rolled_back,
+)
 
 PREFIX = """\
 SPB file: /media/toolkit.spb

@@ -2,8 +2,8 @@
 
 import pytest
 
-from checks import not_printed, printed_lines, same_lines
-from machine import ANN, SPB
+from harness.checks import not_printed, printed_lines, same_lines
+from harness.machine import ANN, SPB
 
 HOME = "/opt/corvan/zor"
 

@@ -7,9 +7,9 @@ import subprocess
 
 import pytest
 
-import spb_tool
-from machine import SPB, Machine
-from spb import DEFLATED, IMAGE_ROOT, SIZES_FOLLOW_THE_DATA, STORED
+from harness import spb_tool
+from harness.machine import SPB, Machine
+from harness.zip_archive import DEFLATED, IMAGE_ROOT, SIZES_FOLLOW_THE_DATA, STORED
 
 END_SIZE = 22
 

@@ -4,9 +4,9 @@ import subprocess
 
 import pytest
 
-import spb_tool
-from machine import SPB
-from spb import IMAGE_ROOT, STORED, Archive
+from harness import spb_tool
+from harness.machine import SPB
+from harness.zip_archive import IMAGE_ROOT, STORED, Archive
 
 
 @pytest.fixture

@@ -2,13 +2,12 @@
 
 import re
 import subprocess
-from pathlib import Path
 
 import pytest
 
-import spb_tool
+from harness import REPOSITORY, spb_tool
 
-SOURCE = Path(__file__).resolve().parents[2] / "docs" / "man" / "spb.1.scd"
+SOURCE = REPOSITORY / "docs" / "man" / "spb.1.scd"
 
 
 @pytest.fixture(scope="module")

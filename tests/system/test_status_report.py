@@ -2,8 +2,8 @@
 
 import pytest
 
-from checks import printed, printed_lines, same_tree
-from machine import ANN, STRANGER
+from harness.checks import printed, printed_lines, same_tree
+from harness.machine import ANN, STRANGER
 
 COMMON_SETTING = "/etc/kel/corvan/common/cfg/log.properties"
 

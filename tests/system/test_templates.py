@@ -2,8 +2,8 @@
 
 import pytest
 
-from checks import same_text
-from machine import ANN, SPB
+from harness.checks import same_text
+from harness.machine import ANN, SPB
 
 HOME = "/opt/corvan/zor"
 

@@ -2,9 +2,9 @@
 
 import pytest
 
-from checks import same_text
-from machine import ANN, SPB
-from shared_installation import SHARED_TREE
+from harness.checks import same_text
+from harness.machine import ANN, SPB
+from harness.shared_installation import SHARED_TREE
 
 UMASKS = pytest.mark.parametrize("umask", [0o000, 0o022, 0o077, 0o777],
                                  ids=["000", "022", "077", "777"])

@@ -2,8 +2,8 @@
 
 import pytest
 
-from checks import not_printed, printed, printed_lines, same_lines, same_text, same_tree
-from machine import ANN, SPB
+from harness.checks import not_printed, printed, printed_lines, same_lines, same_text, same_tree
+from harness.machine import ANN, SPB
 
 HOME = "/opt/corvan/zor"
 MAIN = HOME + "/config/Zor.properties"

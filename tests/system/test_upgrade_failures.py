@@ -2,11 +2,20 @@
 
 import pytest
 
-from checks import not_printed, printed, printed_lines, same_lines, same_text, same_tree
-from machine import ANN, SPB
-from rollback import (FILE_INDEX, MAIN_PROPERTY_FILE, OBSOLETE_FILE, OLDER_BACKUP,
-                      PROPERTIES_DIRECTORY, REGISTRY_MODE, SCRIPTS_OF_OLD, SINGLE_USER_FLAG,
-                      XSS_FILES, rolled_back)
+from harness.checks import not_printed, printed, printed_lines, same_lines, same_text, same_tree
+from harness.machine import ANN, SPB
+from harness.rollback import (
+    FILE_INDEX,
+    MAIN_PROPERTY_FILE,
+    OBSOLETE_FILE,
+    OLDER_BACKUP,
+    PROPERTIES_DIRECTORY,
+    REGISTRY_MODE,
+    SCRIPTS_OF_OLD,
+    SINGLE_USER_FLAG,
+    XSS_FILES,
+    rolled_back,
+)
 
 HOME = "/opt/corvan/zor"
 MAIN = HOME + "/config/Zor.properties"

@@ -8,8 +8,8 @@ Everything else that an action depends on it reads from the tree as it was befor
 import re
 from dataclasses import dataclass, replace
 
-import toolkit
-from machine import ANN, ROOT, User
+from harness import toolkit
+from harness.machine import ANN, ROOT, User
 
 OWN_VERSION = (9, 2, 30, 0)
 OWN_DATE = "22/12/02"

@@ -16,12 +16,22 @@ import zipfile
 from concurrent.futures import ThreadPoolExecutor
 from dataclasses import replace
 
-import exemptions
-import failure_points
-from machine import SPB
-from scenarios import (COMMON_SETTING, CONTROL, HOME, INDEX, REGISTRY, REPOSITORY, SCENARIOS,
-                       furnished, new_machine, restore, toolkit_packages, tree_of)
-from spb import IMAGE_ROOT
+from harness import REPOSITORY, exemptions, failure_points
+from harness.machine import SPB
+from harness.scenarios import (
+    COMMON_SETTING,
+    CONTROL,
+    HOME,
+    INDEX,
+    REGISTRY,
+    SCENARIOS,
+    furnished,
+    new_machine,
+    restore,
+    toolkit_packages,
+    tree_of,
+)
+from harness.zip_archive import IMAGE_ROOT
 
 PRESETS = ("release", "release-i686")
 

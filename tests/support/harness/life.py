@@ -7,12 +7,22 @@ its seed and its steps; the same seed lives the same life again.
 import random
 import shlex
 
-import rollback
-import toolkit
-from checks import same_lines, same_text
-from life_model import (OWN_VERSION, PACKAGES, UNEDITED, Package, Record, expect_fresh_failure,
-                        expect_index, expect_installation, expect_removal, is_file, places)
-from machine import SPB, Machine
+from harness import rollback
+from harness.checks import same_lines, same_text
+from harness.life_model import (
+    OWN_VERSION,
+    PACKAGES,
+    UNEDITED,
+    Package,
+    Record,
+    expect_fresh_failure,
+    expect_index,
+    expect_installation,
+    expect_removal,
+    is_file,
+    places,
+)
+from harness.machine import SPB, Machine
 
 # Parts of one another, so that the text search of a removal meets its odd cases.
 EXPLOITERS = ("ABC", "XABC", "BC", "Q")

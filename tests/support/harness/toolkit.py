@@ -6,7 +6,7 @@ removal, and fail when the test says so in /var/scanners/fail: lines of a text a
 status; the first text found in the program's path and arguments decides.
 """
 
-from spb import DEFLATED, IMAGE_ROOT, STORED, Archive
+from harness.zip_archive import DEFLATED, IMAGE_ROOT, STORED, Archive
 
 COMMAND_LOG = "/var/scanners/commands"
 LIBRARY_PATH_LOG = "/var/scanners/library_paths"

@@ -10,7 +10,7 @@ import os
 from dataclasses import dataclass
 from typing import Callable
 
-from checks import describe
+from harness.checks import describe
 
 COMMON_SETTING_PLACES = ("/etc/kel", "/etc/kel/corvan", "/etc/kel/corvan/common",
                          "/etc/kel/corvan/common/cfg",

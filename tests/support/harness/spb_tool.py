@@ -5,12 +5,10 @@ import os
 import pty
 import runpy
 import subprocess
-from pathlib import Path
 
-import toolkit
-from spb import DEFLATED, IMAGE_ROOT, STORED, Archive
+from harness import REPOSITORY, toolkit
+from harness.zip_archive import DEFLATED, IMAGE_ROOT, STORED, Archive
 
-REPOSITORY = Path(__file__).resolve().parents[2]
 SCRIPTS = REPOSITORY / "scripts"
 TOOL = str(REPOSITORY / "tools" / "spb")
 

@@ -11,8 +11,7 @@ import stat
 import subprocess
 from dataclasses import dataclass
 
-import bubblewrap
-import toolkit
+from harness import bubblewrap, toolkit
 
 BINARY = "/media/wzorinst"
 SPB = "/media/toolkit.spb"

@@ -11,10 +11,8 @@ import subprocess
 import tempfile
 from dataclasses import dataclass, field
 
-import bubblewrap
-from machine import BINARY, ROOT, SPB, Machine, Node
-
-REPOSITORY = os.path.realpath(os.path.join(os.path.dirname(__file__), "../.."))
+from harness import REPOSITORY, bubblewrap
+from harness.machine import BINARY, ROOT, SPB, Machine, Node
 
 HOME = "/opt/corvan/zor"
 INDEX = HOME + "/ZOR_files"
@@ -63,13 +61,13 @@ class Scenario:
 
 def toolkit_packages():
     """The example toolkit as SPBs: their bytes by the paths that they get on a machine."""
-    scripts = os.path.join(REPOSITORY, "scripts")
+    scripts = REPOSITORY / "scripts"
     with tempfile.TemporaryDirectory(prefix="toolkit-") as directory:
         tree, package = os.path.join(directory, "tree"), os.path.join(directory, "spb")
-        subprocess.run([os.path.join(scripts, "build_toolkit.sh"), tree], check=True)
+        subprocess.run([scripts / "build_toolkit.sh", tree], check=True)
         packages = {}
         for path, options in ((SPB, ()), (STORED_SPB, ("--stored",))):
-            subprocess.run([os.path.join(scripts, "pack_toolkit.py"), tree, "-o", package,
+            subprocess.run([scripts / "pack_toolkit.py", tree, "-o", package,
                             *options], check=True, stdout=subprocess.DEVNULL)
             with open(package, "rb") as file:
                 packages[path] = file.read()

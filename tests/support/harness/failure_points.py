@@ -12,7 +12,7 @@ import re
 import signal
 from dataclasses import dataclass, replace
 
-from scenarios import INDEX, PACKAGES
+from harness.scenarios import INDEX, PACKAGES
 
 TRACE = "/var/strace/trace"
 TIME_LIMIT = 30  # seconds

@@ -9,9 +9,9 @@ import os
 import struct
 from dataclasses import dataclass
 
-import toolkit
-from machine import BINARY, ROOT, SPB
-from spb import DEFLATED, IMAGE_ROOT, STORED, Entry
+from harness import toolkit
+from harness.machine import BINARY, ROOT, SPB
+from harness.zip_archive import DEFLATED, IMAGE_ROOT, STORED, Entry
 
 HOME = "/opt/corvan/zor"
 HUGE_FILE = "bin/huge"

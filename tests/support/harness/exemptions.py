@@ -9,10 +9,24 @@ there all speak for it. What no rule excuses is a violation.
 import os
 import re
 
-from cases import BACKUP, Rule, RuleBook, contents_before, is_below, lines_of
-from scenarios import (COMMON_SETTING, CONTROL, CONTROL_STATE, HOME, INDEX, INSTALL_TYPE,
-                       OBSOLETE_FILES, PACKAGES, PROBE, REGISTRY, SCRIPTS, SETTINGS,
-                       SINGLE_USER_FLAG, TRACE_SETTINGS, differences)
+from harness.cases import BACKUP, Rule, RuleBook, contents_before, is_below, lines_of
+from harness.scenarios import (
+    COMMON_SETTING,
+    CONTROL,
+    CONTROL_STATE,
+    HOME,
+    INDEX,
+    INSTALL_TYPE,
+    OBSOLETE_FILES,
+    PACKAGES,
+    PROBE,
+    REGISTRY,
+    SCRIPTS,
+    SETTINGS,
+    SINGLE_USER_FLAG,
+    TRACE_SETTINGS,
+    differences,
+)
 
 RULES = RuleBook()
 rule = RULES.rule

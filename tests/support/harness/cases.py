@@ -7,7 +7,7 @@ speaks for it.
 
 from dataclasses import dataclass, field
 
-from scenarios import HOME
+from harness.scenarios import HOME
 
 BACKUP = ".bak"
 

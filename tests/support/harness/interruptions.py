@@ -8,9 +8,18 @@ not excused: they must be old contents that the second run did not touch.
 
 from dataclasses import dataclass, field
 
-from cases import BACKUP, RuleBook, contents_before, lines_of
-from scenarios import (COMMON_SETTING, CONTROL, CONTROL_STATE, INDEX, INSTALL_TYPE, REGISTRY,
-                       SETTINGS, TRACE_SETTINGS, differences)
+from harness.cases import BACKUP, RuleBook, contents_before, lines_of
+from harness.scenarios import (
+    COMMON_SETTING,
+    CONTROL,
+    CONTROL_STATE,
+    INDEX,
+    INSTALL_TYPE,
+    REGISTRY,
+    SETTINGS,
+    TRACE_SETTINGS,
+    differences,
+)
 
 
 @dataclass
