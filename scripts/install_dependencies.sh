@@ -20,9 +20,12 @@ packages='
     lib32z1-dev
     libc6-dbg
     libclang-rt-14-dev
+    libcli11-dev
     man-db
     ninja-build
+    nlohmann-json3-dev
     python3
+    python3-jsonschema
     python3-pytest
     rpm
     scdoc

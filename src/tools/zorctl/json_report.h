@@ -1,0 +1,22 @@
+// The JSON that zorctl prints, and the pieces that its subcommands share.
+//
+// Every report is one object whose member "schema" is the number of its format. A member is added
+// without a new number; one that changes its meaning or goes away raises it. The schemas are in the
+// directory "schema".
+#pragma once
+
+#include <nlohmann/json.hpp>
+
+struct Installation;
+
+using Json = nlohmann::ordered_json;
+
+/// The head of the report of the subcommand `command`: schema number, names of the program.
+[[nodiscard]] Json reportHead(const char* command, int schema);
+
+/// `found` as the member of a report. A value that could not be determined is "unknown", one that
+/// does not apply is null.
+[[nodiscard]] Json toJson(const Installation& found);
+
+/// Prints `report` on standard output.
+void printJson(const Json& report);
