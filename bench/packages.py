@@ -9,41 +9,34 @@ the same bytes.
 import itertools
 import os
 import random
-import struct
-import zlib
 from dataclasses import dataclass
 
-SEED = 20221202
-IMAGE_ROOT = "/home/zorbuild/zor_src_dir/ZOR/zor_pkgs/images/linux-ix86/"
+from harness import toolkit
+from harness.zip_archive import DEFLATED, IMAGE_ROOT, MADE_BY_UNIX, STORED, Entry, Writer
 
-STORED, DEFLATED = 0, 8
-DOS_TIME, DOS_DATE = 12 << 11, (2022 - 1980) << 9 | 12 << 5 | 2
-MAX_COUNT, MAX_OFFSET = 0xFFFF, 0xFFFFFFFF
+SEED = 20221202
 
 MB = 1_000_000
 LARGE_FILE = 2_500_000
 
-SCRIPT = b"#!/bin/sh\nexit 0\n"
-PLACEHOLDERS = b"home=$(ZOR_DestinationDir)\nconfig=$(ZOR_ConfigRootDirectory)\n"
+LEVEL = 6  # what zip programs take by default
 
-# The smallest package that installs: six files.
-TOOLKIT = [
-    ("bin/", b""),
-    ("bin/trawlcfg", SCRIPT),
-    ("bin/trawlfs", SCRIPT),
-    ("properties/", b""),
-    ("config/", b""),
-    ("config/Zor.properties", b"version=9.2.30.0000\nmode=$(fscanner_mode)\n" + PLACEHOLDERS),
-    ("config/ZorTrace.properties", b"handlers.traceFile.fileName=trace.log\n" + PLACEHOLDERS),
-    ("install/", b""),
-    ("install/trawlcfg.sh", b"#!/bin/sh\n" + PLACEHOLDERS),
-    ("install/rmdirs.sh", b"#!/bin/sh\n" + PLACEHOLDERS),
-]
+# The smallest package that installs: six files, and scanner programs that do nothing.
+SMALLEST = ("bin/", "bin/trawlcfg", "bin/trawlfs", "properties/", "config/",
+            "config/Zor.properties", "config/ZorTrace.properties", "install/",
+            "install/trawlcfg.sh", "install/rmdirs.sh")
+NO_SCANNER = b"#!/bin/sh\nexit 0\n"
+
+
+def smallest_toolkit():
+    for name in SMALLEST:
+        content = toolkit.FILES[name]
+        yield name, NO_SCANNER if content == toolkit.SCANNER_PROGRAM else content
 
 
 @dataclass(frozen=True)
 class Package:
-    """`entries` makes the (name, content) pairs beside those of TOOLKIT."""
+    """`entries` makes the (name, content) pairs beside those of SMALLEST."""
 
     name: str
     entries: object
@@ -146,62 +139,23 @@ def machine_files(rng, wanted, smallest, largest):
                 yield file.read()
 
 
-class Archive:
-    """A zip archive that is being written; `prefix` stands before every name."""
-
-    def __init__(self, path, prefix, commented):
-        self.file = open(path, "wb")
-        self.prefix = prefix
-        self.comment = b"first" if commented else b""
-        self.central = bytearray()
-        self.count = 0
-
-    def add(self, name, method, crc, size, packed):
-        name = (self.prefix + name).encode()
-        common = struct.pack("<HHHHHIIIHH", 20, 0, method, DOS_TIME, DOS_DATE, crc, len(packed),
-                             size, len(name), 0)
-        mode = 0o40755 if name.endswith(b"/") else 0o100755
-        self.central += struct.pack("<4sH", b"PK\1\2", 3 << 8 | 20) + common
-        self.central += struct.pack("<HHHII", len(self.comment), 0, 0, mode << 16,
-                                    self.file.tell()) + name + self.comment
-        self.comment = b""
-        self.file.write(b"PK\3\4" + common + name + packed)
-        self.count += 1
-
-    def close(self, countable):
-        """Writes the central directory; `countable` adds a Zip64 record when it is needed."""
-        start = self.file.tell()
-        self.file.write(self.central)
-        if countable and self.count > MAX_COUNT:
-            end = self.file.tell()
-            self.file.write(struct.pack("<4sQHHIIQQQQ", b"PK\6\6", 44, 45, 45, 0, 0, self.count,
-                                        self.count, len(self.central), start))
-            self.file.write(struct.pack("<4sIQI", b"PK\6\7", 0, end, 1))
-            count = MAX_COUNT
-        else:
-            count = self.count & MAX_COUNT
-        self.file.write(struct.pack("<4sHHHHIIH", b"PK\5\6", 0, 0, count, count,
-                                    len(self.central), start, 0))
-        self.file.close()
-
-
 def build(package, directory):
     """Writes NAME.spb and NAME.zip into `directory`; returns the number of files and of bytes."""
-    spb = Archive(os.path.join(directory, package.name + ".spb"), IMAGE_ROOT, package.commented)
-    twin = Archive(os.path.join(directory, package.name + ".zip"), "", False)
     files = size = 0
-    for name, content in itertools.chain(TOOLKIT, package.entries()):
-        method = package.method if content else STORED
-        packed = deflate(content) if method == DEFLATED else content
-        for archive in (spb, twin):
-            archive.add(name, method, zlib.crc32(content), len(content), packed)
-        files += not name.endswith("/")
-        size += len(content)
-    spb.close(countable=False)
-    twin.close(countable=True)
+    with (open(os.path.join(directory, package.name + ".spb"), "wb") as spb_file,
+          open(os.path.join(directory, package.name + ".zip"), "wb") as twin_file):
+        spb, twin = Writer(spb_file), Writer(twin_file)
+        for name, content in itertools.chain(smallest_toolkit(), package.entries()):
+            entry = Entry(name.encode(), content, package.method if content else STORED, LEVEL)
+            entry.made_by = MADE_BY_UNIX
+            entry.attributes = (0o40755 if name.endswith("/") else 0o100755) << 16
+            twin.add(entry)
+            entry.name = IMAGE_ROOT.encode() + entry.name
+            if package.commented and spb.count == 0:
+                entry.comment = b"first"
+            spb.add(entry)
+            files += not name.endswith("/")
+            size += len(content)
+        spb.finish()
+        twin.finish(zip64=True)
     return files, size
-
-
-def deflate(content):
-    packer = zlib.compressobj(level=6, wbits=-15)
-    return packer.compress(content) + packer.flush()

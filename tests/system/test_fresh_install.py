@@ -4,7 +4,7 @@ import pytest
 
 from harness.checks import not_printed, printed, printed_lines, same_lines, same_text
 from harness.machine import ANN, ROOT, SPB, STRANGER
-from harness.shared_installation import SHARED_INDEX, SHARED_TRANSCRIPT, SHARED_TREE
+from harness.installations import ANNS_TREE, SHARED_INDEX, SHARED_TRANSCRIPT, SHARED_TREE
 
 
 def install(machine, *options, **how):
@@ -177,34 +177,7 @@ Done.
 def test_a_per_user_installation_makes_its_tree(machine):
     install(machine, user=ANN)
 
-    same_text(machine.listing("/home"), """\
-d 0755 /home
-d 0755 /home/ann
-d 0755 /home/ann/.zor
-f 0644 /home/ann/.zor/zor.ini
-d 0755 /home/ann/corvan
-d 0755 /home/ann/corvan/zor
-f 0644 /home/ann/corvan/zor/ZOR_files
-d 0755 /home/ann/corvan/zor/bin
-d 0777 /home/ann/corvan/zor/bin/etc
-f 0755 /home/ann/corvan/zor/bin/libzorcore.so
-f 0755 /home/ann/corvan/zor/bin/trawlcfg
-f 0755 /home/ann/corvan/zor/bin/trawlfs
-f 0755 /home/ann/corvan/zor/bin/trawlhw
-d 0770 /home/ann/corvan/zor/cache_data
-d 0755 /home/ann/corvan/zor/config
-f 0644 /home/ann/corvan/zor/config/Zor.properties
-f 0644 /home/ann/corvan/zor/config/ZorHWConfig.xml
-f 0644 /home/ann/corvan/zor/config/ZorTrace.properties
-d 0755 /home/ann/corvan/zor/config/xss
-f 0755 /home/ann/corvan/zor/config/xss/schema.xss
-d 0750 /home/ann/corvan/zor/install
-f 0750 /home/ann/corvan/zor/install/rmdirs.sh
-f 0750 /home/ann/corvan/zor/install/trawlcfg.sh
-f 0640 /home/ann/corvan/zor/install/zor_install.properties
-d 0755 /home/ann/corvan/zor/properties
-f 0755 /home/ann/corvan/zor/properties/scan.properties
-""")
+    same_text(machine.listing("/home"), "d 0755 /home\n" + ANNS_TREE)
 
 
 def test_a_per_user_installation_is_registered_in_the_home_directory(machine):

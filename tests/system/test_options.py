@@ -4,7 +4,7 @@ import pytest
 
 from harness.checks import not_printed, printed, printed_lines, same_lines, same_text, same_tree
 from harness.machine import ANN, SPB
-from harness.shared_installation import SHARED_INDEX, SHARED_TREE
+from harness.installations import SHARED_INDEX, SHARED_TREE, tree_with
 
 
 def install(machine, *options, **how):
@@ -137,45 +137,20 @@ ZOR_ConfigRootDirectory = /opt/corvan/zor
 """)
 
 
-SINGLE_USER_TREE = """\
-d 0755 /etc
-d 0755 /etc/kel
-d 0755 /etc/kel/corvan
-d 0755 /etc/kel/corvan/common
-d 0755 /etc/kel/corvan/common/cfg
-f 0664 /etc/kel/corvan/common/cfg/log.properties
-d 0755 /etc/zor
-f 0644 /etc/zor/zor.ini
-d 0755 /opt
-d 0755 /opt/corvan
-d 0755 /opt/corvan/zor
-f 0644 /opt/corvan/zor/ZOR_files
-d 0755 /opt/corvan/zor/bin
-d 0755 /opt/corvan/zor/bin/etc
-f 0755 /opt/corvan/zor/bin/libzorcore.so
-f 0755 /opt/corvan/zor/bin/trawlcfg
-f 0755 /opt/corvan/zor/bin/trawlfs
-f 0755 /opt/corvan/zor/bin/trawlhw
-d 0755 /opt/corvan/zor/cache_data
-d 0755 /opt/corvan/zor/config
-f 0644 /opt/corvan/zor/config/SingleUserMode
-f 0644 /opt/corvan/zor/config/Zor.properties
-f 0644 /opt/corvan/zor/config/ZorHWConfig.xml
-f 0644 /opt/corvan/zor/config/ZorTrace.properties
-d 0755 /opt/corvan/zor/config/xss
-f 0755 /opt/corvan/zor/config/xss/schema.xss
-d 0750 /opt/corvan/zor/install
-f 0750 /opt/corvan/zor/install/rmdirs.sh
-f 0750 /opt/corvan/zor/install/trawlcfg.sh
-f 0640 /opt/corvan/zor/install/zor_install.properties
-d 0755 /opt/corvan/zor/properties
-f 0755 /opt/corvan/zor/properties/scan.properties
-d 0755 /usr/kel
-d 0755 /usr/kel/corvan
-d 0755 /usr/kel/corvan/common
-d 0755 /usr/kel/corvan/common/ZOR
-d 0755 /usr/kel/corvan/common/ZOR/logs
-"""
+SINGLE_USER_TREE = tree_with(SHARED_TREE, {
+    "/etc/kel": "d 0755",
+    "/etc/kel/corvan": "d 0755",
+    "/etc/kel/corvan/common": "d 0755",
+    "/etc/kel/corvan/common/cfg": "d 0755",
+    "/opt/corvan/zor/bin/etc": "d 0755",
+    "/opt/corvan/zor/cache_data": "d 0755",
+    "/opt/corvan/zor/config/SingleUserMode": "f 0644",
+    "/usr/kel": "d 0755",
+    "/usr/kel/corvan": "d 0755",
+    "/usr/kel/corvan/common": "d 0755",
+    "/usr/kel/corvan/common/ZOR": "d 0755",
+    "/usr/kel/corvan/common/ZOR/logs": "d 0755",
+})
 
 
 @pytest.mark.parametrize("umask", [0o000, 0o022, 0o077])

@@ -3,6 +3,7 @@
 import pytest
 
 from harness.checks import not_printed, printed, printed_lines, same_lines, same_text, same_tree
+from harness.installations import SHARED_TREE, tree_with
 from harness.machine import ANN, SPB
 from harness.rollback import (
     COMMON_SETTING,
@@ -585,51 +586,22 @@ def test_without_rollback_everything_stays(machine):
                   "Installation failed",
                   "Done.")
     not_printed(outcome, "rolling back")
-    same_text(machine.listing("/etc", "/opt", "/usr/kel"), """\
-d 0755 /etc
-d 0775 /etc/kel
-d 0775 /etc/kel/corvan
-d 0775 /etc/kel/corvan/common
-d 0775 /etc/kel/corvan/common/cfg
-f 0664 /etc/kel/corvan/common/cfg/log.properties
-d 0755 /etc/zor
-f 0644 /etc/zor/zor.ini
-d 0755 /opt
-d 0755 /opt/corvan
-d 0711 /opt/corvan/zor
-f 0644 /opt/corvan/zor/ZOR_files
-d 0755 /opt/corvan/zor/bin
-d 0777 /opt/corvan/zor/bin/etc
-f 0755 /opt/corvan/zor/bin/libzorcore.so
-f 0600 /opt/corvan/zor/bin/mine
-f 0755 /opt/corvan/zor/bin/trawlcfg
-f 0700 /opt/corvan/zor/bin/trawlcfg.bak
-f 0755 /opt/corvan/zor/bin/trawlfs
-f 0755 /opt/corvan/zor/bin/trawlhw
-d 0711 /opt/corvan/zor/cache_data
-d 0755 /opt/corvan/zor/config
-f 0755 /opt/corvan/zor/config/Zor.properties
-f 0640 /opt/corvan/zor/config/Zor.properties.bak
-f 0755 /opt/corvan/zor/config/ZorHWConfig.xml
-f 0755 /opt/corvan/zor/config/ZorTrace.properties
-f 0640 /opt/corvan/zor/config/ZorTrace.properties.bak
-d 0755 /opt/corvan/zor/config/xss
-f 0755 /opt/corvan/zor/config/xss/schema.xss
-f 0755 /opt/corvan/zor/config/xss/schema.xss.bak
-d 0755 /opt/corvan/zor/install
-f 0750 /opt/corvan/zor/install/rmdirs.sh
-f 0750 /opt/corvan/zor/install/trawlcfg.sh
-f 0700 /opt/corvan/zor/install/trawlcfg.sh.bak
-f 0666 /opt/corvan/zor/install/zor_install.properties
-d 0755 /opt/corvan/zor/properties
-f 0755 /opt/corvan/zor/properties/scan.properties
-f 0604 /opt/corvan/zor/properties/scan.properties.bak
-d 0777 /usr/kel
-d 0777 /usr/kel/corvan
-d 0777 /usr/kel/corvan/common
-d 0777 /usr/kel/corvan/common/ZOR
-d 0777 /usr/kel/corvan/common/ZOR/logs
-""")
+    same_text(machine.listing("/etc", "/opt", "/usr/kel"), tree_with(SHARED_TREE, {
+        "/opt/corvan/zor": "d 0711",
+        "/opt/corvan/zor/bin/mine": "f 0600",
+        "/opt/corvan/zor/bin/trawlcfg.bak": "f 0700",
+        "/opt/corvan/zor/cache_data": "d 0711",
+        "/opt/corvan/zor/config/Zor.properties": "f 0755",
+        "/opt/corvan/zor/config/Zor.properties.bak": "f 0640",
+        "/opt/corvan/zor/config/ZorHWConfig.xml": "f 0755",
+        "/opt/corvan/zor/config/ZorTrace.properties": "f 0755",
+        "/opt/corvan/zor/config/ZorTrace.properties.bak": "f 0640",
+        "/opt/corvan/zor/config/xss/schema.xss.bak": "f 0755",
+        "/opt/corvan/zor/install": "d 0755",
+        "/opt/corvan/zor/install/trawlcfg.sh.bak": "f 0700",
+        "/opt/corvan/zor/install/zor_install.properties": "f 0666",
+        "/opt/corvan/zor/properties/scan.properties.bak": "f 0604",
+    }))
     assert machine.read("/opt/corvan/zor/bin/trawlcfg.bak") == "older control"
 
 

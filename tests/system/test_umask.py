@@ -4,7 +4,7 @@ import pytest
 
 from harness.checks import same_text
 from harness.machine import ANN, SPB
-from harness.shared_installation import SHARED_TREE
+from harness.installations import ANNS_TREE, SHARED_TREE
 
 UMASKS = pytest.mark.parametrize("umask", [0o000, 0o022, 0o077, 0o777],
                                  ids=["000", "022", "077", "777"])
@@ -23,33 +23,7 @@ def test_a_shared_installation_has_the_same_modes(machine, umask):
 def test_a_per_user_installation_has_the_same_modes(machine, umask):
     assert machine.run("i", "ABC", "-s", SPB, user=ANN, umask=umask).status == 0
 
-    same_text(machine.listing("/home/ann"), """\
-d 0755 /home/ann
-d 0755 /home/ann/.zor
-f 0644 /home/ann/.zor/zor.ini
-d 0755 /home/ann/corvan
-d 0755 /home/ann/corvan/zor
-f 0644 /home/ann/corvan/zor/ZOR_files
-d 0755 /home/ann/corvan/zor/bin
-d 0777 /home/ann/corvan/zor/bin/etc
-f 0755 /home/ann/corvan/zor/bin/libzorcore.so
-f 0755 /home/ann/corvan/zor/bin/trawlcfg
-f 0755 /home/ann/corvan/zor/bin/trawlfs
-f 0755 /home/ann/corvan/zor/bin/trawlhw
-d 0770 /home/ann/corvan/zor/cache_data
-d 0755 /home/ann/corvan/zor/config
-f 0644 /home/ann/corvan/zor/config/Zor.properties
-f 0644 /home/ann/corvan/zor/config/ZorHWConfig.xml
-f 0644 /home/ann/corvan/zor/config/ZorTrace.properties
-d 0755 /home/ann/corvan/zor/config/xss
-f 0755 /home/ann/corvan/zor/config/xss/schema.xss
-d 0750 /home/ann/corvan/zor/install
-f 0750 /home/ann/corvan/zor/install/rmdirs.sh
-f 0750 /home/ann/corvan/zor/install/trawlcfg.sh
-f 0640 /home/ann/corvan/zor/install/zor_install.properties
-d 0755 /home/ann/corvan/zor/properties
-f 0755 /home/ann/corvan/zor/properties/scan.properties
-""")
+    same_text(machine.listing("/home/ann"), ANNS_TREE)
 
 
 @UMASKS

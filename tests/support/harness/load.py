@@ -6,12 +6,11 @@ neither the package nor this program ever holds the bytes.
 """
 
 import os
-import struct
 from dataclasses import dataclass
 
 from harness import toolkit
 from harness.machine import BINARY, ROOT, SPB
-from harness.zip_archive import DEFLATED, IMAGE_ROOT, STORED, Entry
+from harness.zip_archive import DEFLATED, IMAGE_ROOT, STORED, Entry, Writer
 
 HOME = "/opt/corvan/zor"
 HUGE_FILE = "bin/huge"
@@ -80,19 +79,14 @@ def entry(name, data, method):
 
 def write_package(path, load):
     """Writes the package; a huge file's bytes are a hole in it. Returns the number of entries."""
-    central = []
     with open(path, "wb") as file:
+        writer = Writer(file)
         for each in entries_of(load):
-            if load.commented and not central:
+            if load.commented and writer.count == 0:
                 each.comment = b"hides the directory"
-            central.append(each.central_header(file.tell()))
-            file.write(each.local_header() + each.packed)
-            file.seek(each.packed_size - len(each.packed), os.SEEK_CUR)
-        offset, count = file.tell(), len(central) & 0xFFFF
-        file.writelines(central)
-        size = file.tell() - offset
-        file.write(struct.pack("<4sHHHHIIH", b"PK\5\6", 0, 0, count, count, size, offset, 0))
-    return len(central)
+            writer.add(each, hole=each.packed_size - len(each.packed))
+        writer.finish()
+    return writer.count
 
 
 def run(machine, *arguments):

@@ -1,4 +1,4 @@
-"""Runs the tool `spb`, and builds packages in which it finds nothing to tell."""
+"""Runs the tool `spb`, and builds packages in which it finds nothing."""
 
 import json
 import os
@@ -7,13 +7,12 @@ import runpy
 import subprocess
 
 from harness import REPOSITORY, toolkit
-from harness.zip_archive import DEFLATED, IMAGE_ROOT, STORED, Archive
 
 SCRIPTS = REPOSITORY / "scripts"
 TOOL = str(REPOSITORY / "tools" / "spb")
 
-FILES = {
-    **toolkit.FILES,
+# What `spb check` reports about the toolkit is gone with these.
+WITHOUT_FINDINGS = {
     "config/ZorTrace.properties": b"handlers.traceFile.fileName=$(ZOR_DestinationDir)/logs/t.log\n"
                                   b"config.root=$(ZOR_ConfigRootDirectory)\n",
     "install/trawlcfg.sh": b"#!/bin/sh\nexec '$(ZOR_DestinationDir)/bin/trawlcfg' \"$@\"\n"
@@ -25,12 +24,7 @@ FILES = {
 
 def archive(changes=None, without=()):
     """A package without findings, still open to changes; the arguments are as in `toolkit`."""
-    files = {**FILES, **(changes or {})}
-    result = Archive()
-    for number, (name, data) in enumerate(files.items()):
-        if name not in without:
-            result.add(IMAGE_ROOT + name, data, STORED if number % 2 else DEFLATED)
-    return result
+    return toolkit.archive({**WITHOUT_FINDINGS, **(changes or {})}, without)
 
 
 def run(*arguments, **options):
@@ -63,5 +57,5 @@ def shown_on_a_terminal(*arguments):
 
 
 def codes():
-    """Every code that `spb check` can tell, and its kind."""
+    """Every code that `spb check` can report, with its kind."""
     return runpy.run_path(TOOL)["CODES"]

@@ -1,4 +1,7 @@
-"""What `wzorinst i ABC -s /media/toolkit.spb` prints and leaves on an empty machine."""
+"""What `wzorinst i ABC -s /media/toolkit.spb` prints and leaves on an empty machine.
+
+The names with SHARED are for root's installation, those with ANNS for the one of the user ann.
+"""
 
 SHARED_TRANSCRIPT = """\
 SPB file: /media/toolkit.spb
@@ -73,6 +76,34 @@ d 0777 /usr/kel/corvan/common/ZOR
 d 0777 /usr/kel/corvan/common/ZOR/logs
 """
 
+ANNS_TREE = """\
+d 0755 /home/ann
+d 0755 /home/ann/.zor
+f 0644 /home/ann/.zor/zor.ini
+d 0755 /home/ann/corvan
+d 0755 /home/ann/corvan/zor
+f 0644 /home/ann/corvan/zor/ZOR_files
+d 0755 /home/ann/corvan/zor/bin
+d 0777 /home/ann/corvan/zor/bin/etc
+f 0755 /home/ann/corvan/zor/bin/libzorcore.so
+f 0755 /home/ann/corvan/zor/bin/trawlcfg
+f 0755 /home/ann/corvan/zor/bin/trawlfs
+f 0755 /home/ann/corvan/zor/bin/trawlhw
+d 0770 /home/ann/corvan/zor/cache_data
+d 0755 /home/ann/corvan/zor/config
+f 0644 /home/ann/corvan/zor/config/Zor.properties
+f 0644 /home/ann/corvan/zor/config/ZorHWConfig.xml
+f 0644 /home/ann/corvan/zor/config/ZorTrace.properties
+d 0755 /home/ann/corvan/zor/config/xss
+f 0755 /home/ann/corvan/zor/config/xss/schema.xss
+d 0750 /home/ann/corvan/zor/install
+f 0750 /home/ann/corvan/zor/install/rmdirs.sh
+f 0750 /home/ann/corvan/zor/install/trawlcfg.sh
+f 0640 /home/ann/corvan/zor/install/zor_install.properties
+d 0755 /home/ann/corvan/zor/properties
+f 0755 /home/ann/corvan/zor/properties/scan.properties
+"""
+
 SHARED_INDEX = """\
 # File created by ZOR: 22/12/02zor_9.2.30.0000 installed on TIME
 /opt/corvan/zor/bin/libzor.so
@@ -93,3 +124,11 @@ SHARED_INDEX = """\
 /opt/corvan/zor/zor.log.bak
 /opt/corvan/zor/install/zor_install.properties
 """
+
+
+def tree_with(listing, changes):
+    """`listing` with changed, added or (None) missing paths: {"/etc": "d 0755"}."""
+    nodes = {line[7:]: line[:6] for line in listing.splitlines()}
+    nodes.update(changes)
+    return "".join(f"{nodes[path]} {path}\n" for path in sorted(nodes, key=lambda p: p.split("/"))
+                   if nodes[path])
