@@ -5,9 +5,9 @@ import os
 
 import pytest
 
-from checks import printed
-from machine import ANN, SPB
-from zorctl import report, zorctl
+from harness.checks import printed
+from harness.machine import ANN, SPB
+from harness.zorctl import report, zorctl
 
 HEAD = """\
 ZOR installer version: 22/12/02zor_9.2.30.0000

@@ -9,7 +9,7 @@ import os
 
 import jsonschema
 
-from machine import ROOT
+from harness.machine import ROOT
 
 BINARY = "/media/zorctl"
 SCHEMAS = os.path.join(os.path.dirname(__file__), "../../../src/tools/zorctl/schema")
