@@ -24,7 +24,7 @@ def fail(bench, kind, path, error):
     """Runs the scenario of `bench` with this call failing; returns the outcome and the tree."""
     restore(bench.spare, bench.before)
     point = point_on(bench, kind, path)
-    outcome = failure_points.run_failing(bench.scenario, bench.spare, point, error)
+    outcome, _ = failure_points.run_failing(bench.scenario, bench.spare, point, error)
     return outcome, tree_of(bench.spare)
 
 

@@ -4,7 +4,8 @@ The root directory lies on the host, so that whatever a test plants or inspects 
 bytes and modes. Only programs and libraries are borrowed from the real machine, read-only; its
 /etc, /opt, /usr/kel and homes are never seen. A user namespace with a single mapping makes the
 answers the same whether the suite is run by root or by an ordinary user: user 0 of the sandbox
-has all capabilities over it, every other user has none.
+has all capabilities over it, every other user has none. Tests of owners, which only root can run,
+do without the mapping.
 """
 
 import os
@@ -126,15 +127,17 @@ def environment_of(home, changes=None):
 
 
 def command_line(root, command, *, uid, environment, directory="/tmp", read_only=None,
-                 writable=None, options=()):
+                 writable=None, options=(), maps_users=True):
     """The bwrap command line that runs `command` as `uid` on the machine in `root`.
 
     `read_only` maps paths of the sandbox to host paths bound there read-only; `writable` names
     the only places of the machine that can be written (None: all of it). `options` are further
-    bwrap options, applied last.
+    bwrap options, applied last. Without `maps_users`, users are those of the host: then `uid` is 0.
     """
-    line = ["bwrap", "--die-with-parent", "--unshare-user", "--unshare-pid", "--unshare-ipc",
-            "--uid", str(uid), "--gid", str(uid)]
+    line = ["bwrap", "--die-with-parent", "--unshare-pid", "--unshare-ipc"]
+    if maps_users:
+        line += ["--unshare-user", "--uid", str(uid), "--gid", str(uid)]
+    assert maps_users or uid == 0
     if uid == 0:
         line += ["--cap-add", "ALL"]
     line += ["--bind", root, "/"]

@@ -52,6 +52,7 @@ class Case:
     normal: dict  # what the undisturbed run leaves
     package: dict  # each SPB's bytes and, by the path that it gets, each file's
     reference: object  # gives the tree of a run on a machine that differs in a named way
+    name_changes: list  # the renamings and deletions that the run tried
     excused: dict = field(default_factory=dict)  # path to the rule's name
     violations: list = field(default_factory=list)
 
@@ -86,19 +87,33 @@ class Case:
         return path not in self.wanted and path in self.after
 
     def unchanged(self, path):
-        """True when what the run found at `path` still is there, whatever its mode."""
+        """True when what the run found at `path` is still there, whatever its mode."""
         found, got = self.before.get(path), self.after.get(path)
-        return (found is not None and got is not None and found.kind == got.kind
-                and found.content == got.content)
+        return is_same_but_for_the_mode(found, got)
 
     def says(self, text):
         """True when the run printed `text`, or could not print."""
         return text in self.output or self.hit == "standard output"
 
+    def began_second_backup(self, path):
+        """True when the run gave up its backup of `path` to make another one."""
+        backup = path + BACKUP
+        made = given_up = False
+        for change in self.name_changes:
+            if change.target == backup and (given_up or made and change.done):
+                return True
+            made = made or change.target == backup and change.done
+            given_up = made and (given_up or change.kind == "unlink" and change.path == backup
+                                 and change.done)
+        return False
+
     def only_mode_differs(self, path):
-        wanted, got = self.wanted.get(path), self.after.get(path)
-        return (wanted is not None and got is not None and wanted.kind == got.kind
-                and wanted.content == got.content)
+        return is_same_but_for_the_mode(self.wanted.get(path), self.after.get(path))
+
+
+def is_same_but_for_the_mode(wanted, got):
+    return (wanted is not None and got is not None and wanted.kind == got.kind
+            and wanted.content == got.content and wanted.owner == got.owner)
 
 
 def is_below(path, directory):

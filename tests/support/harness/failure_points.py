@@ -8,6 +8,7 @@ strace was chosen over a preloaded library by measurement: it adds some 15 ms to
 fails the calls that the C library makes on its own account as well, in 64-bit and in 32-bit.
 """
 
+import os
 import re
 import signal
 from dataclasses import dataclass, replace
@@ -22,9 +23,17 @@ TIME_LIMIT = 30  # seconds
 ERRORS = {
     "access": ("EIO", "EACCES"),
     "chmod": ("EIO", "EACCES"),
+    "chown": ("EIO", "EPERM"),
     "close": ("EIO", "ENOSPC"),
+    "fallocate": ("EIO", "ENOSPC", "EOPNOTSUPP"),
     "fchmod": ("EIO",),
+    "fchown": ("EIO", "EPERM"),
+    "fgetxattr": ("EIO",),
+    "flistxattr": ("EIO",),
+    "fsetxattr": ("EIO", "ENOSPC", "EPERM"),
     "fstat": ("EIO",),
+    "fstatfs": ("EIO",),
+    "fsync": ("EIO", "ENOSPC", "EDQUOT"),
     "ftruncate": ("EIO",),
     "getdents64": ("EIO",),
     "lseek": ("EIO",),
@@ -32,26 +41,39 @@ ERRORS = {
     "open": ("EIO", "EACCES", "EMFILE"),
     "open to create": ("EIO", "ENOSPC", "EACCES", "EMFILE"),
     "read": ("EIO",),
+    "readlink": ("EIO", "EACCES"),
     "rename": ("EIO", "ENOSPC", "EACCES"),
     "rmdir": ("EIO", "EACCES"),
     "sendfile": ("EIO", "ENOSPC", "EACCES"),
     "stat": ("EIO", "EACCES"),
+    "statfs": ("EIO", "EACCES"),
+    "sync_file_range": ("EIO", "ENOSPC"),
+    "syncfs": ("EIO", "ENOSPC", "EDQUOT"),
     "unlink": ("EIO", "EACCES"),
     "write": ("EIO", "ENOSPC", "EACCES"),
 }
 
 # The kernel's names, of both builds, that go by another name above.
-KINDS = {"_llseek": "lseek", "ftruncate64": "ftruncate", "openat": "open", "pread64": "read",
-         "renameat2": "rename", "sendfile64": "sendfile"}
+KINDS = {"_llseek": "lseek", "faccessat": "access", "faccessat2": "access", "fchmodat": "chmod",
+         "fchmodat2": "chmod", "fchown32": "fchown", "fchownat": "chown", "fdatasync": "fsync",
+         "fstatfs64": "fstatfs", "ftruncate64": "ftruncate", "lchown": "chown", "lchown32": "chown",
+         "mkdirat": "mkdir", "openat": "open", "openat2": "open", "pread64": "read",
+         "readlinkat": "readlink", "renameat": "rename", "renameat2": "rename",
+         "sendfile64": "sendfile", "statfs64": "statfs", "sync_file_range2": "sync_file_range"}
+
+# What makes earlier changes durable.
+SYNCS = ("fsync", "sync_file_range", "syncfs")
 
 # Calls that a trace of files and descriptors shows as well, but that touch no file system.
-NOT_OF_FILES = {"execve", "fcntl", "fcntl64", "mmap", "mmap2"}
+NOT_OF_FILES = {"close_range", "dup", "dup2", "dup3", "execve", "fcntl", "fcntl64", "mmap",
+                "mmap2", "pipe", "pipe2", "poll", "ppoll"}
 
 # The first thing that the installer does itself is to ask who runs it.
 FIRST_CALL = re.compile(r"getuid(32)?\(")
 
 CALL = re.compile(r"(\w+)\((.*)\) += +(.*)$")
-PATH = re.compile(r'"((?:[^"\\]|\\.)*)"')
+# A path, with the directory that it starts from, and a descriptor with what is open behind it.
+PATH = re.compile(r'(?:(?:AT_FDCWD|\d+)<([^>]*)>(?:\(deleted\))?, )?"((?:[^"\\]|\\.)*)"')
 DESCRIPTOR = re.compile(r"^\d+<(.*?)>(?:\(deleted\))?(?:, |$)")
 
 
@@ -61,7 +83,7 @@ class Point:
 
     `late` tells that the procedure of an installation is over: its commit or rollback and the modes
     of the tree follow. `result` is what the call gave in the traced run, `entry` the file that was
-    being extracted meanwhile, if one was.
+    being extracted meanwhile, if one was. `target` is the new name that a renaming gives.
     """
 
     name: str
@@ -72,6 +94,7 @@ class Point:
     late: bool
     result: str
     entry: str = ""
+    target: str = ""
 
     @property
     def label(self):
@@ -84,22 +107,30 @@ class Point:
 
 def kind_of(name, arguments):
     kind = KINDS.get(name, name)
-    if kind in ("newfstatat", "statx"):
+    if kind in ("newfstatat", "fstatat64", "lstat", "lstat64", "stat64", "statx"):
         return "fstat" if "AT_EMPTY_PATH" in arguments else "stat"
+    if kind == "unlinkat":
+        return "rmdir" if "AT_REMOVEDIR" in arguments else "unlink"
     if kind == "open" and "O_CREAT" in arguments:
         return "open to create"
     return kind
 
 
-def path_of(arguments):
-    """The path that a call's arguments name, or that of its descriptor."""
-    descriptor = DESCRIPTOR.match(arguments)
-    if descriptor:
-        path = descriptor.group(1)
-        return path if path.startswith("/") else "standard output"
-    named = PATH.search(arguments)
-    assert named, arguments
-    return named.group(1)
+# Calls whose first argument is a descriptor and whose strings are no paths.
+OF_DESCRIPTORS = {"read", "write", "fgetxattr", "fsetxattr", "flistxattr", "fstatfs"}
+
+
+def paths_of(kind, arguments):
+    """The paths that a call's arguments name, or that of its descriptor."""
+    named = [] if kind in OF_DESCRIPTORS else [
+        os.path.join(directory, name) for directory, name in PATH.findall(arguments)
+        if name or not directory]
+    if named:
+        return tuple(named[:2])
+    descriptor = DESCRIPTOR.match(arguments.replace("AT_FDCWD", "0"))
+    assert descriptor, arguments
+    path = descriptor.group(1)
+    return (path if path.startswith("/") else "standard output",)
 
 
 def points_of(trace):
@@ -116,8 +147,10 @@ def points_of(trace):
             continue
         kind = kind_of(name, arguments)
         assert kind in ERRORS, f"a call that is not known here: {line}"
-        points.append(Point(name, counts[name], kind, path_of(arguments), arguments, late, result))
-        late = late or (name == "chmod" and points[-1].path == INDEX)
+        path, *others = paths_of(kind, arguments)
+        points.append(Point(name, counts[name], kind, path, arguments, late, result,
+                            target=others[0] if others else ""))
+        late = late or (kind == "chmod" and path == INDEX)
     assert begun, "the trace shows no first call of the installer"
     return with_entries(points)
 
@@ -142,8 +175,10 @@ def strace(*options):
             "-s", "512", "-e", "signal=none", "-o", TRACE, *options)
 
 
+NAME_CHANGES = "rename,renameat,renameat2,unlink,unlinkat"
+
 # The command under which a run leaves a trace for points_of().
-TRACING = strace("-e", "trace=%file,%desc,getuid,getuid32")
+TRACING = strace("-e", "trace=%file,%desc,sync,getuid,getuid32")
 
 
 def trace(scenario, machine):
@@ -153,12 +188,39 @@ def trace(scenario, machine):
 
 
 def run_failing(scenario, machine, point, error):
-    """Runs `scenario` with the call of `point` failing with `error`."""
-    outcome = scenario.run(machine, strace("-e", f"trace={point.name}", "-e",
-                                       f"inject={point.name}:error={error}:when={point.count}"))
-    hit = [line for line in machine.read(TRACE).splitlines() if line.endswith("(INJECTED)")]
+    """Runs `scenario` with the call of `point` failing with `error`.
+
+    Returns the outcome and the renamings and deletions that the run tried.
+    """
+    outcome = scenario.run(machine, strace("-e", f"trace={point.name},{NAME_CHANGES}", "-e",
+                                           f"inject={point.name}:error={error}"
+                                           f":when={point.count}"))
+    trace = machine.read(TRACE)
+    hit = [line for line in trace.splitlines() if line.endswith("(INJECTED)")]
     assert len(hit) == 1, f"{point.label} was not met as expected: {hit}"
-    return outcome
+    return outcome, name_changes_of(trace)
+
+
+@dataclass(frozen=True)
+class NameChange:
+    """A renaming or a deletion that a run tried. `done` is false when it failed."""
+
+    kind: str
+    path: str
+    target: str
+    done: bool
+
+
+def name_changes_of(trace):
+    """The renamings and deletions that a run tried, in the order tried."""
+    changes = []
+    for call in filter(None, map(CALL.match, trace.splitlines())):
+        name, arguments, result = call.groups()
+        if (kind := kind_of(name, arguments)) in ("rename", "unlink"):
+            path, *others = paths_of(kind, arguments)
+            target = others[0] if others else ""
+            changes.append(NameChange(kind, path, target, not result.startswith("-1")))
+    return changes
 
 
 def run_killed(scenario, machine, point):

@@ -84,7 +84,7 @@ def registry_was_being_written(case, path):
         return case.status == 1 and not differences(case.between, case.after)
     if path == CONTROL_STATE:
         return case.after.get(path) == case.between.get(path)
-    return case.after.get(path) == case.reference("without a registry").get(path)
+    return case.after.get(path) == case.reference("with an empty registry").get(path)
 
 
 @rule("the installation was registered already",

@@ -52,14 +52,19 @@ class Outcome:
 
 @dataclass(frozen=True)
 class Node:
-    """One name of a tree. `content` is a file's bytes or a link's target."""
+    """One name of a tree. `content` is a file's bytes or a link's target.
+
+    `owner` is a user's and a group's number, root's on a machine that maps its users.
+    """
 
     kind: str
     mode: int
     content: bytes = b""
+    owner: tuple = (0, 0)
 
     def __str__(self):
-        return f"{self.kind} {self.mode:04o}"
+        owner = "" if self.owner == (0, 0) else f" {self.owner[0]}:{self.owner[1]}"
+        return f"{self.kind} {self.mode:04o}{owner}"
 
 
 class Machine:
@@ -69,6 +74,7 @@ class Machine:
         self.root = bubblewrap.new_root()
         self.binary = binary
         self.has_selinux = False
+        self.maps_users = True
         self.write_users()
         self.make_directory("/home/ann")
         self.make_directory("/var/scanners", 0o777)
@@ -114,6 +120,14 @@ class Machine:
 
     def change_mode(self, path, mode):
         os.chmod(self.at(path), mode)
+
+    def give(self, path, owner):
+        """Gives `path` to a user and a group, where the machine does not map its users."""
+        if not self.maps_users:
+            mode = self.mode(path)
+            os.chown(self.at(path), *owner, follow_symlinks=False)
+            if not os.path.islink(self.at(path)):
+                os.chmod(self.at(path), mode)  # a change of owner can take bits away
 
     def remove(self, path):
         """Deletes a file or a whole tree."""
@@ -176,7 +190,8 @@ class Machine:
         line = bubblewrap.command_line(
             self.root, command, uid=user.uid,
             environment=bubblewrap.environment_of(user.home, environment), read_only=read_only,
-            writable=None if everywhere else user.writable, options=options)
+            writable=None if everywhere else user.writable, options=options,
+            maps_users=self.maps_users or user.uid != 0)
         done = subprocess.run(line, stdin=subprocess.DEVNULL, capture_output=True, check=False,
                               umask=umask)
         return Outcome(as_text(done.stdout), as_text(done.stderr), done.returncode,
@@ -224,16 +239,17 @@ class Machine:
         host = self.at(path)
         status = os.lstat(host)
         mode = stat.S_IMODE(status.st_mode)
+        owner = (0, 0) if self.maps_users else (status.st_uid, status.st_gid)
         if stat.S_ISLNK(status.st_mode):
-            found[path] = Node("l", mode, os.fsencode(os.readlink(host)))
+            found[path] = Node("l", mode, os.fsencode(os.readlink(host)), owner)
         elif stat.S_ISDIR(status.st_mode):
-            found[path] = Node("d", mode)
+            found[path] = Node("d", mode, b"", owner)
             with readable(host, mode):
                 for name in sorted(os.listdir(host)):
                     self.collect(os.path.join(path, name), found)
         else:
             with readable(host, mode), open(host, "rb") as file:
-                found[path] = Node("f", mode, file.read())
+                found[path] = Node("f", mode, file.read(), owner)
 
     def listing(self, *places):
         """The tree of `places` as lines of kind, mode and path."""

@@ -2,17 +2,18 @@
 
 A `Scenario` is a command line of the installer together with the tree that it finds. Its machine is
 furnished once, with the real binary and the example toolkit, and kept as a tree; `restore` brings
-any machine back to such a tree, byte for byte and mode for mode.
+any machine back to such a tree, byte for byte and mode for mode, and owner for owner where root
+runs the sweep.
 """
 
 import os
 import re
 import subprocess
 import tempfile
-from dataclasses import dataclass, field
+from dataclasses import dataclass, field, replace
 
 from harness import REPOSITORY, bubblewrap
-from harness.machine import BINARY, ROOT, SPB, Machine, Node
+from harness.machine import BINARY, ROOT, SPB, Machine
 
 HOME = "/opt/corvan/zor"
 INDEX = HOME + "/ZOR_files"
@@ -39,6 +40,10 @@ OLD_FILE = HOME + "/bin/trawlold"
 OLD_PROPERTIES = HOME + "/properties/old.properties"
 OBSOLETE_FILES = tuple(HOME + "/bin/" + name
                        for name in ("trawlnet", "libzor.so", "kpo_config.xml"))
+
+# What an administrator has given to a user and a group of operators.
+OPERATORS = (1002, 1003)
+GIVEN_AWAY = (REGISTRY, COMMON_SETTING, INDEX, SETTINGS, HOME + "/bin/trawlhw", HOME + "/config")
 
 
 @dataclass(frozen=True)
@@ -77,10 +82,23 @@ def toolkit_packages():
 def new_machine(binary, packages):
     """An empty machine with `binary` and `packages`."""
     machine = Machine(binary)
+    machine.maps_users = not can_give_files_away(machine)
     for path, content in packages.items():
         machine.plant(path, content)
     machine.make_directory("/var/strace", 0o777)
     return machine
+
+
+def can_give_files_away(machine):
+    """True where every user exists and this one may give files to others."""
+    machine.plant("/tmp/trial")
+    try:
+        os.chown(machine.at("/tmp/trial"), *OPERATORS)
+        return True
+    except OSError:
+        return False
+    finally:
+        machine.remove("/tmp/trial")
 
 
 # Furnishing.
@@ -175,7 +193,7 @@ def tree_of(machine):
     if INDEX in tree:
         node = tree[INDEX]
         content = re.sub(rb"( installed on )[-0-9T:]+\n", rb"\1TIME\n", node.content, count=1)
-        tree[INDEX] = Node(node.kind, node.mode, content)
+        tree[INDEX] = replace(node, content=content)
     return tree
 
 
@@ -194,8 +212,9 @@ def restore(machine, tree):
         elif node.kind == "d":
             machine.make_directory(path, node.mode)
             machine.change_mode(path, node.mode)
-        elif now.get(path) != node:
+        elif path not in now or now[path].content != node.content:
             machine.link(path, node.content.decode())
+        machine.give(path, node.owner)
 
 
 def differences(wanted, got):
@@ -208,6 +227,8 @@ def furnished(scenario, binary, packages):
     machine = new_machine(binary, packages)
     try:
         scenario.furnish(machine)
+        for path in filter(machine.exists, GIVEN_AWAY):
+            machine.give(path, OPERATORS)
         return tree_of(machine)
     finally:
         bubblewrap.delete_root(machine.root)

@@ -36,8 +36,11 @@ from harness.zip_archive import IMAGE_ROOT
 PRESETS = ("release", "release-i686")
 
 
-def arguments_of(description, scenarios):
-    """Parses a sweep's command line. `scenarios` are the names of those that it can take."""
+def arguments_of(description, scenarios, sample=False):
+    """Parses a sweep's command line. `scenarios` are the names of those that it can take.
+
+    `sample` adds an option for a sweep that has a better sample than every Nth point.
+    """
     parser = argparse.ArgumentParser(
         description=description, formatter_class=argparse.RawDescriptionHelpFormatter)
     binary = parser.add_mutually_exclusive_group()
@@ -52,6 +55,9 @@ def arguments_of(description, scenarios):
     parser.add_argument("--point", metavar="POINT",
                         help="try only this point, as the list of violations names it, and show "
                         "everything about it; with one --scenario")
+    if sample:
+        parser.add_argument("--sample", action="store_true",
+                            help="try only what can be done in some seconds")
     parser.add_argument("--jobs", type=int, default=os.cpu_count(), metavar="N",
                         help="runs at the same time (default: one a processor)")
     arguments = parser.parse_args()
@@ -155,9 +161,13 @@ def run_without(*paths):
     return run
 
 
-def run_with_an_empty_index(scenario, machine):
-    machine.plant(INDEX, "", machine.mode(INDEX))
-    return run_without()(scenario, machine)
+def run_with_empty(path):
+    """The tree that a scenario leaves on a machine where the file `path` is empty."""
+    def run(scenario, machine):
+        with open(machine.at(path), "wb"):
+            pass
+        return run_without()(scenario, machine)
+    return run
 
 
 def run_without_its_failure(scenario, machine):
@@ -170,10 +180,10 @@ def run_twice(scenario, machine):
 
 
 REFERENCES = {
-    "without a registry": run_without(REGISTRY),
+    "with an empty registry": run_with_empty(REGISTRY),
     "without a scanner control": run_without(CONTROL),
     "without a common setting": run_without(COMMON_SETTING),
-    "with an index that lists nothing": run_with_an_empty_index,
+    "with an index that lists nothing": run_with_empty(INDEX),
     "without its failure": run_without_its_failure,
     "the same command again": run_twice,
 }
@@ -198,12 +208,17 @@ def paragraph(first, text):
 
 
 def print_exemptions(cases):
-    """Prints which rules excused something, in how many cases of which scenario."""
+    """Prints which rules of the fault sweep excused something, and in how many cases."""
+    print_rules([*exemptions.RULES, exemptions.KEPT_DIRECTORY], cases)
+
+
+def print_rules(rules, cases):
+    """Prints which rules excused something, and in how many cases of which scenario."""
     used = collections.Counter()
     for case in cases:
         used.update({(name, case.scenario.name) for name in case.excused.values()})
     print("Exemptions used (runs)\n")
-    for rule in [*exemptions.RULES, exemptions.KEPT_DIRECTORY]:
+    for rule in rules:
         scenarios = [f"{scenario} {used[rule.name, scenario]}" for scenario in SCENARIOS
                      if used[rule.name, scenario]]
         print(paragraph(f"{rule.name}: {', '.join(scenarios) or 'none'}", rule.reason))
