@@ -1,7 +1,13 @@
 # The packages, each as .tar.gz, .deb and .rpm: wzorinst, which needs nothing but a C library; spb
 # for those who make SPBs, which needs Python; and the debug symbols.
 # Same files, same bytes: all times are that of the release, or SOURCE_DATE_EPOCH.
-set(CPACK_GENERATOR TGZ DEB RPM)
+set(CPACK_GENERATOR TGZ DEB)
+find_program(RPMBUILD rpmbuild)
+if(RPMBUILD)
+  list(APPEND CPACK_GENERATOR RPM)
+else()
+  message(STATUS "No RPM packages: rpmbuild is missing (Debian package rpm)")
+endif()
 set(CPACK_COMPONENTS_ALL wzorinst spb debug)
 set(CPACK_COMPONENTS_GROUPING IGNORE)
 set(CPACK_PACKAGE_DIRECTORY ${CMAKE_BINARY_DIR}/packages)

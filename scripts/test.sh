@@ -1,12 +1,12 @@
 #!/bin/sh
 # Builds and runs every test: fuzz targets for ten seconds each, sanitized 64-bit, 64-bit and 32-bit
 # as they ship.
-# Usage: scripts/test.sh [preset...]     (default: fuzz dev release release-i686)
+# Usage: scripts/test.sh [preset...]     (default: fuzz dev test test-i686)
 set -eu
 cd "$(dirname "$0")/.."
 scripts/install_dependencies.sh
 
-[ $# -gt 0 ] || set -- fuzz dev release release-i686
+[ $# -gt 0 ] || set -- fuzz dev test test-i686
 for preset in "$@"; do
     echo "== $preset"
     cmake --preset "$preset" >/dev/null
