@@ -1,6 +1,7 @@
-"""Includes point down the rows of docs/architecture.md and never form a cycle."""
+"""Includes go one way: down the rows that CMake's source lists declare, and never in a cycle."""
 
 import re
+from pathlib import Path
 
 import pytest
 
@@ -8,22 +9,28 @@ from harness import REPOSITORY
 
 SOURCES = REPOSITORY / "src/install/standalone"
 
-# From top to bottom; what one row holds may include its own row and the lower ones.
-ROWS = [
-    "wzorinst command_line discovery status_report permissions private_mode",
-    "installation fresh_install upgrade removal",
-    "extraction scanner_control environment install_log template_variables tree_removal",
-    "registry exploiters common_directory locations property_file",
-    "file_operations sound_entry transaction",
-    "zip_file settings build_stamp version file_codes file_writing paths text time_stamps scoped"
-    " unwind_tables",
-]
-ROW_OF = {name: number for number, row in enumerate(ROWS) for name in row.split()}
+
+def declared_rows():
+    """The rows from top to bottom: their names, each with the names of its files."""
+    lists = re.findall(
+        r"^set\((\w+)_row\s+([\w.\s]+)\)$", (SOURCES / "CMakeLists.txt").read_text(), re.MULTILINE
+    )
+    return {
+        row.replace("_", " "): [Path(file).stem for file in files.split()] for row, files in lists
+    }
 
 
-def units():
-    return sorted({path.stem for path in SOURCES.glob("*.cpp")}
-                  | {path.stem for path in SOURCES.glob("*.h")})
+def documented_rows():
+    """The same, as the table of the architecture document shows it."""
+    text = (REPOSITORY / "docs/architecture.md").read_text()
+    table = text[text.index("| Row | Files |") :].split("\n\n")[0]
+    cells = [line.strip("| ").split(" | ") for line in table.splitlines()[2:]]
+    return {row: re.findall(r"`(\w+)`", files) for row, files in cells}
+
+
+ROWS = declared_rows()
+ROW_OF = {name: number for number, row in enumerate(ROWS.values()) for name in row}
+UNITS = sorted({path.stem for path in [*SOURCES.glob("*.cpp"), *SOURCES.glob("*.h")]})
 
 
 def includes(path):
@@ -33,30 +40,39 @@ def includes(path):
 
 
 def included_by(name):
-    """Names that the header or the source of `name` includes, itself left out."""
+    """Names that the header or the source of `name` includes, without itself."""
     found = includes(SOURCES / f"{name}.h") + includes(SOURCES / f"{name}.cpp")
     return sorted(set(found) - {name})
 
 
-def test_every_file_has_its_row():
-    assert units() == sorted(ROW_OF)
+def test_every_file_belongs_to_one_row():
+    assert sorted(name for row in ROWS.values() for name in row) == UNITS
 
 
-@pytest.mark.parametrize("name", units())
-def test_no_include_runs_up(name):
+def test_the_document_shows_the_same_rows():
+    documented = documented_rows()
+
+    assert list(documented) == list(ROWS)
+    assert {row: sorted(files) for row, files in documented.items()} == {
+        row: sorted(files) for row, files in ROWS.items()
+    }
+
+
+@pytest.mark.parametrize("name", UNITS)
+def test_no_include_goes_up(name):
     assert [other for other in included_by(name) if ROW_OF[other] < ROW_OF[name]] == []
 
 
-def test_no_include_closes_a_circle():
+def test_no_include_closes_a_cycle():
     done = set()
 
-    def visit(name, road):
-        assert name not in road, " -> ".join([*road, name])
+    def visit(name, chain):
+        assert name not in chain, " -> ".join([*chain, name])
         if name not in done:
             for other in included_by(name):
-                visit(other, [*road, name])
+                visit(other, [*chain, name])
             done.add(name)
 
-    for name in units():
+    for name in UNITS:
         visit(name, [])
-    assert done == set(units())
+    assert done == set(UNITS)

@@ -34,9 +34,16 @@ def test_every_source_is_built(folder):
 
 
 def test_every_test_has_a_time_limit():
-    shown = subprocess.run(["ctest", "--show-only=json-v1"], cwd=os.environ["WZOR_BUILD"],
-                           capture_output=True, check=True).stdout
+    shown = subprocess.run(
+        ["ctest", "--show-only=json-v1"],
+        cwd=os.environ["WZOR_BUILD"],
+        capture_output=True,
+        check=True,
+    ).stdout
     tests = json.loads(shown)["tests"]
-    limited = {test["name"] for test in tests
-               if any(each["name"] == "TIMEOUT" for each in test["properties"])}
+    limited = {
+        test["name"]
+        for test in tests
+        if any(each["name"] == "TIMEOUT" for each in test["properties"])
+    }
     assert tests and {test["name"] for test in tests} - limited == set()
