@@ -33,6 +33,7 @@ def run(home, program, *arguments, **environment):
         [home / "bin" / program, *arguments],
         capture_output=True,
         text=True,
+        check=False,
         timeout=60,
         env={**inherited, **environment},
     )
@@ -198,7 +199,7 @@ def test_the_service_of_the_file_system_scanner_ends_at_its_shutdown(home):
 
     assert service.wait(timeout=10) == 0
     assert "running=" not in run(home, "trawlcfg", "-status").stdout
-    assert list((home / "bin" / "etc" / "trawlfs").iterdir()) == []
+    assert not list((home / "bin" / "etc" / "trawlfs").iterdir())
 
 
 def test_a_number_that_another_process_uses_now_is_not_stopped(home):
@@ -211,7 +212,7 @@ def test_a_number_that_another_process_uses_now_is_not_stopped(home):
 
     assert done.returncode == 0
     assert other.poll() is None
-    assert list(marks.iterdir()) == []
+    assert not list(marks.iterdir())
     other.kill()
     other.wait()
 
@@ -320,9 +321,10 @@ def test_the_scripts_of_the_install_directory_run_once_they_are_filled_in(home):
         path.chmod(0o750)
     (home / "logs").mkdir()
 
-    where = subprocess.run([home / "install" / "trawlcfg.sh", "-where"], capture_output=True)
-    disable = subprocess.run([home / "install" / "trawlcfg.sh", "-disable", "all"])
-    removed = subprocess.run([home / "install" / "rmdirs.sh"], capture_output=True)
+    control, rmdirs = home / "install" / "trawlcfg.sh", home / "install" / "rmdirs.sh"
+    where = subprocess.run([control, "-where"], capture_output=True, check=False)
+    disable = subprocess.run([control, "-disable", "all"], check=False)
+    removed = subprocess.run([rmdirs], capture_output=True, check=False)
 
     assert where.stdout.decode() == (
         f"home={home}\nconfig={home}/config\ntraces={home}/common/ZOR/logs\n"

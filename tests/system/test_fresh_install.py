@@ -3,8 +3,8 @@
 import pytest
 
 from harness.checks import not_printed, printed, printed_lines, same_lines, same_text
-from harness.machine import ANN, ROOT, SPB, STRANGER
 from harness.installations import ANNS_TREE, SHARED_INDEX, SHARED_TRANSCRIPT, SHARED_TREE
+from harness.machine import ANN, ROOT, SPB, STRANGER
 
 
 def install(machine, *options, **how):

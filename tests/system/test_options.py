@@ -3,8 +3,8 @@
 import pytest
 
 from harness.checks import not_printed, printed, printed_lines, same_lines, same_text, same_tree
-from harness.machine import ANN, SPB
 from harness.installations import SHARED_INDEX, SHARED_TREE, tree_with
+from harness.machine import ANN, SPB
 
 
 def install(machine, *options, **how):

@@ -3,8 +3,8 @@
 import pytest
 
 from harness.checks import same_text
-from harness.machine import ANN, SPB
 from harness.installations import ANNS_TREE, SHARED_TREE
+from harness.machine import ANN, SPB
 
 UMASKS = pytest.mark.parametrize("umask", [0o000, 0o022, 0o077, 0o777],
                                  ids=["000", "022", "077", "777"])

@@ -1,25 +1,26 @@
-"""What the rules of the sweeps are made of: a run that met a failure, and what a rule is.
+"""What the comparisons of trees are made of: what a run found and left, and rules about it.
 
-A rule names one way in which the installer deliberately does less than "all or nothing", and
-excuses the difference at one path of a case only where everything that is known about the case
-speaks for it.
+A rule names one way in which the installer deliberately does less than "all or nothing". It excuses
+the difference at one path only if everything that is known about the run supports that.
 """
 
 from dataclasses import dataclass, field
+from typing import Callable
 
-from harness.scenarios import HOME
+from harness.failure_points import Point
+from harness.scenarios import HOME, Scenario
 
 BACKUP = ".bak"
 
 
 @dataclass(frozen=True)
 class Rule:
-    """`excuses` tells of a case and a path whether the rule excuses the difference there."""
+    """`excuses(change, path)` is true if the rule excuses the difference at `path`."""
 
     name: str
-    reason: str
-    statuses: tuple
-    excuses: object
+    reason: str = ""
+    statuses: tuple = (0, 1)  # of the runs for which the rule is asked
+    excuses: Callable | None = None
 
 
 class RuleBook(list):
@@ -38,23 +39,62 @@ class RuleBook(list):
                      if case.status in rule.statuses and rule.excuses(case, path)), None)
 
 
-@dataclass
-class Case:
-    """One run that met a failure: where, how it ended, and what it found and left."""
+@dataclass(kw_only=True)
+class Change:
+    """The trees that a run found and left."""
 
-    scenario: object
-    point: object
-    error: str
-    status: int
-    output: str
     before: dict
     after: dict
-    normal: dict  # what the undisturbed run leaves
-    package: dict  # each SPB's bytes and, by the path that it gets, each file's
-    reference: object  # gives the tree of a run on a machine that differs in a named way
-    name_changes: list  # the renamings and deletions that the run tried
+
+    @property
+    def wanted(self):
+        """The tree that it should have left."""
+        return self.before
+
+    def content(self, path):
+        """The bytes found at `path` afterwards, or None."""
+        node = self.after.get(path)
+        return node.content if node and node.kind == "f" else None
+
+    def lost(self, path):
+        return path in self.wanted and path not in self.after
+
+    def new(self, path):
+        return path not in self.wanted and path in self.after
+
+    def kept(self, path):
+        """True when there was something at `path` before and after."""
+        return path in self.before and path in self.after
+
+    def unchanged(self, path):
+        """True when what the run found at `path` is still there, whatever its mode."""
+        return is_same_but_for_the_mode(self.before.get(path), self.after.get(path))
+
+    def only_mode_differs(self, path):
+        return is_same_but_for_the_mode(self.wanted.get(path), self.after.get(path))
+
+
+@dataclass(kw_only=True)
+class Case(Change):
+    """A run of a sweep, disturbed at `point`: how it ended, and what rules say about its trees."""
+
+    scenario: Scenario
+    point: Point
+    status: int
+    output: str
+    normal: dict  # the tree that an undisturbed run leaves
+    package: dict  # the bytes of each SPB and, by the path that it gets, of each file in it
+    reference: Callable  # returns the tree of a run on a machine that differs in a named way
     excused: dict = field(default_factory=dict)  # path to the rule's name
     violations: list = field(default_factory=list)
+
+
+@dataclass(kw_only=True)
+class FailedCall(Case):
+    """A run in which one call failed with `error`."""
+
+    error: str
+    name_changes: list  # the renamings and deletions that the run tried
 
     @property
     def wanted(self):
@@ -75,22 +115,6 @@ class Case:
         """True when the call failed on `path` or on a directory that leads to it."""
         return is_below(path, self.hit) and self.hit != ""
 
-    def content(self, path):
-        """The bytes found at `path` afterwards, or None."""
-        node = self.after.get(path)
-        return node.content if node and node.kind == "f" else None
-
-    def lost(self, path):
-        return path in self.wanted and path not in self.after
-
-    def new(self, path):
-        return path not in self.wanted and path in self.after
-
-    def unchanged(self, path):
-        """True when what the run found at `path` is still there, whatever its mode."""
-        found, got = self.before.get(path), self.after.get(path)
-        return is_same_but_for_the_mode(found, got)
-
     def says(self, text):
         """True when the run printed `text`, or could not print."""
         return text in self.output or self.hit == "standard output"
@@ -106,9 +130,6 @@ class Case:
             given_up = made and (given_up or change.kind == "unlink" and change.path == backup
                                  and change.done)
         return False
-
-    def only_mode_differs(self, path):
-        return is_same_but_for_the_mode(self.wanted.get(path), self.after.get(path))
 
 
 def is_same_but_for_the_mode(wanted, got):

@@ -324,8 +324,7 @@ def removal_is_not_rolled_back(case, path):
 
 KEPT_DIRECTORY = Rule(
     "a directory that is not empty stays",
-    "A rollback or a removal keeps a directory in which something excused above is left.",
-    (0, 1), None)
+    "A rollback or a removal keeps a directory in which something excused above is left.")
 
 
 def judge(case, points=None):

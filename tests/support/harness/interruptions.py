@@ -8,7 +8,7 @@ not excused: they must be old contents that the second run did not touch.
 
 from dataclasses import dataclass, field
 
-from harness.cases import BACKUP, RuleBook, contents_before, lines_of
+from harness.cases import BACKUP, Case, RuleBook, contents_before, lines_of
 from harness.scenarios import (
     COMMON_SETTING,
     CONTROL,
@@ -22,26 +22,19 @@ from harness.scenarios import (
 )
 
 
-@dataclass
-class Interruption:
+@dataclass(kw_only=True)
+class Interruption(Case):
     """A run killed just before the call of `point`, and the same command after it.
 
-    `between` is the tree that the kill left, `status` and `after` are those of the second run.
+    `between` is the tree that the kill left; `status` and `after` are those of the second run.
     """
 
-    scenario: object
-    point: object
-    status: int
-    output: str
-    before: dict
     between: dict
-    after: dict
-    normal: dict
-    package: dict
-    reference: object
-    excused: dict = field(default_factory=dict)  # path to the rule's name
-    violations: list = field(default_factory=list)
     backups: list = field(default_factory=list)
+
+    @property
+    def wanted(self):
+        return self.normal
 
     @property
     def installs(self):

@@ -239,7 +239,7 @@ class Life:
             return
         rules = UPGRADE_RULES if expected.kind == "upgrade" else RULES
         lines, _ = rollback.unexplained(before, after, rules)
-        assert not lines, "not brought back by the rollback:\n" + "".join(lines)
+        assert not lines, "not restored by the rollback:\n" + "".join(lines)
         self.planted = {path: content for path, content in self.planted.items() if path in after}
 
     def remove(self):
@@ -257,7 +257,8 @@ class Life:
         else:
             place.record = expected.record
             after = self.machine.tree()
-            before.pop(place.registry, None), after.pop(place.registry, None)
+            before.pop(place.registry, None)
+            after.pop(place.registry, None)
             assert after == before, "a removal that deletes nothing changed the tree"
 
     def check_deleted(self, place, home, listed, is_private):

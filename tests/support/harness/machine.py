@@ -100,9 +100,9 @@ class Machine:
         while not os.path.lexists(self.at(path)):
             missing.append(path)
             path = os.path.dirname(path)
-        for path in reversed(missing):
-            os.mkdir(self.at(path))
-            os.chmod(self.at(path), mode if path == missing[0] else 0o755)
+        for directory in reversed(missing):
+            os.mkdir(self.at(directory))
+            os.chmod(self.at(directory), mode if directory == missing[0] else 0o755)
 
     def plant(self, path, content=b"", mode=0o644):
         """Writes a file with exactly these bytes and this mode, making its directories."""

@@ -85,11 +85,11 @@ class Laboratory:
         self.binary = binary
         self.jobs = jobs
         self.packages = toolkit_packages()
+        self.free = queue.Queue()
 
     def __enter__(self):
         self.all_machines = [new_machine(self.binary, self.packages) for _ in range(self.jobs + 1)]
         self.spare, *others = self.all_machines
-        self.free = queue.Queue()
         for machine in others:
             self.free.put(machine)
         return self
@@ -128,6 +128,11 @@ class Bench:
         self.package = package_files(laboratory.packages)
         self.trees = {}
         self.lock = threading.Lock()
+
+    def facts(self):
+        """What every case of this scenario holds: arguments for the making of one."""
+        return {"scenario": self.scenario, "before": self.before, "normal": self.normal,
+                "package": self.package, "reference": self.reference}
 
     def reference(self, name):
         """The tree of a run on a machine that differs as `name` says."""
