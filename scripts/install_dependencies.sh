@@ -6,17 +6,20 @@ set -eu
 
 packages='
     bash-completion
+    black
     bubblewrap
     clang
     clang-format
     clang-tidy
     cmake
+    codespell
     cppcheck
     g++
     g++-multilib
     gcovr
     googletest
     groff-base
+    isort
     lib32z1-dev
     libc6-dbg
     libclang-rt-14-dev
@@ -24,6 +27,7 @@ packages='
     man-db
     ninja-build
     nlohmann-json3-dev
+    pylint
     python3
     python3-jsonschema
     python3-pytest
