@@ -49,9 +49,14 @@ void writeDefaultSetting(const std::string& path)
 
 } // namespace
 
+std::string commonSettingPath()
+{
+    return joinPath(SettingDirectory, SettingFileName);
+}
+
 std::string readCommonDirectory(bool readOnly)
 {
-    const std::string path = joinPath(SettingDirectory, SettingFileName);
+    const std::string path = commonSettingPath();
     const ScopedFile file(std::fopen(path.c_str(), "r"));
     if (file)
         return commonDirectoryOf(file.get());

@@ -8,6 +8,9 @@
 
 extern const std::string KeyCorvanCommonDir; ///< "corvan_common_dir"
 
+/// The setting file.
+[[nodiscard]] std::string commonSettingPath();
+
 /// The common directory.
 ///
 /// Unless `readOnly`, a missing setting file is written with the default, with the directories that
