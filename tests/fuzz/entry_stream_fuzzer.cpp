@@ -5,7 +5,7 @@
 // Head: 1 byte (bit 0: deflated; bits 1 to 3: how it is read), 1 byte offset of the data, 4 bytes
 // compressed size, 4 bytes uncompressed size, little-endian.
 #include "assertion_trap.h"
-#include "file_operations.h"
+#include "entry_extraction.h"
 #include "fuzz_support.h"
 #include "zip_file.h"
 
@@ -153,7 +153,7 @@ void checkExtraction(const ZipFile& archive, const ZipEntry& entry)
 
     FileTransaction transaction;
     transaction.backup = false;
-    require(extractFile(transaction, archive, entry, extracted.path(), 0) == FileOk,
+    require(extractFile(transaction, archive, &entry, extracted.path(), 0) == FileOk,
             "an entry that has a stream is extracted");
     require(extracted.content() == bytes, "what is extracted is what the stream delivers");
 }

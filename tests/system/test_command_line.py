@@ -308,11 +308,12 @@ def test_an_empty_directory_counts_as_none(machine):
             status=1)
 
 
-def test_an_empty_directory_is_enough_for_private_mode(machine):
+def test_an_empty_directory_is_none_for_private_mode(machine):
     outcome = machine.run("r", "ABC", "-d", "", "-p")
 
-    assert outcome.stderr == ""
-    printed_lines(outcome, "Private mode enabled")
+    assert outcome.stderr == "For privatePath -d parameter is mandatory\n"
+    assert outcome.status == 1
+    same_text(outcome.stdout, "Target directory: \n")
 
 
 def test_the_log_file_takes_all_lines_from_its_option_on(machine):

@@ -14,16 +14,17 @@ def laboratory(binary):
         yield made
 
 
-def point_on(bench, kind, path):
-    """The last point of `kind` on `path` before the modes of the tree are set."""
+def point_on(bench, kind, path, number=-1):
+    """The point of `kind` on `path` with this number, the last by default, before the modes of the
+    tree are set."""
     return [point for point in bench.points
-            if point.kind == kind and point.path == path and not point.late][-1]
+            if point.kind == kind and point.path == path and not point.late][number]
 
 
-def fail(bench, kind, path, error):
+def fail(bench, kind, path, error, number=-1):
     """Runs the scenario of `bench` with this call failing; returns the outcome and the tree."""
     restore(bench.spare, bench.before)
-    point = point_on(bench, kind, path)
+    point = point_on(bench, kind, path, number)
     outcome, _ = failure_points.run_failing(bench.scenario, bench.spare, point, error)
     return outcome, tree_of(bench.spare)
 
@@ -33,7 +34,7 @@ def test_a_file_that_cannot_be_looked_at_is_backed_up_all_the_same(laboratory, e
     bench = sweep.Bench(laboratory, SCENARIOS["failing-upgrade"])
     scanner = HOME + "/bin/trawlhw"
 
-    outcome, after = fail(bench, "access", scanner, error)
+    outcome, after = fail(bench, "stat", scanner, error)
 
     assert outcome.status == 1
     assert after.get(scanner) == bench.before[scanner]
@@ -44,7 +45,7 @@ def test_a_file_that_cannot_be_looked_at_is_backed_up_all_the_same(laboratory, e
 def test_a_registry_that_cannot_be_looked_at_is_not_overwritten_without_a_backup(laboratory, error):
     bench = sweep.Bench(laboratory, SCENARIOS["failing-register"])
 
-    outcome, after = fail(bench, "access", REGISTRY, error)
+    outcome, after = fail(bench, "stat", REGISTRY, error, 0)
 
     assert "*** Error: could not open or write to INI file. Error = 2\n" in outcome.stdout
     assert outcome.status == 1

@@ -10,7 +10,6 @@ from harness.rollback import (
     FILE_INDEX,
     INSTALL_TYPE_FILE,
     OLDER_BACKUP,
-    REGISTRY_MODE,
     SINGLE_USER_FLAG,
     XSS_FILES,
     rolled_back,
@@ -420,8 +419,8 @@ def test_an_unsound_registry_comes_back(machine):
 
     fail(machine)
 
-    rolled_back(machine, before, FILE_INDEX, INSTALL_TYPE_FILE, COMMON_SETTING, REGISTRY_MODE)
-    assert machine.mode("/etc/zor/zor.ini") == 0o644
+    rolled_back(machine, before, FILE_INDEX, INSTALL_TYPE_FILE, COMMON_SETTING)
+    assert machine.mode("/etc/zor/zor.ini") == 0o600
 
 
 def test_an_older_backup_of_the_registry_does_not_come_back(machine):

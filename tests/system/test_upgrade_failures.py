@@ -10,7 +10,6 @@ from harness.rollback import (
     OBSOLETE_FILE,
     OLDER_BACKUP,
     PROPERTIES_DIRECTORY,
-    REGISTRY_MODE,
     SCRIPTS_OF_OLD,
     SINGLE_USER_FLAG,
     XSS_FILES,
@@ -299,7 +298,7 @@ def test_a_registry_that_cannot_be_written_whole_comes_back(machine):
     printed_lines(outcome, "Saving INI file to /etc/zor/zor.ini",
                   "*** Error: could not open or write to INI file. Error = 5",
                   "Installation failed, rolling back")
-    rolled_back(machine, before, REGISTRY_MODE)
+    rolled_back(machine, before)
 
 
 def test_a_registration_only_that_cannot_save_the_registry_fails(machine):

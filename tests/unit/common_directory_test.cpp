@@ -138,7 +138,7 @@ TEST_F(CommonDirectoryTest, ExistingDirectoriesKeepTheirModes)
     EXPECT_EQ("corvan_common_dir=/usr/kel/corvan/common\n", readFile(SettingPath));
 }
 
-TEST_F(CommonDirectoryTest, ASettingThatMayNotBeReadIsWrittenAnew)
+TEST_F(CommonDirectoryTest, ASettingThatMayNotBeReadIsLeftAlone)
 {
     (void)directoryOf("corvan_common_dir=/var/corvan\n");
     ASSERT_EQ(0, chmod(SettingPath.c_str(), 0200));
@@ -147,8 +147,8 @@ TEST_F(CommonDirectoryTest, ASettingThatMayNotBeReadIsWrittenAnew)
         EXPECT_EQ("/usr/kel/corvan/common", readCommonDirectory(true));
         EXPECT_EQ("/usr/kel/corvan/common", readCommonDirectory(false));
     }
-    EXPECT_EQ("corvan_common_dir=/usr/kel/corvan/common\n", readFile(SettingPath));
-    EXPECT_EQ(0664U, modeOf(SettingPath));
+    EXPECT_EQ("corvan_common_dir=/var/corvan\n", readFile(SettingPath));
+    EXPECT_EQ(0200U, modeOf(SettingPath));
 }
 
 TEST_F(CommonDirectoryTest, ADirectoryInPlaceOfTheSettingNamesNone)

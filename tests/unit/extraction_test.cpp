@@ -2,6 +2,7 @@
 #include "installer_fixtures.h"
 #include "paths.h"
 #include "registry.h"
+#include "safe_path.h"
 #include "settings.h"
 #include "text.h"
 #include "toolkit_package.h"

@@ -2,6 +2,7 @@
 #include "paths.h"
 #include "permissions.h"
 #include "process_limits.h"
+#include "safe_path.h"
 #include "settings.h"
 
 #include <gtest/gtest.h>

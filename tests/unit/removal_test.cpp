@@ -3,6 +3,7 @@
 #include "process_limits.h"
 #include "registry.h"
 #include "removal.h"
+#include "safe_path.h"
 #include "settings.h"
 #include "toolkit_package.h"
 

@@ -1,6 +1,7 @@
 #include "installer_fixtures.h"
 #include "paths.h"
 #include "process_limits.h"
+#include "safe_path.h"
 #include "settings.h"
 #include "status_report.h"
 

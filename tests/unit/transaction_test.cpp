@@ -1,5 +1,6 @@
 #include "installer_fixtures.h"
 #include "paths.h"
+#include "safe_path.h"
 #include "transaction.h"
 
 #include <gtest/gtest.h>

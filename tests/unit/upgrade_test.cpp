@@ -2,6 +2,7 @@
 #include "paths.h"
 #include "process_limits.h"
 #include "registry.h"
+#include "safe_path.h"
 #include "settings.h"
 #include "toolkit_package.h"
 #include "upgrade.h"

@@ -1,17 +1,24 @@
 #include "command_line.h"
 
 #include "build_stamp.h"
+#include "safe_path.h"
+#include "scoped.h"
 #include "settings.h"
 #include "text.h"
 
-#include <cstring>
-#include <fstream>
+#include <algorithm>
+#include <ext/stdio_filebuf.h>
 #include <iostream>
+#include <memory>
 #include <string_view>
+#include <utility>
+
+#include <fcntl.h>
 
 namespace {
 
 constexpr std::string_view OptionsWithArgument = "dfsoc";
+constexpr mode_t LogFileMode = 0666;
 
 /// The valid providers of the file-system scanner, as a name list.
 std::string providerList()
@@ -30,14 +37,46 @@ int invalidOption(const std::string& argument)
     return printUsage();
 }
 
+/// True for the path of a descriptor of the caller's, which is opened directly: "/dev/stdout",
+/// "/dev/fd/63", "/proc/self/fd/1".
+bool isDescriptorPath(std::string_view path)
+{
+    if (path == "/dev/stdout" || path == "/dev/stderr")
+        return true;
+    const std::size_t end = path.rfind('/') + 1; // of the directory, "/proc/<process>/fd/"
+    if (path.empty() || path.find_first_not_of("0123456789", end) != std::string_view::npos)
+        return false;
+    const std::string_view directory = path.substr(0, end);
+    if (directory == "/dev/fd/")
+        return true;
+    return directory.starts_with("/proc/") && directory.ends_with("/fd/") &&
+           std::count(directory.begin(), directory.end(), '/') == 4 &&
+           directory.find("/..") == std::string_view::npos;
+}
+
+/// Opens the log file at `path`; not open if that fails.
+ScopedFd openLog(const std::string& path)
+{
+    if (isDescriptorPath(path))
+        return ScopedFd(open(path.c_str(), O_WRONLY | O_CREAT | O_TRUNC | O_NOCTTY | O_CLOEXEC,
+                             LogFileMode));
+    WritableFile file;
+    (void)openForWriting(path, Existing::Truncate, LogFileMode, file); // see redirectLog()
+    return std::move(file.fd);
+}
+
 /// Makes the file at `path` the log stream. A file that cannot be opened swallows all that follows.
 void redirectLog(const char* path)
 {
-    static std::ofstream file; // lives to the end of the process, which flushes it
-    file.close();
-    file.clear();
-    file.open(path, std::ios::out | std::ios::trunc);
-    logstream = &file;
+    using Buffer = __gnu_cxx::stdio_filebuf<char>;
+    static std::unique_ptr<Buffer> buffer;  // lives to the end of the process, which flushes it
+    static std::ostream stream(nullptr);
+
+    stream.rdbuf(nullptr); // nothing is printed meanwhile
+    ScopedFd file = openLog(path);
+    buffer = file.isOpen() ? std::make_unique<Buffer>(file.release(), std::ios::out) : nullptr;
+    stream.rdbuf(buffer.get()); // without a buffer, the stream is in its failed state
+    logstream = &stream;
 }
 
 /// The state of one pass over the options.
@@ -59,7 +98,6 @@ public:
         return 0;
     }
 
-    [[nodiscard]] bool destinationGiven() const { return destinationGiven_; }
     [[nodiscard]] int installTypeChoices() const { return installTypeChoices_; }
 
 private:
@@ -136,7 +174,6 @@ private:
             return 0;
         case 'd':
             commandLine_.destDir = commandLine_.privatePath = value;
-            destinationGiven_ = true;
             *logstream << "Target directory: " << value << '\n';
             return 0;
         case 'f':
@@ -170,14 +207,13 @@ private:
     CommandLine& commandLine_;
     std::string providers_;
     bool extended_ = false;
-    bool destinationGiven_ = false;
     int installTypeChoices_ = 0;
 };
 
 /// What can be judged only when every option is known.
 int checkOptions(const CommandLine& commandLine, const OptionParser& options)
 {
-    if (privateMode && !options.destinationGiven()) {
+    if (privateMode && commandLine.privatePath.empty()) {
         std::cerr << "For privatePath -d parameter is mandatory\n";
         return 1;
     }
@@ -215,29 +251,6 @@ int parseCommandLine(int argc, char** argv, CommandLine& commandLine)
     OptionParser options(argc, argv, commandLine);
     const int code = options.run();
     return code != 0 ? code : checkOptions(commandLine, options);
-}
-
-int fixDestination(CommandLine& commandLine, const std::string& defaultDir)
-{
-    std::string& destDir = commandLine.destDir;
-    if (destDir.empty())
-        destDir = defaultDir;
-    if (destDir.empty()) {
-        *logstream << "*** Error: no destination directory.\n";
-        return printUsage();
-    }
-    if (destDir.back() == '/')
-        destDir.pop_back();
-    return 0;
-}
-
-InstallRegistry requestOf(const CommandLine& commandLine)
-{
-    InstallRegistry request = commandLine.installer;
-    request.exploiters = commandLine.exploiter;
-    request.homeDirectory = commandLine.destDir;
-    request.configRootDirectory = commandLine.destDir;
-    return request;
 }
 
 int printUsage()

@@ -1,14 +1,14 @@
 #include "common_directory.h"
 
 #include "file_operations.h"
+#include "file_replacement.h"
 #include "paths.h"
+#include "safe_path.h"
 #include "scoped.h"
 #include "settings.h"
 #include "text.h"
 
 #include <cstdio>
-
-#include <sys/stat.h>
 
 const std::string KeyCorvanCommonDir = "corvan_common_dir";
 
@@ -35,32 +35,33 @@ std::string commonDirectoryOf(std::FILE* file)
 
 void writeDefaultSetting(const std::string& path)
 {
-    const ScopedUmask mask(globalFilesUmask);
     // Dropped without commit or rollback: the setting is the house's, not this installation's.
     FileTransaction scratch;
-    (void)createPath(scratch, path, SettingDirectoryMode); // the open tells
-
-    const ScopedFile file(std::fopen(path.c_str(), "w"));
-    if (!file)
-        return;
-    (void)std::fprintf(file.get(), "%s=%s\n", KeyCorvanCommonDir.c_str(), DefaultCommonDirectory);
-    (void)fchmod(fileno(file.get()), SettingFileMode);
+    {
+        const ScopedUmask mask(globalFilesUmask);
+        (void)createPath(scratch, path, SettingDirectoryMode); // if it fails, so does the next step
+    }
+    const ScopedUmask mask(0);
+    (void)replaceFile(path, SettingFileMode, [](std::FILE* file) { // the default applies anyway
+        (void)std::fprintf(file, "%s=%s\n", KeyCorvanCommonDir.c_str(), DefaultCommonDirectory);
+    });
 }
 
 } // namespace
 
-std::string commonSettingPath()
-{
-    return joinPath(SettingDirectory, SettingFileName);
-}
-
 std::string readCommonDirectory(bool readOnly)
 {
-    const std::string path = commonSettingPath();
-    const ScopedFile file(std::fopen(path.c_str(), "r"));
+    const std::string path = commonDirectorySetting();
+    const ScopedFile file = openForReading(path);
     if (file)
         return commonDirectoryOf(file.get());
-    if (!readOnly)
+    // One that is there but cannot be read names a directory that we do not know: it is kept.
+    if (!readOnly && pathIsMissing(path))
         writeDefaultSetting(path);
     return DefaultCommonDirectory;
+}
+
+std::string commonDirectorySetting()
+{
+    return joinPath(SettingDirectory, SettingFileName);
 }

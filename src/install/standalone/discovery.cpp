@@ -2,6 +2,7 @@
 
 #include "locations.h"
 #include "paths.h"
+#include "safe_path.h"
 #include "scoped.h"
 #include "settings.h"
 #include "text.h"
@@ -9,46 +10,36 @@
 #include <cstdio>
 #include <ostream>
 
-#include <fcntl.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
 namespace {
 
 constexpr const char* ProbeFileName = "$_ZOR_$";
+constexpr mode_t ProbeFileMode = 0600;
 
-/// Creates a file in `home` and deletes it again; false when that fails.
-bool canCreateProbe(const std::string& home)
+/// Whether a file can be created in `home`; the probe is deleted again.
+int probeHome(const std::string& home)
 {
     const std::string probe = joinPath(home, ProbeFileName);
-    if (!ScopedFile(std::fopen(probe.c_str(), "w")))
-        return false;
-    (void)unlink(probe.c_str()); // an empty file at the worst
-    return true;
-}
-
-/// Whether a file can be created in `home`.
-int probeHome(const std::string& home, bool readOnly)
-{
-    const bool writable =
-        readOnly ? faccessat(AT_FDCWD, (home + "/.").c_str(), W_OK | X_OK, AT_EACCESS) == 0
-                 : canCreateProbe(home);
-    if (writable)
-        return RegistryOk;
-    *logstream << "*** Error: cannot create file in INI home dir.\n";
-    return HomeNotWritable;
+    if (!openStream(probe, Existing::TruncateUnlinked, ProbeFileMode)) {
+        *logstream << "*** Error: cannot create file in INI home dir.\n";
+        return HomeNotWritable;
+    }
+    (void)unlinkPath(probe); // an empty file at the worst
+    return RegistryOk;
 }
 
 /// Whether the scanner control of the installation in `home` is there and not empty.
 int checkScannerControl(const std::string& home)
 {
     const std::string path = joinPath(home, trawlcfgExe);
-    if (!pathExists(path)) {
+    struct stat status = {};
+    if (statPath(path, status) != 0) {
         *logstream << "*** Error: cannot find " << path << " in INI home dir.\n";
         return ScannerControlBroken;
     }
-    struct stat status = {};
-    if (stat(path.c_str(), &status) != 0 || status.st_size == 0) {
+    if (status.st_size == 0) {
         *logstream << "*** Error: found " << path << " with invalid size.\n";
         return ScannerControlBroken;
     }
@@ -56,15 +47,15 @@ int checkScannerControl(const std::string& home)
     return RegistryOk;
 }
 
-int verifyHome(const std::string& home, bool readOnly)
+int verifyHome(const std::string& home)
 {
     *logstream << "INI file found, verifying...\n";
-    const int status = probeHome(home, readOnly);
+    const int status = probeHome(home);
     return status != RegistryOk ? status : checkScannerControl(home);
 }
 
 /// Reads and verifies the registry; returns the status.
-int findRegistry(InstallRegistry& registry, bool readOnly)
+int findRegistry(InstallRegistry& registry)
 {
     const std::string path = registryPath(localInstall);
     *logstream << "Looking for INI file: " << path << '\n';
@@ -74,7 +65,7 @@ int findRegistry(InstallRegistry& registry, bool readOnly)
         registry.configRootDirectory = registry.homeDirectory;
 
     if (status == RegistryOk)
-        return verifyHome(registry.homeDirectory, readOnly);
+        return verifyHome(registry.homeDirectory);
     *logstream << "INI file not found or outdated (code=" << status << ")\n";
     return status;
 }
@@ -102,10 +93,10 @@ void forceUpdate(InstallRegistry& registry, const ZorVersion& installerVersion)
 
 } // namespace
 
-Discovery discoverInstallation(const CommandLine& commandLine, bool readOnly)
+Discovery discoverInstallation(const CommandLine& commandLine)
 {
     Discovery found;
-    found.status = findRegistry(found.registry, readOnly);
+    found.status = findRegistry(found.registry);
     found.registryFound = found.status == RegistryOk;
     found.installAction = decideAction(commandLine.action);
 

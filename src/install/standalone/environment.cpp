@@ -2,7 +2,9 @@
 
 #include "common_directory.h"
 #include "file_operations.h"
+#include "interruption.h"
 #include "paths.h"
+#include "safe_path.h"
 #include "scoped.h"
 #include "settings.h"
 
@@ -22,6 +24,12 @@ constexpr mode_t InstallDirMode = 0750;
 std::string quotedIfBlank(const std::string& text)
 {
     return text.find(' ') == std::string::npos ? text : "\"" + text + "\"";
+}
+
+/// The toolkit's log directory below the common directory.
+std::string commonLogDir(const std::string& common)
+{
+    return joinPath(common, joinPath(zorCommonDir, logDir));
 }
 
 /// Sets the mode of `count` directories from `path` upwards.
@@ -64,6 +72,7 @@ int runCommand(const std::string& program, const std::string& /*directory*/,
     std::cout.flush();
     logstream->flush();
     const int status = std::system(command.c_str());
+    noteStatusOfCommand(status);
     *logstream << "Exec '" << command << "' returned " << status << '\n';
     return status;
 }
@@ -111,11 +120,6 @@ void setLibraryPath(const std::string& home)
     if (result != 0)
         *logstream << "Setting up the '" << LibraryPathName
                    << "' variable has failed. Error = " << result << '\n';
-}
-
-std::string commonLogDir(const std::string& common)
-{
-    return joinPath(common, joinPath(zorCommonDir, logDir));
 }
 
 int setupCommonLogDir(FileTransaction& transaction, const std::string& /*home*/, bool useCustomPath,

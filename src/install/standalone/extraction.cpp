@@ -1,9 +1,12 @@
 #include "extraction.h"
 
+#include "entry_extraction.h"
 #include "file_operations.h"
 #include "install_log.h"
+#include "interruption.h"
 #include "paths.h"
 #include "registry.h"
+#include "safe_path.h"
 #include "scoped.h"
 #include "settings.h"
 #include "text.h"
@@ -12,9 +15,6 @@
 #include <iostream>
 #include <memory>
 #include <set>
-#include <vector>
-
-#include <unistd.h>
 
 namespace {
 
@@ -27,53 +27,12 @@ void trace(bool debug, const char* what, const std::string& value)
         std::cout << what << value << '\n';
 }
 
-/// Extracts one entry to `destination`, which tells by its last character what it is.
-int extractEntry(FileTransaction& transaction, const ZipFile& archive, const ZipEntry& entry,
-                 const std::string& destination, mode_t mode, std::FILE* logFile, bool debug)
-{
-    if (endsWithSlash(destination)) {
-        trace(debug, "createPath: ", destination);
-        return createPath(transaction, destination, mode);
-    }
-
-    trace(debug, "extractFile: ", destination);
-    const int code = extractFile(transaction, archive, entry, destination, mode);
-    if (logFile != nullptr) // also after a failure: part of the file may lie there
-        (void)std::fprintf(logFile, "%s\n", destination.c_str());
-    return code;
-}
-
-/// Extracts the package directories in their order; returns the first failing code.
-int extractDirs(FileTransaction& transaction, const ZipFile& archive, const std::string& home,
-                bool freshInstall)
-{
-    const ScopedUmask mask(globalFilesUmask);
-    for (const ExtractionStep& step : extractionSteps(freshInstall)) {
-        const std::string destination = joinPath(home, step.subdir);
-        const bool isConfig = step.subdir == spbCfgDir; // says so, and never traces
-        if (isConfig)
-            *logstream << "Extracting configs to '" << destination << "'\n" << std::flush;
-        const int code =
-            isConfig ? extractEntries(transaction, archive, sourcePrefix(step.subdir), destination,
-                                      step.mode, &step.skipList, zor_file_handle, false)
-                     : extractDir(transaction, archive, home, step.subdir, step.mode,
-                                  zor_file_handle, debugMode);
-        if (code == FileOk)
-            continue;
-        if (step.subdir == spbBinDir)
-            *logstream << "Bin dir file extraction failed\n";
-        return code;
-    }
-    return FileOk;
-}
-
-} // namespace
-
 std::string sourcePrefix(const std::string& subdir)
 {
     return spbFileRoot + subdir + "/";
 }
 
+/// `dstDir` and `rest`, without two slashes in a row.
 std::string destinationName(const std::string& dstDir, const std::string& rest)
 {
     std::string name = dstDir + "/" + rest;
@@ -82,21 +41,105 @@ std::string destinationName(const std::string& dstDir, const std::string& rest)
     return name;
 }
 
-std::vector<ExtractionStep> extractionSteps(bool freshInstall)
+/// Extracts one entry to `destination`; a trailing slash means a directory.
+int extractEntry(FileTransaction& transaction, OpenPackage& package, const ZipEntry& entry,
+                 const std::string& destination, mode_t mode, std::FILE* logFile, bool debug)
 {
-    std::string settings; // the owner's by now
-    if (!freshInstall)
-        appendToNameList(settings, sourcePrefix(spbCfgDir) + zorProps);
-    return {
-        {spbBinDir, PublicMode, ""},
-        {spbPropertiesDir, PublicMode, ""},
-        {spbCfgDir, PublicMode, settings},
-        // Deliberate: the step above has extracted these already; the second pass backs up and
-        // lists them once more.
-        {joinPath(spbCfgDir, spbCfgXssDir), PublicMode, ""},
-        {auxDirInstall, InstallDirMode, ""},
-    };
+    if (endsWithSlash(destination)) {
+        trace(debug, "createPath: ", destination);
+        return createPath(transaction, destination, mode);
+    }
+
+    trace(debug, "extractFile: ", destination);
+    const int code = extractOpenFile(transaction, package, &entry, destination, mode);
+    if (logFile != nullptr) // also after a failure: part of the file may lie there
+        (void)std::fprintf(logFile, "%s\n", destination.c_str());
+    return code;
 }
+
+/// extractEntries() of an open package.
+int extractMatching(FileTransaction& transaction, OpenPackage& package,
+                    const std::string& srcPrefix, const std::string& dstDir, mode_t mode,
+                    const std::string* skipList, std::FILE* logFile, bool debug)
+{
+    trace(debug, "Src path: ", srcPrefix);
+    trace(debug, "Dst path: ", dstDir);
+    trace(debug, "Mode: ", std::to_string(mode));
+
+    for (const ZipEntry& entry : package.archive().entries()) {
+        if (skipList != nullptr && nameListContains(*skipList, entry.name)) {
+            trace(debug, "Skip: ", entry.name);
+            continue;
+        }
+        if (debug)
+            std::cout << "Looking at file " << entry.name << " inside spb\n";
+        if (!entry.name.starts_with(srcPrefix))
+            continue;
+
+        const std::string destination =
+            destinationName(dstDir, entry.name.substr(srcPrefix.size()));
+        trace(debug, "dstName: ", destination);
+        if (destination.size() <= 1) {
+            trace(debug, "Skipping dstName: ", destination);
+            continue;
+        }
+
+        if (isInterrupted())
+            return RunInterrupted;
+        const int code =
+            extractEntry(transaction, package, entry, destination, mode, logFile, debug);
+        if (code != FileOk) {
+            trace(debug, "createPath or extractFile failed", "");
+            return code;
+        }
+    }
+    return FileOk;
+}
+
+/// Extracts "config", on an upgrade without the main property file. Never traces.
+int extractConfigs(FileTransaction& transaction, OpenPackage& package, const std::string& home,
+                   bool freshInstall)
+{
+    const std::string prefix = sourcePrefix(spbCfgDir);
+    const std::string destination = joinPath(home, spbCfgDir);
+    std::string skipList;
+    if (!freshInstall)
+        appendToNameList(skipList, prefix + zorProps);
+
+    *logstream << "Extracting configs to '" << destination << "'\n" << std::flush;
+    return extractMatching(transaction, package, prefix, destination, PublicMode, &skipList,
+                          zor_file_handle, false);
+}
+
+/// Extracts the package directories in their order; returns the first failing code.
+int extractDirs(FileTransaction& transaction, const ZipFile& archive, const std::string& home,
+                bool freshInstall)
+{
+    OpenPackage package(archive);
+    const ScopedDirectoryReuse reuse;
+    const ScopedUmask mask(globalFilesUmask);
+    const auto extract = [&](const std::string& subdir, mode_t mode) {
+        return extractMatching(transaction, package, sourcePrefix(subdir), joinPath(home, subdir), mode,
+                               nullptr, zor_file_handle, debugMode);
+    };
+
+    int code = extract(spbBinDir, PublicMode);
+    if (code != FileOk)
+        *logstream << "Bin dir file extraction failed\n";
+    if (code == FileOk)
+        code = extract(spbPropertiesDir, PublicMode);
+    if (code == FileOk)
+        code = extractConfigs(transaction, package, home, freshInstall);
+    // Deliberate: the step above has extracted these already; the second pass backs up and lists
+    // them once more.
+    if (code == FileOk)
+        code = extract(joinPath(spbCfgDir, spbCfgXssDir), PublicMode);
+    if (code == FileOk)
+        code = extract(auxDirInstall, InstallDirMode);
+    return code;
+}
+
+} // namespace
 
 int extractPackage(const std::string& spbPath, FileTransaction& transaction,
                    InstallRegistry& installation, bool freshInstall, const std::string* logPath)
@@ -128,7 +171,7 @@ int extractPackage(const std::string& spbPath, FileTransaction& transaction,
         *logstream << "File extraction failed, error = " << code << " ("
                    << fileErrorText(static_cast<unsigned>(code)) << ")\n";
         if (logPath != nullptr)
-            (void)unlink(logPath->c_str()); // it lists what the rollback takes away
+            (void)unlinkPath(*logPath); // it lists what the rollback takes away
     }
     return code;
 }
@@ -144,34 +187,6 @@ int extractEntries(FileTransaction& transaction, const ZipFile& archive,
                    const std::string& srcPrefix, const std::string& dstDir, mode_t mode,
                    const std::string* skipList, std::FILE* logFile, bool debug)
 {
-    trace(debug, "Src path: ", srcPrefix);
-    trace(debug, "Dst path: ", dstDir);
-    trace(debug, "Mode: ", std::to_string(mode));
-
-    for (const ZipEntry& entry : archive.entries()) {
-        if (skipList != nullptr && nameListContains(*skipList, entry.name)) {
-            trace(debug, "Skip: ", entry.name);
-            continue;
-        }
-        if (debug)
-            std::cout << "Looking at file " << entry.name << " inside spb\n";
-        if (!entry.name.starts_with(srcPrefix))
-            continue;
-
-        const std::string destination =
-            destinationName(dstDir, entry.name.substr(srcPrefix.size()));
-        trace(debug, "dstName: ", destination);
-        if (destination.size() <= 1) {
-            trace(debug, "Skipping dstName: ", destination);
-            continue;
-        }
-
-        const int code =
-            extractEntry(transaction, archive, entry, destination, mode, logFile, debug);
-        if (code != FileOk) {
-            trace(debug, "createPath or extractFile failed", "");
-            return code;
-        }
-    }
-    return FileOk;
+    OpenPackage package(archive);
+    return extractMatching(transaction, package, srcPrefix, dstDir, mode, skipList, logFile, debug);
 }

@@ -19,6 +19,7 @@ enum FileCode : int {
     CannotCreateDirectory = 11,
     CannotRemoveDirectory = 12,
     CannotChangeMode = 13,
+    RunInterrupted = 14, ///< a signal asked the run to stop; it has no text of its own
 };
 
 /// The text of `code`; "Unknown error" for a number above 13.

@@ -1,13 +1,13 @@
 #include "file_operations.h"
 
+#include "file_replacement.h"
 #include "file_writing.h"
 #include "paths.h"
+#include "safe_path.h"
 #include "scoped.h"
-#include "sound_entry.h"
 
 #include <cerrno>
 #include <cstdio>
-#include <memory>
 
 #include <fcntl.h>
 #include <sys/stat.h>
@@ -16,44 +16,9 @@
 namespace {
 
 constexpr mode_t NewFileMode = 0666;
+constexpr mode_t UnfinishedMode = 0600; // nobody else can open the file while it is being written
 constexpr mode_t NewDirectoryMode = 0777;
-constexpr int CreateOnly = O_WRONLY | O_CREAT | O_EXCL | O_CLOEXEC;
 constexpr int CopyBlockSize = 4096;
-constexpr int ExtractBlockSize = 8192;
-
-ScopedFd openForWriting(const std::string& path)
-{
-    return ScopedFd(open(path.c_str(), O_WRONLY | O_CREAT | O_TRUNC | O_CLOEXEC, NewFileMode));
-}
-
-/// True when the last file of the journal took the place of another.
-bool lastReplacedAnother(const FileTransaction& transaction)
-{
-    const auto& journal = transaction.journal;
-    return journal.size() >= 2 && journal[journal.size() - 2].kind == BackedUp;
-}
-
-/// Opens `destination` for a file that is extracted from `archive`, its old content backed up;
-/// returns 0, or the code of what failed.
-///
-/// Into a new installation hardly anything is in the way, so creating it comes first, and looking
-/// at what is there only when that fails, whatever the reason: the second road tells it. Where the
-/// last file replaced another, this one is expected to as well.
-int openDestination(FileTransaction& transaction, const ZipFile& archive,
-                    const std::string& destination, ScopedFd& file)
-{
-    if (!lastReplacedAnother(transaction))
-        file = ScopedFd(open(destination.c_str(), CreateOnly, NewFileMode));
-    if (file.isOpen())
-        return FileOk;
-
-    const int backedUp = backupFile(transaction, destination);
-    if (backedUp != FileOk)
-        return backedUp;
-    file = openForWriting(destination);
-    archive.fileWasReplaced();
-    return file.isOpen() ? FileOk : CannotOpenForWriting;
-}
 
 int copyContent(int source, int destination)
 {
@@ -70,19 +35,53 @@ int copyContent(int source, int destination)
     }
 }
 
-int writeContent(InputStream& stream, int destination)
+/// Copies `source` to `destination`, both open, and closes the latter.
+int copyAndClose(const ScopedFd& source, WritableFile& destination)
 {
-    char block[ExtractBlockSize];
-    for (;;) {
-        const int count = stream.read(block, sizeof block);
-        if (count < 0)
-            return CannotRead;
-        if (count == 0)
-            return FileOk;
-        const int code = writeAll(destination, block, static_cast<std::size_t>(count));
-        if (code != FileOk)
-            return code;
-    }
+    const int code = copyContent(source.get(), destination.fd.get());
+    if (destination.created)
+        (void)fchmod(destination.fd.get(), underUmask(NewFileMode)); // the content is what counts
+    return code != FileOk ? code : closeWritten(destination.fd);
+}
+
+/// Opens the two files of a copy. Returns 0, 1 or 2.
+int openCopy(const std::string& source, const std::string& destination, ScopedFd& in,
+             WritableFile& out)
+{
+    in = openPath(source, O_RDONLY);
+    if (!in.isOpen())
+        return CannotOpenForReading;
+    const int error = openForWriting(destination, Existing::Truncate, UnfinishedMode, out);
+    return error == 0 ? FileOk : CannotOpenForWriting;
+}
+
+/// Copies a file with its owner, group, mode and attributes, as far as the running user can pass
+/// them on, and writes the copy to the disk.
+int copyForRestoring(const std::string& source, const std::string& destination)
+{
+    ScopedFd in(-1);
+    WritableFile out;
+    int code = openCopy(source, destination, in, out);
+    if (code == FileOk)
+        code = copyContent(in.get(), out.fd.get());
+    if (code != FileOk)
+        return code;
+    struct stat status = {};
+    if (!copyAttributes(in.get(), out.fd.get()) && fstat(in.get(), &status) == 0)
+        (void)fchmod(out.fd.get(), status.st_mode & ACCESSPERMS); // the content is what counts
+    const int error = syncFile(out.fd.get());
+    return error == 0 ? closeWritten(out.fd) : writeErrorCode(error);
+}
+
+/// True if what is in the way at `place` must be moved: anything but a link of ours that leads
+/// nowhere. The latter stays, and what it points to is created.
+bool isInTheWay(const Place& place, const std::string& path)
+{
+    struct stat status = {};
+    if (fstatat(place.fd(), place.name.c_str(), &status, AT_SYMLINK_NOFOLLOW) == 0 &&
+        (!S_ISLNK(status.st_mode) || !isTrustedOwner(status.st_uid)))
+        return true;
+    return !pathIsMissing(path);
 }
 
 int createIfMissing(FileTransaction& transaction, const std::string& path, mode_t mode)
@@ -95,49 +94,36 @@ int createIfMissing(FileTransaction& transaction, const std::string& path, mode_
     return FileOk;
 }
 
-/// Writes `entry`, which lies in the open archive `source`, to the new file `destination`.
-int writeEntry(const ZipFile& archive, const ZipEntry& entry, int source, int destination)
-{
-    const int copied = copySoundEntry(source, entry, destination);
-    if (copied != EntryNotSound)
-        return copied;
-
-    // Damaged: what is left of it is what its stream delivers in blocks of ExtractBlockSize.
-    // A device has nothing to take back, and says EINVAL.
-    if (lseek(destination, 0, SEEK_SET) != 0 || (ftruncate(destination, 0) != 0 && errno != EINVAL))
-        return writeErrorCode(errno);
-    const std::unique_ptr<InputStream> stream(archive.getInputStream(&entry));
-    return stream ? writeContent(*stream, destination) : CannotOpenForReading;
-}
-
 } // namespace
 
 int copyFile(const std::string& source, const std::string& destination)
 {
-    const ScopedFd in(open(source.c_str(), O_RDONLY | O_CLOEXEC));
-    if (!in.isOpen())
-        return CannotOpenForReading;
-    ScopedFd out = openForWriting(destination);
-    if (!out.isOpen())
-        return CannotOpenForWriting;
-
-    const int code = copyContent(in.get(), out.get());
-    return code != FileOk ? code : closeWritten(out);
+    ScopedFd in(-1);
+    WritableFile out;
+    const int code = openCopy(source, destination, in, out);
+    return code != FileOk ? code : copyAndClose(in, out);
 }
 
 int backupFile(FileTransaction& transaction, const std::string& path)
 {
-    if (!transaction.backup || pathIsMissing(path))
+    if (!transaction.backup)
+        return FileOk;
+    Place place;
+    if (findPlace(path, LastLink::Keep, place) != 0)
+        return pathIsMissing(path) ? FileOk : CannotRename;
+    if (!isInTheWay(place, path))
         return FileOk;
 
-    const std::string backup = backupName(path);
-    if (renameat2(AT_FDCWD, path.c_str(), AT_FDCWD, backup.c_str(), RENAME_NOREPLACE) != 0) {
-        (void)unlink(backup.c_str()); // of an older run; if it stays, the rename tells
-        if (std::rename(path.c_str(), backup.c_str()) != 0)
+    const char* const name = place.name.c_str();
+    const std::string backup = backupName(place.name);
+    if (renameat2(place.fd(), name, place.fd(), backup.c_str(), RENAME_NOREPLACE) != 0) {
+        // A backup of an older run. If it cannot be deleted, the rename fails.
+        (void)unlinkat(place.fd(), backup.c_str(), 0);
+        if (renameat(place.fd(), name, place.fd(), backup.c_str()) != 0)
             return CannotRename;
     }
 
-    // Only now: an entry without its backup would have nothing to restore.
+    // Recorded only now: an entry without a backup would have nothing to restore.
     record(transaction, BackedUp, path);
     return FileOk;
 }
@@ -145,35 +131,14 @@ int backupFile(FileTransaction& transaction, const std::string& path)
 int backupCopy(FileTransaction& transaction, const std::string& path)
 {
     const std::string backup = backupName(path);
-    const int code = copyFile(path, backup);
+    const int code = copyForRestoring(path, backup);
     if (code != FileOk) {
-        (void)unlink(backup.c_str()); // a partial copy restores nothing
+        (void)unlinkPath(backup); // a partial copy restores nothing
         return code;
     }
     record(transaction, BackedUp, path);
     record(transaction, Created, path);
     return FileOk;
-}
-
-int extractFile(FileTransaction& transaction, const ZipFile& archive, const ZipEntry& entry,
-                const std::string& destination, mode_t mode)
-{
-    const auto source = archive.openEntry(&entry);
-    if (!source)
-        return CannotOpenForReading;
-
-    ScopedFd file(-1);
-    const int opened = openDestination(transaction, archive, destination, file);
-    if (opened != FileOk)
-        return opened;
-    record(transaction, Created, destination); // before its first byte: a rollback finds it
-
-    const int code = writeEntry(archive, entry, source->get(), file.get());
-    if (code != FileOk)
-        return code;
-    if (mode != 0)
-        (void)fchmod(file.get(), mode); // the content is what counts
-    return closeWritten(file);
 }
 
 int copyFileWithBackup(FileTransaction& transaction, const std::string& source,
@@ -189,19 +154,24 @@ int copyFileWithBackup(FileTransaction& transaction, const std::string& source,
     return FileOk;
 }
 
+int setFileMode(const std::string& path, mode_t mode)
+{
+    return changeMode(path, mode) == ModeChange::Changed ? FileOk : CannotChangeMode;
+}
+
 int setFileMode(FileTransaction& /*transaction*/, const std::string& path, mode_t mode)
 {
-    return chmod(path.c_str(), mode) == 0 ? FileOk : CannotChangeMode;
+    return setFileMode(path, mode);
 }
 
 int makeDirectory(const std::string& path, mode_t mode)
 {
-    return mkdir(path.c_str(), mode != 0 ? mode : NewDirectoryMode);
+    return createDirectoryPath(path, mode != 0 ? mode : NewDirectoryMode);
 }
 
 int removeDirectory(const std::string& path)
 {
-    return rmdir(path.c_str());
+    return removeDirectoryPath(path);
 }
 
 int createPath(FileTransaction& transaction, const std::string& path, mode_t mode)

@@ -8,7 +8,6 @@
 
 #include "file_codes.h"
 #include "transaction.h"
-#include "zip_file.h"
 
 #include <string>
 
@@ -20,25 +19,20 @@
 /// CannotRead (4), or the code of a failed write (5, 6, 7). A failed copy leaves what was written.
 [[nodiscard]] int copyFile(const std::string& source, const std::string& destination);
 
-/// Moves what lies at `path` to its backup name and journals that; an older backup is deleted.
+/// Moves what is at `path` to its backup name and journals that; an older backup is deleted.
 ///
-/// Does nothing when the transaction keeps no backups or surely nothing can be reached there
-/// (pathIsMissing()). Afterwards nothing lies at `path`. Returns 0 or CannotRename (9).
+/// Does nothing if the transaction keeps no backups or nothing at `path` can be reached
+/// (pathIsMissing()), except that a stranger's link is moved wherever it leads. Afterwards the name
+/// is free, or is a link of ours that leads nowhere. Returns 0 or CannotRename (9).
 [[nodiscard]] int backupFile(FileTransaction& transaction, const std::string& path);
 
-/// Copies the file at `path` to its backup name, for a caller that overwrites it next: journals the
-/// backup and then `path` as created. Does not look at the transaction's backup flag.
+/// Copies the file at `path` to its backup name, for a caller that replaces it next: journals the
+/// backup and then `path` as created. The copy has owner, group, mode and attributes of the
+/// original, so that a rollback restores them, and is on the disk. Does not look at the
+/// transaction's backup flag.
 ///
 /// Returns 0 or the code of copyFile(); the backup name is then deleted.
 [[nodiscard]] int backupCopy(FileTransaction& transaction, const std::string& path);
-
-/// Writes `entry` of `archive` to `destination`, whose old content is backed up, and gives it
-/// exactly `mode` unless that is 0. The directory must exist.
-///
-/// Returns 0; CannotOpenForReading (1) when the entry has no stream: nothing was done then; 9 when
-/// the old content cannot be moved; 2; 4; or the code of a failed write (5, 6, 7).
-[[nodiscard]] int extractFile(FileTransaction& transaction, const ZipFile& archive,
-                              const ZipEntry& entry, const std::string& destination, mode_t mode);
 
 /// Copies a file over `destination`, whose old content is backed up. No flow calls it.
 ///
@@ -49,7 +43,10 @@
 
 /// Sets the permission bits of `path`. Returns 0 or CannotChangeMode (13).
 ///
-/// The transaction is part of the interface of all primitives; a rollback does not undo this.
+/// A path that leads through a stranger's link gives 13. A rollback does not undo this.
+[[nodiscard]] int setFileMode(const std::string& path, mode_t mode);
+
+/// The same; the transaction is part of the interface of all primitives.
 [[nodiscard]] int setFileMode(FileTransaction& transaction, const std::string& path, mode_t mode);
 
 /// Creates one directory, with 0777 when `mode` is 0. Returns 0, or -1 with `errno`.

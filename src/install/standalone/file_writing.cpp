@@ -5,6 +5,8 @@
 
 #include <cerrno>
 
+#include <unistd.h>
+
 int writeAll(int fd, const void* data, std::size_t size)
 {
     const auto* rest = static_cast<const char*>(data);
@@ -16,6 +18,13 @@ int writeAll(int fd, const void* data, std::size_t size)
         size -= static_cast<std::size_t>(count);
     }
     return FileOk;
+}
+
+int syncFile(int fd)
+{
+    if (fsync(fd) == 0 || errno == EINVAL || errno == EROFS || errno == ENOTSUP)
+        return 0;
+    return errno;
 }
 
 int closeWritten(ScopedFd& file)

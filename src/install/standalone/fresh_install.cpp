@@ -4,7 +4,9 @@
 #include "environment.h"
 #include "extraction.h"
 #include "file_operations.h"
+#include "file_replacement.h"
 #include "install_log.h"
+#include "interruption.h"
 #include "locations.h"
 #include "paths.h"
 #include "property_file.h"
@@ -20,6 +22,7 @@ namespace {
 
 constexpr mode_t UserCacheDirMode = 0770;
 constexpr mode_t RegistryDirMode = 0755;
+constexpr mode_t NewFileMode = 0666;
 
 int makeSubdirOrSay(FileTransaction& transaction, const std::string& parent,
                     const std::string& name, mode_t mode)
@@ -68,12 +71,18 @@ int customize(const std::string& path, Edit edit)
 int customizeProperties(const std::string& home)
 {
     const std::string config = joinPath(home, spbCfgDir);
-    const int code = customize(joinPath(config, zorProps),
-                               [&](PropertyFile& file) { fillMainProperties(file, home); });
+    const int code = customize(joinPath(config, zorProps), [&](PropertyFile& file) {
+        replaceAll(file, tokenZorDestDir, home);
+        replaceAll(file, tokenZorCfgRoot, home);
+        replaceAll(file, tokenFileSeparator, "/");
+        replaceAll(file, tokenScannerMode, fileScannerMode);
+    });
     if (code != 0)
         return code;
-    return customize(joinPath(config, traceProps),
-                     [&](PropertyFile& file) { fillTraceProperties(file, home); });
+    return customize(joinPath(config, traceProps), [&](PropertyFile& file) {
+        replaceAll(file, tokenZorDestDir, home);
+        replaceAll(file, tokenZorCfgRoot, home);
+    });
 }
 
 /// Completes the exploiter list and saves the registry.
@@ -92,6 +101,22 @@ int registerInstallation(FileTransaction& transaction, InstallRegistry& registry
     return saveRegistry(transaction, registry);
 }
 
+/// Records whether the installation is the shared or a per-user one. Not journalled; a failure is
+/// logged only.
+void writeInstallType(const std::string& home, const std::string* indexPath)
+{
+    const ScopedUmask mask(globalFilesUmask);
+    const std::string path = joinPath(home, joinPath(auxDirInstall, installProps));
+    const std::string& type = localInstall ? valueInstallLocal : valueInstallGlobal;
+    const int code = replaceFile(path, NewFileMode, [&](std::FILE* file) {
+        (void)std::fprintf(file, "%s=%s\n", keyInstallType.c_str(), type.c_str());
+    });
+    if (code == CannotOpenForWriting)
+        *logstream << "Could not create file " << path << '\n';
+    else if (indexPath != nullptr)
+        appendToFileIndex(*indexPath, path);
+}
+
 /// The installation up to its last fatal step.
 int installFiles(FileTransaction& transaction, InstallRegistry& registry,
                  const std::string* indexPath, bool writeRegistry, bool useCustomPath)
@@ -102,13 +127,15 @@ int installFiles(FileTransaction& transaction, InstallRegistry& registry,
     if (extracted != FileOk)
         return extracted;
 
-    int code = createDirectories(transaction, home);
+    int code = isInterrupted() ? RunInterrupted : createDirectories(transaction, home);
     if (code == 0)
-        code = customizeProperties(home);
+        code = isInterrupted() ? RunInterrupted : customizeProperties(home);
     if (code != 0)
         return code;
 
     updateScripts(home, readCommonDirectory(useCustomPath));
+    if (isInterrupted())
+        return RunInterrupted;
     if (writeRegistry)
         code = registerInstallation(transaction, registry);
     if (code == FileOk)
@@ -117,37 +144,6 @@ int installFiles(FileTransaction& transaction, InstallRegistry& registry,
 }
 
 } // namespace
-
-void fillMainProperties(PropertyFile& file, const std::string& home)
-{
-    replaceAll(file, tokenZorDestDir, home);
-    replaceAll(file, tokenZorCfgRoot, home);
-    replaceAll(file, tokenFileSeparator, "/");
-    replaceAll(file, tokenScannerMode, fileScannerMode);
-}
-
-void fillTraceProperties(PropertyFile& file, const std::string& home)
-{
-    replaceAll(file, tokenZorDestDir, home);
-    replaceAll(file, tokenZorCfgRoot, home);
-}
-
-void writeInstallType(const std::string& home, const std::string* indexPath)
-{
-    const ScopedUmask mask(globalFilesUmask);
-    const std::string path = joinPath(home, joinPath(auxDirInstall, installProps));
-    const ScopedFile file(std::fopen(path.c_str(), "w"));
-    const ScopedFile index(indexPath != nullptr ? std::fopen(indexPath->c_str(), "a") : nullptr);
-    if (!file) {
-        *logstream << "Could not create file " << path << '\n';
-        return;
-    }
-
-    const std::string& type = localInstall ? valueInstallLocal : valueInstallGlobal;
-    (void)std::fprintf(file.get(), "%s=%s\n", keyInstallType.c_str(), type.c_str());
-    if (index)
-        (void)std::fprintf(index.get(), "%s\n", path.c_str());
-}
 
 int freshInstall(FileTransaction& transaction, InstallRegistry& registry,
                  const std::string* indexPath, bool writeRegistry, bool useCustomPath,
@@ -163,6 +159,8 @@ int freshInstall(FileTransaction& transaction, InstallRegistry& registry,
         createSingleUserModeFlag(transaction, home, indexPath);
     if (code != 0)
         return code;
+    if (isInterrupted())
+        return RunInterrupted;
 
     // The shared installation has its traces in the common directory; a user's own goes without.
     if (localInstall && !useCustomPath)

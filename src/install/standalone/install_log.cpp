@@ -2,8 +2,10 @@
 
 #include "build_stamp.h"
 #include "file_operations.h"
+#include "file_replacement.h"
 #include "paths.h"
 #include "registry.h"
+#include "safe_path.h"
 #include "scoped.h"
 #include "settings.h"
 #include "text.h"
@@ -12,19 +14,18 @@
 #include <cstdio>
 #include <ostream>
 
-#include <fcntl.h>
-
 namespace {
 
 constexpr const char* SingleUserFlagName = "SingleUserMode";
 constexpr mode_t IndexDirectoryMode = 0755;
 constexpr mode_t IndexFileMode = 0644;
+constexpr mode_t NewFileMode = 0666;
 
 } // namespace
 
 void readFileIndex(const std::string& path, std::set<std::string>& files)
 {
-    const ScopedFile file(std::fopen(path.c_str(), "r"));
+    const ScopedFile file = openForReading(path);
     if (!file)
         return;
     std::string line;
@@ -46,15 +47,15 @@ void addInstallerFiles(const InstallRegistry& registry, std::set<std::string>& f
 
 void writeFileIndex(const std::string& path, const std::set<std::string>& files)
 {
-    const ScopedFile file(std::fopen(path.c_str(), "w"));
-    if (!file)
-        return;
-    (void)std::fprintf(file.get(), "# File created by ZOR: %s installed on %s\n", zorBuildStamp,
-                       localTimeStamp().c_str());
-    for (const std::string& line : files) {
-        (void)std::fwrite(line.data(), 1, line.size(), file.get());
-        (void)std::fputc('\n', file.get());
-    }
+    const auto write = [&](std::FILE* file) {
+        (void)std::fprintf(file, "# File created by ZOR: %s installed on %s\n", zorBuildStamp,
+                           localTimeStamp().c_str());
+        for (const std::string& line : files) {
+            (void)std::fwrite(line.data(), 1, line.size(), file);
+            (void)std::fputc('\n', file);
+        }
+    };
+    (void)replaceFile(path, NewFileMode, write); // a removal without an index knows fewer files
 }
 
 void refreshFileIndex(const InstallRegistry& registry, const std::string& path)
@@ -65,18 +66,23 @@ void refreshFileIndex(const InstallRegistry& registry, const std::string& path)
     writeFileIndex(path, files);
 }
 
+void appendToFileIndex(const std::string& path, const std::string& file)
+{
+    const ScopedFile index = openStream(path, Existing::Append, IndexFileMode);
+    if (index)
+        (void)std::fprintf(index.get(), "%s\n", file.c_str());
+}
+
 void openTransientIndex(FileTransaction& transaction, const std::string& path)
 {
     const ScopedUmask mask(globalFilesUmask);
-    (void)createPath(transaction, path, IndexDirectoryMode); // the open tells
-
-    ScopedFd fd(open(path.c_str(), O_RDWR | O_CREAT | O_TRUNC | O_CLOEXEC, IndexFileMode));
-    zor_file_handle = fd.isOpen() ? fdopen(fd.get(), "w") : nullptr;
+    (void)createPath(transaction, path, IndexDirectoryMode); // if it fails, so does the open
+    zor_file_handle =
+        openStream(path, Existing::TruncateUnlinked, IndexFileMode, O_RDWR).release();
     if (zor_file_handle == nullptr) {
         *logstream << "Warning! Failed to create install log file: " << path << '\n';
         return;
     }
-    (void)fd.release(); // the stream owns it now
     (void)std::fprintf(zor_file_handle, "# File created by ZOR: %s\n", zorBuildStamp);
 }
 
@@ -95,7 +101,7 @@ std::string singleUserFlagPath(const std::string& home)
 
 void detectSingleUserMode(const std::string& home)
 {
-    const ScopedFile flag(std::fopen(singleUserFlagPath(home).c_str(), "r"));
+    const ScopedFile flag = openForReading(singleUserFlagPath(home));
     if (!flag)
         return;
     *logstream << "Single user mode file found\n";
@@ -108,15 +114,13 @@ void createSingleUserModeFlag(FileTransaction& transaction, const std::string& h
     const ScopedUmask mask(globalFilesUmask);
     const std::string path = singleUserFlagPath(home);
     *logstream << "Creating single user mode flag file: " << path << '\n';
-    if (!ScopedFile(std::fopen(path.c_str(), "w"))) {
+    if (!openStream(path, Existing::Truncate, NewFileMode)) {
         *logstream << "Unable to create single user mode flag file\n";
         return;
     }
     if (indexPath == nullptr)
         return;
 
-    (void)createPath(transaction, *indexPath, IndexDirectoryMode); // the open tells
-    const ScopedFile index(std::fopen(indexPath->c_str(), "a"));
-    if (index)
-        (void)std::fprintf(index.get(), "%s\n", path.c_str());
+    (void)createPath(transaction, *indexPath, IndexDirectoryMode); // if it fails, so does the open
+    appendToFileIndex(*indexPath, path);
 }

@@ -24,6 +24,10 @@ void addInstallerFiles(const InstallRegistry& registry, std::set<std::string>& f
 /// Writes the index at `path` anew. A file that cannot be opened is not written.
 void writeFileIndex(const std::string& path, const std::set<std::string>& files);
 
+/// Adds the path `file` to the end of the index at `path`, created if missing. An index that cannot
+/// be opened stays as it is.
+void appendToFileIndex(const std::string& path, const std::string& file);
+
 /// Rewrites the index at `path` with the installer's own files added and a new time.
 void refreshFileIndex(const InstallRegistry& registry, const std::string& path);
 

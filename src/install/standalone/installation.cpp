@@ -1,15 +1,61 @@
 #include "installation.h"
 
+#include "common_directory.h"
+#include "durability.h"
 #include "file_operations.h"
 #include "fresh_install.h"
+#include "interruption.h"
+#include "locations.h"
+#include "registry.h"
 #include "settings.h"
 #include "upgrade.h"
 
+#include <optional>
 #include <ostream>
+#include <vector>
 
 namespace {
 
 constexpr mode_t IndexMode = 0644;
+
+/// Syncs what the run wrote: after `deployment`, whole file systems.
+int makeDurable(const FileTransaction& transaction, const FileSystemSync* deployment)
+{
+    const int code = deployment != nullptr ? deployment->sync() : syncDirectories(transaction);
+    if (code != FileOk)
+        *logstream << "*** Error: could not write the installation to disk. Error = " << code
+                   << '\n';
+    return code;
+}
+
+/// The directories that a deployment into `home` writes to.
+std::vector<std::string> writtenDirectories(const std::string& home, bool useCustomPath,
+                                            const std::string& customPath)
+{
+    std::vector<std::string> directories = {home, registryDirectory(localInstall)};
+    if (useCustomPath)
+        directories.push_back(customPath);
+    else if (!localInstall)
+        directories.insert(directories.end(),
+                           {readCommonDirectory(true), commonDirectorySetting()});
+    return directories;
+}
+
+/// Runs the fresh installation or the upgrade, which a signal can stop until all its steps are made.
+int runProcedure(bool upgrade, FileTransaction& transaction, InstallRegistry& registry,
+                 InstallRegistry& request, const std::string& indexPath, bool flag,
+                 bool useCustomPath, const std::string& customPath)
+{
+    const ScopedInterruptible interruptible;
+    if (isInterrupted())
+        return RunInterrupted;
+    const int code =
+        upgrade ? upgradeInstall(transaction, registry, request, &indexPath, flag, useCustomPath,
+                                 customPath)
+                : freshInstall(transaction, request, &indexPath, flag, useCustomPath, customPath);
+    (void)setFileMode(indexPath, IndexMode); // also of a failed run; may be absent
+    return code == FileOk && isInterrupted() ? RunInterrupted : code;
+}
 
 } // namespace
 
@@ -17,11 +63,15 @@ int installWithTransaction(bool upgrade, FileTransaction& transaction, InstallRe
                            InstallRegistry& request, const std::string& indexPath, bool flag,
                            bool useCustomPath, const std::string& customPath)
 {
-    const int code =
-        upgrade ? upgradeInstall(transaction, registry, request, &indexPath, flag, useCustomPath,
-                                 customPath)
-                : freshInstall(transaction, request, &indexPath, flag, useCustomPath, customPath);
-    (void)setFileMode(transaction, indexPath, IndexMode); // also of a failed run; may be absent
+    std::optional<FileSystemSync> deployment;
+    if (!upgrade || isUpgradeNeeded(registry, request))
+        deployment.emplace(writtenDirectories(
+            upgrade ? registry.homeDirectory : request.homeDirectory, useCustomPath, customPath));
+
+    int code = runProcedure(upgrade, transaction, registry, request, indexPath, flag, useCustomPath,
+                            customPath);
+    if (code == FileOk)
+        code = makeDurable(transaction, deployment ? &*deployment : nullptr);
 
     if (code == 0) {
         *logstream << "Installation successful, committing changes\n";
@@ -29,6 +79,8 @@ int installWithTransaction(bool upgrade, FileTransaction& transaction, InstallRe
     } else if (!norollback) {
         *logstream << "Installation failed, rolling back\n";
         (void)rollback(transaction); // always 0
+        if (deployment)
+            (void)deployment->sync(); // the old state is back, on the disk or not
     } else {
         *logstream << "Installation failed\n";
     }

@@ -1,4 +1,4 @@
-// Paths as texts: joining them, the name of a backup, the test for existence.
+// Paths as texts: joining them, the name of a backup.
 #pragma once
 
 #include <string>
@@ -18,12 +18,3 @@ inline constexpr std::string_view BackupSuffix = ".bak";
 
 /// `path` followed by BackupSuffix.
 [[nodiscard]] std::string backupName(const std::string& path);
-
-/// True when something exists at `path`, links followed: a dangling link does not.
-[[nodiscard]] bool pathExists(const std::string& path);
-
-/// True when surely nothing can be reached at `path`, links followed: there is nothing, or the way
-/// to it must not be searched, so that nothing there could be moved or opened either. A path that
-/// cannot be looked at for another reason, on a failing disk say, is not missing: what lies there
-/// must be kept.
-[[nodiscard]] bool pathIsMissing(const std::string& path);

@@ -2,6 +2,7 @@
 
 #include "locations.h"
 #include "paths.h"
+#include "safe_path.h"
 #include "scoped.h"
 #include "settings.h"
 #include "tree_removal.h"
@@ -10,27 +11,25 @@
 #include <string>
 #include <vector>
 
-#include <sys/stat.h>
-
 namespace {
 
-struct Row {
+struct Permission {
     std::string base;
     std::string relativePath;
     mode_t mode;
     std::string scope; ///< "all", or the install type that it is for
 };
 
-std::vector<Row> rowsOf(const Discovery& found)
+std::vector<Permission> permissionTable(const Discovery& found)
 {
     const std::string& home = found.currentZorHome;
     const std::string& cfg = found.currentCfgHome;
     const std::string reg = registryDirectory(localInstall);
 
-    std::vector<Row> table;
+    std::vector<Permission> table;
     if (!found.homeExists || (applySingleUserMode && !localInstall))
         table.push_back({home, "", 0755, "all"});
-    const Row fixed[] = {
+    const Permission fixed[] = {
         {cfg, "cache_data", CacheDirRootMode, "global"},
         {cfg, "cache_data", 0770, "local"},
         {cfg, "config", 0755, "all"},
@@ -61,22 +60,14 @@ std::vector<Row> rowsOf(const Discovery& found)
 
 void apply(const Permission& permission)
 {
-    const std::string& path = permission.path;
-    if (pathExists(path) && chmod(path.c_str(), permission.mode) != 0)
+    if (permission.scope != installTypeName(localInstall) && permission.scope != "all")
+        return;
+    const std::string path = joinPath(permission.base, permission.relativePath);
+    if (changeMode(path, permission.mode) == ModeChange::Failed)
         *logstream << "Unable to change permissions to '" << path << "' file/directory\n";
 }
 
 } // namespace
-
-std::vector<Permission> permissionTable(const Discovery& found)
-{
-    std::vector<Permission> table;
-    for (const Row& row : rowsOf(found)) {
-        if (row.scope == installTypeName(localInstall) || row.scope == "all")
-            table.push_back({joinPath(row.base, row.relativePath), row.mode});
-    }
-    return table;
-}
 
 void applyPermissions(FileTransaction& transaction, const Discovery& found)
 {

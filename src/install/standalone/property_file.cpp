@@ -1,5 +1,8 @@
 #include "property_file.h"
 
+#include "file_codes.h"
+#include "file_replacement.h"
+#include "safe_path.h"
 #include "scoped.h"
 #include "settings.h"
 #include "text.h"
@@ -10,6 +13,8 @@
 #include <iostream>
 
 namespace {
+
+constexpr mode_t NewFileMode = 0666;
 
 void logFailure(const char* doing, const std::string& path, int error)
 {
@@ -23,7 +28,7 @@ bool contains(const std::string& text, const std::string& fragment)
 
 int readLines(const std::string& path, std::vector<std::string>& lines)
 {
-    const ScopedFile file(std::fopen(path.c_str(), "r"));
+    const ScopedFile file = openForReading(path);
     if (!file)
         return errno;
     std::string line;
@@ -50,18 +55,17 @@ int PropertyFile::load(const std::string& path)
 
 int PropertyFile::save(const std::string& path) const
 {
-    const ScopedFile file(std::fopen(path.c_str(), "w"));
-    if (!file) {
-        const int error = errno;
-        logFailure("Saving file ", path, error);
-        return error;
-    }
-    for (const std::string& line : lines) {
-        (void)std::fwrite(line.data(), 1, line.size(), file.get());
-        (void)std::fputc('\n', file.get());
-        (void)std::fflush(file.get());
-    }
-    return 0;
+    const int code = replaceFile(path, NewFileMode, [this](std::FILE* file) {
+        for (const std::string& line : lines) {
+            (void)std::fwrite(line.data(), 1, line.size(), file);
+            (void)std::fputc('\n', file);
+        }
+    });
+    if (code != CannotOpenForWriting)
+        return 0;
+    const int error = errno;
+    logFailure("Saving file ", path, error);
+    return error;
 }
 
 std::string PropertyFile::getValue(const std::string& key) const

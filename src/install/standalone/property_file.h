@@ -17,10 +17,10 @@ struct PropertyFile {
     /// with a line about it on `logstream`; no lines are held then. A directory loads as no lines.
     [[nodiscard]] int load(const std::string& path);
 
-    /// Writes the lines to the file at `path`, each with a newline. Returns 0, or the `errno` of
-    /// the failed open, with a line about it on `logstream`.
+    /// Replaces the file at `path` by the lines, each with a newline (replaceFile()). Returns 0, or
+    /// the `errno` of the failed open, with a line about it on `logstream`.
     ///
-    /// Deliberate: a failing write is not detected.
+    /// Deliberate: a failing write is not reported. The file then keeps its old content.
     [[nodiscard]] int save(const std::string& path) const;
 
     /// The value of the first line with "=" whose key is `key`; empty when there is none.

@@ -2,9 +2,10 @@
 
 #include "file_codes.h"
 #include "file_operations.h"
+#include "file_replacement.h"
 #include "locations.h"
 #include "paths.h"
-#include "scoped.h"
+#include "safe_path.h"
 #include "settings.h"
 #include "text.h"
 
@@ -18,6 +19,8 @@ const std::string KeyExploiters = "ZOR_Exploiters";
 const std::string KeyConfigRootDirectory = "ZOR_ConfigRootDirectory";
 
 namespace {
+
+constexpr mode_t RegistryFileMode = 0666;
 
 /// Which of the required keys have been met.
 struct SeenKeys {
@@ -66,7 +69,7 @@ std::string registryText(const InstallRegistry& registry)
 
 int parseRegistry(const std::string& path, InstallRegistry* registry)
 {
-    const ScopedFile file(std::fopen(path.c_str(), "r"));
+    const ScopedFile file = openForReading(path);
     if (!file)
         return RegistryCannotOpen;
 
@@ -102,16 +105,15 @@ int writeRegistry(FileTransaction& transaction, const std::string& path,
             return code;
     }
 
-    ScopedFile file(std::fopen(path.c_str(), "w"));
-    if (!file)
-        return CannotOpenForWriting;
+    const std::string text = registryText(registry);
+    const int code = replaceFile(path, RegistryFileMode, [&](std::FILE* file) {
+        (void)std::fwrite(text.data(), 1, text.size(), file);
+    });
+    if (code == CannotOpenForWriting)
+        return code;
     if (!keepsBackup)
         record(transaction, Created, path);
-
-    const std::string text = registryText(registry);
-    const bool written = std::fwrite(text.data(), 1, text.size(), file.get()) == text.size();
-    const bool closed = std::fclose(file.release()) == 0;
-    return written && closed ? FileOk : CannotWrite;
+    return code == FileOk ? FileOk : CannotWrite;
 }
 
 int saveRegistry(FileTransaction& transaction, const InstallRegistry& registry)

@@ -46,8 +46,9 @@ enum RegistryCode : int {
 /// Writes the whole registry file at `path`, journalled; an existing file is copied to its backup
 /// name first when the transaction keeps backups.
 ///
-/// Returns 0, CannotOpenForWriting (2), CannotWrite (5) whatever the reason, or the code of
-/// backupCopy(): nothing is written then. A file that was partly written is the rollback's.
+/// Whoever reads it meanwhile finds the old or the new registry (replaceFile()). Returns 0,
+/// CannotOpenForWriting (2), CannotWrite (5) whatever the reason, or the code of backupCopy(); in
+/// each of these cases the old registry is still there.
 [[nodiscard]] int writeRegistry(FileTransaction& transaction, const std::string& path,
                                 const InstallRegistry& registry);
 

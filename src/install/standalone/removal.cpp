@@ -4,21 +4,20 @@
 #include "environment.h"
 #include "exploiters.h"
 #include "file_operations.h"
+#include "file_replacement.h"
 #include "install_log.h"
 #include "locations.h"
 #include "paths.h"
 #include "registry.h"
 #include "scanner_control.h"
+#include "safe_path.h"
 #include "scoped.h"
 #include "settings.h"
 #include "tree_removal.h"
 
 #include <cstdio>
 #include <cstring>
-#include <iterator>
 #include <ostream>
-
-#include <unistd.h>
 
 namespace {
 
@@ -36,76 +35,94 @@ struct ClientDirs {
     std::string catalogueC = joinPath(catalogues, "C");
 };
 
-/// The steps for the directories of the scanners, in "bin/etc", and for that directory.
-void addScannerDirs(std::vector<RemovalStep>& steps)
+/// Removes directories of one installation, deeper ones first by the order of the calls.
+class DirectoryRemoval {
+public:
+    DirectoryRemoval(FileTransaction& transaction, const std::string& home)
+        : transaction_(transaction), home_(home)
+    {
+    }
+
+    /// The files directly in it, then the directory if that leaves it empty.
+    void withFiles(const std::string& sub) const
+    {
+        (void)removeDir(transaction_, home_, sub, false);
+    }
+
+    void withEverything(const std::string& sub) const
+    {
+        (void)removeDir(transaction_, home_, sub, true);
+    }
+
+    void ifEmpty(const std::string& sub) const
+    {
+        (void)removeDirectory(joinPathOptional(home_, sub)); // stays otherwise
+    }
+
+private:
+    FileTransaction& transaction_;
+    const std::string& home_;
+};
+
+void removeScannerDirs(const DirectoryRemoval& remove)
 {
     const std::string binEtc = joinPath(spbBinDir, etcDir);
     for (const char* const name : ScannerDirs)
-        steps.push_back({WithFiles, joinPath(binEtc, name)});
-    steps.push_back({WithFiles, binEtc});
+        remove.withFiles(joinPath(binEtc, name));
+    remove.withFiles(binEtc);
 }
 
 /// After the listed files: what is left of the directories.
-std::vector<RemovalStep> leftovers()
+void removeLeftovers(const DirectoryRemoval& remove)
 {
     const ClientDirs dirs;
-    std::vector<RemovalStep> steps = {
-        {WithFiles, UninstallFileName}, {IfEmpty, dirs.platformBin},  {IfEmpty, dirs.platformLib},
-        {IfEmpty, dirs.catalogueC},     {WithFiles, dirs.catalogues}, {WithFiles, dirs.platform},
-        {WithFiles, dirs.client},       {WithFiles, auxDirInstall},
-    };
-    addScannerDirs(steps);
-    const RemovalStep rest[] = {
-        {IfEmpty, joinPath(spbBinDir, spbBinPluginsDir)},
-        {IfEmpty, joinPath(spbBinDir, spbBinCustomScannersDir)},
-        {IfEmpty, spbBinDir},
-        {WithEverything, spbPropertiesDir},
-        {WithEverything, spbCfgDir},
-        {WithFiles, logDir},
-        {WithEverything, cacheDir},
-        {IfEmpty, ""},
-    };
-    steps.insert(steps.end(), std::begin(rest), std::end(rest));
-    return steps;
+    remove.withFiles(UninstallFileName);
+    remove.ifEmpty(dirs.platformBin);
+    remove.ifEmpty(dirs.platformLib);
+    remove.ifEmpty(dirs.catalogueC);
+    remove.withFiles(dirs.catalogues);
+    remove.withFiles(dirs.platform);
+    remove.withFiles(dirs.client);
+    remove.withFiles(auxDirInstall);
+    removeScannerDirs(remove);
+    remove.ifEmpty(joinPath(spbBinDir, spbBinPluginsDir));
+    remove.ifEmpty(joinPath(spbBinDir, spbBinCustomScannersDir));
+    remove.ifEmpty(spbBinDir);
+    remove.withEverything(spbPropertiesDir);
+    remove.withEverything(spbCfgDir);
+    remove.withFiles(logDir);
+    remove.withEverything(cacheDir);
+    remove.ifEmpty("");
 }
 
 /// Without a list of files: everything at its known place.
-std::vector<RemovalStep> knownPlaces()
+void removeKnownPlaces(const DirectoryRemoval& remove)
 {
     const ClientDirs dirs;
-    std::vector<RemovalStep> steps = {
-        {WithFiles, UninstallFileName}, {WithFiles, dirs.platformBin},
-        {WithFiles, dirs.platformLib},  {WithFiles, dirs.catalogueC},
-        {WithFiles, dirs.catalogues},   {WithFiles, dirs.platform},
-        {WithFiles, dirs.client},       {WithFiles, auxDirInstall},
-    };
-    addScannerDirs(steps);
-    const RemovalStep rest[] = {
-        {WithFiles, joinPath(spbBinDir, spbBinPluginsDir)},
-        {WithFiles, joinPath(spbBinDir, spbBinCustomScannersDir)},
-        {WithFiles, spbBinDir},
-        {WithEverything, spbPropertiesDir},
-        {WithFiles, joinPath(spbCfgDir, spbCfgXssDir)},
-        {WithEverything, spbCfgDir},
-        {WithFiles, logDir},
-        {WithEverything, cacheDir},
-        {WithFiles, ""},
-    };
-    steps.insert(steps.end(), std::begin(rest), std::end(rest));
-    return steps;
-}
-
-void perform(FileTransaction& transaction, const std::string& home, const RemovalStep& step)
-{
-    if (step.kind == IfEmpty)
-        (void)removeDirectory(joinPathOptional(home, step.path)); // stays otherwise
-    else
-        (void)removeDir(transaction, home, step.path, step.kind == WithEverything);
+    remove.withFiles(UninstallFileName);
+    remove.withFiles(dirs.platformBin);
+    remove.withFiles(dirs.platformLib);
+    remove.withFiles(dirs.catalogueC);
+    remove.withFiles(dirs.catalogues);
+    remove.withFiles(dirs.platform);
+    remove.withFiles(dirs.client);
+    remove.withFiles(auxDirInstall);
+    removeScannerDirs(remove);
+    remove.withFiles(joinPath(spbBinDir, spbBinPluginsDir));
+    remove.withFiles(joinPath(spbBinDir, spbBinCustomScannersDir));
+    remove.withFiles(spbBinDir);
+    remove.withEverything(spbPropertiesDir);
+    remove.withFiles(joinPath(spbCfgDir, spbCfgXssDir));
+    remove.withEverything(spbCfgDir);
+    remove.withFiles(logDir);
+    remove.withEverything(cacheDir);
+    remove.withFiles("");
 }
 
 void removeCommonLogDir(FileTransaction& transaction)
 {
     const std::string common = readCommonDirectory(true);
+    deleteTemporaryFile(commonDirectorySetting());
     (void)removeDir(transaction, common, joinPath(zorCommonDir, logDir), false);
     (void)removeDir(transaction, common, zorCommonDir, false);
 }
@@ -114,6 +131,7 @@ void removeRegistry()
 {
     const std::string directory = registryDirectory(localInstall);
     (void)deleteFile(registryPath(localInstall));
+    deleteTemporaryFile(registryPath(localInstall));
     (void)removeDirectory(directory);             // stays while it holds other files
     *logstream << "RMDIR: " << directory << '\n'; // Deliberate: also when it stays
 }
@@ -130,11 +148,15 @@ int removeToolkit(FileTransaction& transaction, const InstallRegistry& registry,
         return stopped;
     }
 
-    if (logPath != nullptr)
+    if (logPath != nullptr) {
         refreshFileIndex(registry, *logPath);
-    const bool listed = removeListedFiles(logPath);
-    for (const RemovalStep& step : removalSteps(listed))
-        perform(transaction, home, step);
+        deleteTemporaryFile(*logPath); // of a run that was killed
+    }
+    const DirectoryRemoval remove(transaction, home);
+    if (removeListedFiles(logPath))
+        removeLeftovers(remove);
+    else
+        removeKnownPlaces(remove);
 
     if (!localInstall)
         removeCommonLogDir(transaction);
@@ -143,11 +165,6 @@ int removeToolkit(FileTransaction& transaction, const InstallRegistry& registry,
 }
 
 } // namespace
-
-std::vector<RemovalStep> removalSteps(bool listed)
-{
-    return listed ? leftovers() : knownPlaces();
-}
 
 int removeInstallation(FileTransaction& transaction, InstallRegistry& registry,
                        const InstallRegistry& request, const std::string* logPath)
@@ -171,10 +188,11 @@ bool removeListedFiles(const std::string* logPath)
 {
     if (logPath == nullptr)
         return false;
-    const ScopedFile index(std::fopen(logPath->c_str(), "r"));
+    const ScopedFile index = openForReading(*logPath);
     if (!index)
         return false;
 
+    const ScopedDirectoryReuse reuse;
     bool anyListed = false;
     char line[1024];
     while (std::fgets(line, sizeof line, index.get()) != nullptr) {
@@ -182,10 +200,10 @@ bool removeListedFiles(const std::string* logPath)
             continue;
         line[std::strcspn(line, "\n")] = '\0';
         *logstream << "RM FILE: " << line << '\n';
-        (void)unlink(line); // best effort
+        (void)unlinkPath(line); // best effort
         anyListed = true;
     }
     if (anyListed)
-        (void)unlink(logPath->c_str()); // best effort
+        (void)unlinkPath(*logPath); // best effort
     return anyListed;
 }

@@ -1,6 +1,7 @@
 #include "scanner_control.h"
 
 #include "environment.h"
+#include "interruption.h"
 #include "paths.h"
 #include "settings.h"
 
@@ -36,6 +37,8 @@ int stopScanners(const std::string& home, bool disable, bool stopFileScanner)
     for (const Step& step : steps) {
         if (!step.wanted)
             continue;
+        if (isInterrupted())
+            break; // what was stopped is enabled again by the caller
         const int status = runControl(home, step.program, step.arguments);
         if (!ignoreUpdateErrors && !isAcceptable(status))
             return ScannersNotStopped;

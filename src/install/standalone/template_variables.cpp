@@ -2,6 +2,7 @@
 
 #include "paths.h"
 #include "property_file.h"
+#include "safe_path.h"
 #include "settings.h"
 
 #include <ostream>
@@ -15,13 +16,6 @@ const std::string tokenScannerMode = "$(fscanner_mode)";
 int replaceAll(PropertyFile& file, const std::string& placeholder, const std::string& value)
 {
     return file.replaceText(placeholder, value);
-}
-
-void fillScript(PropertyFile& script, const std::string& home, const std::string& common)
-{
-    replaceAll(script, tokenZorDestDir, home);
-    replaceAll(script, tokenZorCfgRoot, home); // not the configuration root of the registry
-    replaceAll(script, tokenCorvanCommonDir, common);
 }
 
 int updateScript(const std::string& fileName, const std::string& home, const std::string& common)
@@ -39,7 +33,9 @@ int updateScript(const std::string& fileName, const std::string& home, const std
     if (loaded != 0)
         return loaded;
 
-    fillScript(script, home, common);
+    replaceAll(script, tokenZorDestDir, home);
+    replaceAll(script, tokenZorCfgRoot, home); // not the configuration root of the registry
+    replaceAll(script, tokenCorvanCommonDir, common);
 
     const int saved = script.save(path);
     if (saved != 0)
@@ -49,6 +45,6 @@ int updateScript(const std::string& fileName, const std::string& home, const std
 
 void updateScripts(const std::string& home, const std::string& common)
 {
-    for (const char* const name : ScriptNames)
-        (void)updateScript(name, home, common);
+    (void)updateScript("trawlcfg.sh", home, common);
+    (void)updateScript("rmdirs.sh", home, common);
 }

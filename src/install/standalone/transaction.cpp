@@ -2,13 +2,12 @@
 
 #include "file_codes.h"
 #include "paths.h"
+#include "safe_path.h"
 #include "scoped.h"
 #include "text.h"
 
 #include <algorithm>
 #include <cstdio>
-
-#include <unistd.h>
 
 namespace {
 
@@ -41,18 +40,25 @@ int kindOf(char letter)
     }
 }
 
+/// Renames the backup of `path` back. What cannot be renamed stays where it is.
+void restoreBackup(const std::string& path)
+{
+    Place place;
+    if (findPlace(path, LastLink::Keep, place) == 0)
+        (void)renameat(place.fd(), backupName(place.name).c_str(), place.fd(), place.name.c_str());
+}
+
 void undo(const JournalEntry& entry)
 {
-    const char* const path = entry.path.c_str();
     switch (entry.kind) {
     case BackedUp:
-        (void)std::rename(backupName(entry.path).c_str(), path); // left where it is otherwise
+        restoreBackup(entry.path);
         break;
     case Created:
-        (void)unlink(path);
+        (void)unlinkPath(entry.path);
         break;
     case DirectoryCreated:
-        (void)rmdir(path); // stays while it holds what no entry recorded
+        (void)removeDirectoryPath(entry.path); // stays while it holds what no entry recorded
         break;
     default:
         break;
@@ -68,10 +74,11 @@ void record(FileTransaction& transaction, int kind, const std::string& path)
 
 int commit(FileTransaction& transaction)
 {
+    const ScopedDirectoryReuse reuse;
     const auto& journal = transaction.journal;
     for (auto entry = journal.rbegin(); entry != journal.rend(); ++entry) {
         if (entry->kind == BackedUp)
-            (void)unlink(backupName(entry->path).c_str()); // left where it is otherwise
+            (void)unlinkPath(backupName(entry->path)); // left where it is otherwise
     }
     transaction.journal.clear();
     return FileOk;
@@ -79,6 +86,7 @@ int commit(FileTransaction& transaction)
 
 int rollback(FileTransaction& transaction)
 {
+    const ScopedDirectoryReuse reuse;
     const auto& journal = transaction.journal;
     std::for_each(journal.rbegin(), journal.rend(), undo);
     transaction.journal.clear();
@@ -87,7 +95,7 @@ int rollback(FileTransaction& transaction)
 
 int saveJournal(const FileTransaction& transaction, const std::string& path)
 {
-    const ScopedFile file(std::fopen(path.c_str(), "w"));
+    const ScopedFile file = openStream(path, Existing::Truncate, 0666);
     if (!file)
         return CannotOpenForWriting;
     for (const JournalEntry& entry : transaction.journal)
@@ -98,7 +106,7 @@ int saveJournal(const FileTransaction& transaction, const std::string& path)
 int loadJournal(FileTransaction& transaction, const std::string& path)
 {
     transaction.journal.clear();
-    const ScopedFile file(std::fopen(path.c_str(), "r"));
+    const ScopedFile file = openForReading(path);
     if (!file)
         return CannotOpenForReading;
 

@@ -1,38 +1,209 @@
 #include "tree_removal.h"
 
-#include "file_operations.h"
 #include "paths.h"
+#include "safe_path.h"
 #include "scoped.h"
 #include "settings.h"
 
+#include <climits>
+#include <cstddef>
 #include <cstdio>
+#include <cstring>
 #include <ostream>
 #include <string_view>
+#include <utility>
+#include <vector>
 
+#include <dirent.h>
+#include <fcntl.h>
 #include <sys/stat.h>
+#include <unistd.h>
 
 namespace {
+
+constexpr int DirectoryFlags = O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_NONBLOCK | O_CLOEXEC;
 
 bool isDotName(std::string_view name)
 {
     return name == "." || name == "..";
 }
 
-/// Deletes what the directory `path` lists as `name`; see removeTree(). Returns the result so far,
-/// `result`, as this thing changes it.
-bool removeChild(const std::string& path, const char* name, bool recurse, bool keepDirs,
-                 bool result)
+/// The names in the directory `fd`, in the order in which the system returns them, each ended by a
+/// NUL. A failure ends the list.
+std::string namesIn(int fd)
 {
-    const std::string child = joinPath(path, name);
-    struct stat status = {};
-    if (lstat(child.c_str(), &status) != 0)
-        return false; // "." tells too: in a directory that may be listed but not searched
-    if (!S_ISDIR(status.st_mode))
-        return deleteFile(child) == 0 && result;
-    if (!recurse || isDotName(name))
-        return result;
-    // Deliberate: a later success hides an earlier failure.
-    return removeTree(child, true, keepDirs) || result;
+    static char block[std::size_t{32} * 1024];
+    std::string names;
+    for (;;) {
+        const ssize_t size = getdents64(fd, block, sizeof block);
+        if (size <= 0)
+            return names;
+        for (ssize_t at = 0; at < size;) {
+            // The kernel aligns its records, but the block is only an array of characters.
+            dirent64 entry; // NOLINT(cppcoreguidelines-pro-type-member-init)
+            std::memcpy(&entry.d_reclen, block + at + offsetof(dirent64, d_reclen),
+                        sizeof entry.d_reclen);
+            names += block + at + offsetof(dirent64, d_name);
+            names += '\0';
+            at += entry.d_reclen;
+        }
+    }
+}
+
+/// Deletes a tree. It goes down and up by descriptors, never by paths, so that nothing that is
+/// swapped or moved meanwhile leads it elsewhere. It holds two descriptors and no stack, however
+/// deep the tree is.
+class TreeRemoval {
+public:
+    TreeRemoval(bool recurse, bool keepDirs) : recurse_(recurse), keepDirs_(keepDirs) {}
+
+    /// Deletes the content of the directory `root`, whose path is `path`, and all below it. Returns
+    /// the result of the root's level; the root itself stays.
+    bool run(ScopedFd root, const std::string& path)
+    {
+        root_ = std::move(root);
+        path_ = path;
+        enter(ScopedFd(fcntl(root_.get(), F_DUPFD_CLOEXEC, 0)), "");
+        for (;;) {
+            Level& level = levels_.back();
+            if (level.next < level.names.size())
+                removeNext(level);
+            else if (levels_.size() > 1)
+                leave();
+            else
+                return level.result;
+        }
+    }
+
+private:
+    /// One directory on the way down.
+    struct Level {
+        std::string name; ///< in the level above
+        dev_t device;
+        ino_t inode;
+        std::size_t pathSize; ///< of the directory's own path
+        std::string names;    ///< what it held when it was entered; see namesIn()
+        std::size_t next = 0; ///< where the next name begins
+        bool result = true;
+    };
+
+    void enter(ScopedFd directory, const std::string& name)
+    {
+        struct stat status = {};
+        (void)fstat(directory.get(), &status); // if it fails, the way up will not match
+        current_ = std::move(directory);
+        levels_.push_back({name, status.st_dev, status.st_ino, path_.size(),
+                           namesIn(current_.get())});
+    }
+
+    void removeNext(Level& level)
+    {
+        const std::string name = level.names.c_str() + level.next;
+        level.next += name.size() + 1;
+        if (!endsWithSlash(path_))
+            path_ += '/';
+        path_ += name;
+        if (!removeChild(level, name))
+            path_.resize(level.pathSize);
+    }
+
+    /// Deletes the child `name`, whose path is `path_`. Returns true if it is a directory that was
+    /// entered instead.
+    bool removeChild(Level& level, const std::string& name)
+    {
+        struct stat status = {};
+        // A path that the system would not take counts as one that cannot be looked at. In a
+        // directory that may be listed but not searched, "." cannot be looked at either.
+        if (path_.size() >= PATH_MAX ||
+            fstatat(current_.get(), name.c_str(), &status, AT_SYMLINK_NOFOLLOW) != 0) {
+            level.result = false;
+            return false;
+        }
+        if (!S_ISDIR(status.st_mode)) {
+            *logstream << "DEL: " << path_ << '\n';
+            if (unlinkat(current_.get(), name.c_str(), 0) != 0)
+                level.result = false;
+            return false;
+        }
+        if (!recurse_ || isDotName(name))
+            return false;
+        ScopedFd child(openat(current_.get(), name.c_str(), DirectoryFlags));
+        if (!child.isOpen())
+            return false; // its failure is hidden; see finishLevel()
+        enter(std::move(child), name);
+        return true;
+    }
+
+    /// Goes back up from the deepest level and removes its directory.
+    void leave()
+    {
+        const Level child = std::move(levels_.back());
+        levels_.pop_back();
+        const bool isBack = goUp();
+        bool result = child.result;
+        if (!keepDirs_) {
+            const bool isRemoved =
+                isBack && unlinkat(current_.get(), child.name.c_str(), AT_REMOVEDIR) == 0;
+            if (isRemoved)
+                *logstream << "RMDIR: " << path_ << '\n';
+            result = isRemoved && result;
+        }
+        // Deliberate: a later success hides an earlier failure.
+        Level& level = levels_.back();
+        level.result = result || level.result;
+        path_.resize(level.pathSize);
+    }
+
+    /// Makes `current_` the directory of the last level. Returns false if that has been moved away
+    /// or replaced: what is left of the level, and of those above it, is then given up as far as it
+    /// cannot be found again.
+    bool goUp()
+    {
+        if (isLevel(levels_.back(), ScopedFd(openat(current_.get(), "..", DirectoryFlags))))
+            return true;
+        if (descendAgain())
+            return true;
+        levels_.back().next = levels_.back().names.size();
+        return false;
+    }
+
+    /// Takes `directory` as `current_` if it is that of `level`.
+    bool isLevel(const Level& level, ScopedFd directory)
+    {
+        struct stat status = {};
+        if (!directory.isOpen() || fstat(directory.get(), &status) != 0 ||
+            status.st_dev != level.device || status.st_ino != level.inode)
+            return false;
+        current_ = std::move(directory);
+        return true;
+    }
+
+    /// Finds the directory of the last level from the root, by the names on the way down.
+    bool descendAgain()
+    {
+        ScopedFd at(openat(root_.get(), ".", DirectoryFlags));
+        for (std::size_t depth = 1; depth < levels_.size() && at.isOpen(); ++depth) {
+            ScopedFd below(openat(at.get(), levels_[depth].name.c_str(), DirectoryFlags));
+            at = std::move(below);
+        }
+        return isLevel(levels_.back(), std::move(at));
+    }
+
+    bool recurse_;
+    bool keepDirs_;
+    ScopedFd root_{-1};
+    ScopedFd current_{-1}; ///< the directory of the last level
+    std::string path_;     ///< of what is being deleted, for messages
+    std::vector<Level> levels_;
+};
+
+/// Opens the directory at `place` or, through a link of ours, the one that `path` leads to.
+ScopedFd openDirectory(const Place& place, const std::string& path)
+{
+    // Without trailing slashes, which would make the system follow a link.
+    const std::string name = place.name.substr(0, place.name.find_last_not_of('/') + 1);
+    ScopedFd directory(openat(place.fd(), name.c_str(), DirectoryFlags));
+    return directory.isOpen() ? std::move(directory) : openPath(path, O_RDONLY | O_DIRECTORY);
 }
 
 } // namespace
@@ -40,24 +211,23 @@ bool removeChild(const std::string& path, const char* name, bool recurse, bool k
 int deleteFile(const std::string& path)
 {
     *logstream << "DEL: " << path << '\n';
-    return std::remove(path.c_str());
+    return removePath(path);
 }
 
-// Recursion: each level makes the path longer, and the system takes no path beyond PATH_MAX.
 bool removeTree(const std::string& path, bool recurse, bool keepDirs)
 {
-    ScopedDir dir(opendir(path.c_str()));
-    if (!dir)
+    Place place;
+    if (findPlace(path, LastLink::Keep, place) != 0)
+        return false;
+    ScopedFd directory = openDirectory(place, path);
+    if (!directory.isOpen())
         return false;
 
-    bool result = true;
-    while (const dirent* entry = readdir(dir.get()))
-        result = removeChild(path, entry->d_name, recurse, keepDirs, result);
-    dir.reset();
+    const bool result = TreeRemoval(recurse, keepDirs).run(std::move(directory), path);
     if (keepDirs)
         return result;
 
-    if (removeDirectory(path) != 0)
+    if (unlinkat(place.fd(), place.name.c_str(), AT_REMOVEDIR) != 0)
         return false;
     *logstream << "RMDIR: " << path << '\n';
     return result;

@@ -6,9 +6,11 @@
 #include "extraction.h"
 #include "file_codes.h"
 #include "install_log.h"
+#include "interruption.h"
 #include "paths.h"
 #include "property_file.h"
 #include "registry.h"
+#include "safe_path.h"
 #include "scanner_control.h"
 #include "settings.h"
 #include "template_variables.h"
@@ -114,6 +116,23 @@ int loadOrSay(PropertyFile& file, const std::string& path)
     return code;
 }
 
+/// Edits the lines of the installed "Zor.properties", the user's settings among them, for the
+/// package's version.
+void upgradeProperties(PropertyFile& file, const std::string& home, const InstallRegistry& package,
+                       const std::string& common)
+{
+    for (const char* const key : ObsoleteKeys)
+        file.clearWhereKeyContains(key);
+    setPackageVersion(file, package);
+    addMissingKeys(file);
+
+    replaceAll(file, tokenZorDestDir, home);
+    replaceAll(file, tokenZorCfgRoot, home);
+    replaceAll(file, tokenCorvanCommonDir, common);
+    replaceAll(file, tokenFileSeparator, "/");
+    replaceAll(file, tokenScannerMode, fileScannerMode);
+}
+
 /// Logs the trace directory that "Zor.properties" names, if it names one.
 void lookForTraceDir(PropertyFile& file, const KeptTraceTexts& kept)
 {
@@ -142,57 +161,7 @@ int upgradeTraceProperties(const KeptTraceTexts& kept, const std::string& home)
     return saved;
 }
 
-/// Replaces the installed files, whose scanners are stopped, by those of the package.
-int deployFiles(FileTransaction& transaction, InstallRegistry& registry,
-                const InstallRegistry& package, const std::string* indexPath, bool useCustomPath)
-{
-    const std::string& home = registry.homeDirectory;
-    (void)removeDir(transaction, home, spbPropertiesDir, true);
-    removeObsoleteFiles(home);
-
-    const int extracted = extractPackage(spbPackage, transaction, registry, false, indexPath);
-    if (extracted != FileOk) {
-        *logstream << "File extraction failed\n";
-        return extracted;
-    }
-    (void)setSelinuxContext(home); // never fatal
-    return customizeDeployment(home, package, useCustomPath);
-}
-
-/// The common log directory and the registry, after `deployed` files or without any.
-int finishUpgrade(FileTransaction& transaction, InstallRegistry& registry,
-                  const InstallRegistry& package, bool deployed, bool useCustomPath,
-                  const std::string& customPath)
-{
-    if (!localInstall && !useCustomPath) {
-        const int code =
-            setupCommonLogDir(transaction, registry.homeDirectory, useCustomPath, customPath);
-        if (code != 0)
-            return code;
-    }
-    if (deployed)
-        registry.version = package.version;
-    const bool changed = updateRegistration(registry, package);
-    return deployed || changed ? saveRegistry(transaction, registry) : FileOk;
-}
-
-} // namespace
-
-void upgradeProperties(PropertyFile& file, const std::string& home, const InstallRegistry& package,
-                       const std::string& common)
-{
-    for (const char* const key : ObsoleteKeys)
-        file.clearWhereKeyContains(key);
-    setPackageVersion(file, package);
-    addMissingKeys(file);
-
-    replaceAll(file, tokenZorDestDir, home);
-    replaceAll(file, tokenZorCfgRoot, home);
-    replaceAll(file, tokenCorvanCommonDir, common);
-    replaceAll(file, tokenFileSeparator, "/");
-    replaceAll(file, tokenScannerMode, fileScannerMode);
-}
-
+/// Property files and scripts of the extracted package.
 int customizeDeployment(const std::string& home, const InstallRegistry& package, bool useCustomPath)
 {
     const std::string path = joinPath(joinPath(home, spbCfgDir), zorProps);
@@ -219,6 +188,26 @@ int customizeDeployment(const std::string& home, const InstallRegistry& package,
     return code;
 }
 
+/// Replaces the installed files, whose scanners are stopped, by those of the package.
+int deployFiles(FileTransaction& transaction, InstallRegistry& registry,
+                const InstallRegistry& package, const std::string* indexPath, bool useCustomPath)
+{
+    const std::string& home = registry.homeDirectory;
+    (void)removeDir(transaction, home, spbPropertiesDir, true);
+    removeObsoleteFiles(home);
+
+    const int extracted = extractPackage(spbPackage, transaction, registry, false, indexPath);
+    if (extracted != FileOk) {
+        *logstream << "File extraction failed\n";
+        return extracted;
+    }
+    (void)setSelinuxContext(home); // never fatal
+    if (isInterrupted())
+        return RunInterrupted;
+    return customizeDeployment(home, package, useCustomPath);
+}
+
+/// Adds the calling exploiter and a later build date to `registry`; true when that changed it.
 bool updateRegistration(InstallRegistry& registry, const InstallRegistry& package)
 {
     bool changed = false;
@@ -240,17 +229,29 @@ bool updateRegistration(InstallRegistry& registry, const InstallRegistry& packag
     return changed;
 }
 
-std::vector<std::string> obsoleteFiles(const std::string& home)
+/// The common log directory and the registry, after `deployed` files or without any.
+int finishUpgrade(FileTransaction& transaction, InstallRegistry& registry,
+                  const InstallRegistry& package, bool deployed, bool useCustomPath,
+                  const std::string& customPath)
 {
-    std::vector<std::string> paths;
-    for (const char* const name : ObsoleteFiles)
-        paths.push_back(joinPath(joinPath(home, spbBinDir), name));
-    return paths;
+    if (!localInstall && !useCustomPath) {
+        const int code =
+            setupCommonLogDir(transaction, registry.homeDirectory, useCustomPath, customPath);
+        if (code != 0)
+            return code;
+    }
+    if (deployed)
+        registry.version = package.version;
+    const bool changed = updateRegistration(registry, package);
+    return deployed || changed ? saveRegistry(transaction, registry) : FileOk;
 }
+
+} // namespace
 
 void removeObsoleteFiles(const std::string& home)
 {
-    for (const std::string& path : obsoleteFiles(home)) {
+    for (const char* const name : ObsoleteFiles) {
+        const std::string path = joinPath(joinPath(home, spbBinDir), name);
         if (pathExists(path))
             (void)deleteFile(path); // best effort
     }
@@ -273,13 +274,17 @@ int upgradeInstall(FileTransaction& transaction, InstallRegistry& registry,
         (void)setSelinuxContext(home); // never fatal
         code = stopScanners(home, disable, true);
         stopped = code == 0;
-        if (stopped)
-            code = deployFiles(transaction, registry, request, indexPath, useCustomPath);
-        else
+        if (!stopped)
             *logstream << "Cannot stop ZOR for update\n";
+        else if (isInterrupted())
+            code = RunInterrupted;
+        else
+            code = deployFiles(transaction, registry, request, indexPath, useCustomPath);
     } else {
         *logstream << "Installed ZOR is not older than this version, updating exploiters only\n";
     }
+    if (code == FileOk && isInterrupted())
+        code = RunInterrupted;
     if (code == FileOk)
         code = finishUpgrade(transaction, registry, request, deploys, useCustomPath, customPath);
 

@@ -2,8 +2,11 @@
 
 #include "build_stamp.h"
 #include "command_line.h"
+#include "descriptors.h"
 #include "discovery.h"
+#include "durability.h"
 #include "installation.h"
+#include "interruption.h"
 #include "locations.h"
 #include "permissions.h"
 #include "private_mode.h"
@@ -45,6 +48,31 @@ std::string printSettings()
     return defaultDir;
 }
 
+/// Fixes the destination; returns 0, or 1 when there is none.
+int fixDestination(CommandLine& commandLine, const std::string& defaultDir)
+{
+    std::string& destDir = commandLine.destDir;
+    if (destDir.empty())
+        destDir = defaultDir;
+    if (destDir.empty()) {
+        *logstream << "*** Error: no destination directory.\n";
+        return printUsage();
+    }
+    if (destDir.back() == '/')
+        destDir.pop_back();
+    return 0;
+}
+
+/// The installer's own record: what it brings, for whom and whereto.
+InstallRegistry requestOf(const CommandLine& commandLine)
+{
+    InstallRegistry request = commandLine.installer;
+    request.exploiters = commandLine.exploiter;
+    request.homeDirectory = commandLine.destDir;
+    request.configRootDirectory = commandLine.destDir;
+    return request;
+}
+
 int removeRegistered(Discovery& found, const InstallRegistry& request)
 {
     if (!found.registryFound) {
@@ -54,6 +82,7 @@ int removeRegistered(Discovery& found, const InstallRegistry& request)
     FileTransaction transaction;
     const int status = removeInstallation(transaction, found.registry, request, &found.indexPath);
     if (status == 0) {
+        (void)syncDirectories(transaction); // of a registry; a failure leaves the old one
         *logstream << "Uninstallation successful, removing temporary files\n";
         (void)commit(transaction); // always 0
     }
@@ -77,6 +106,7 @@ int installOrUpgrade(Discovery& found, InstallRegistry& request)
 
 int main(int argc, char** argv)
 {
+    secureDescriptors();
     (void)std::setlocale(LC_ALL, "C"); // the start-up locale; cannot fail
     letWritesFail();
     if (!isRoot())
@@ -91,6 +121,7 @@ int main(int argc, char** argv)
     if (fixDestination(commandLine, printSettings()) != 0)
         return 1;
 
+    watchForSignals();
     Discovery found = discoverInstallation(commandLine);
     InstallRegistry request = requestOf(commandLine);
     int status =
@@ -99,5 +130,6 @@ int main(int argc, char** argv)
         status = performPrivateAction(commandLine, status);
 
     *logstream << "Done.\n";
+    endBySignal();
     return status == 0 ? 0 : 1;
 }

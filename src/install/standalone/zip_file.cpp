@@ -1,8 +1,6 @@
 #undef NDEBUG // the assertion below holds in every build type
 #include "zip_file.h"
 
-#include "package_window.h"
-
 #include <algorithm>
 #include <cassert>
 #include <cstdio>
@@ -50,22 +48,16 @@ std::size_t readUpTo(int fd, void* buffer, std::size_t size)
     return done;
 }
 
-ScopedFd openArchive(const char* path)
+ScopedFd openForReading(const char* path)
 {
-    return ScopedFd(::open(path, O_RDONLY | O_CLOEXEC));
+    return ScopedFd(::open(path, O_RDONLY | O_NOCTTY | O_CLOEXEC));
 }
 
-/// Whether there is a stream for `entry`.
-bool isReadable(const ZipEntry* entry)
-{
-    return entry != nullptr && entry->compressedSize != 0 && entry->uncompressedSize != 0 &&
-           (entry->method == 0 || entry->method == 8);
-}
-
-/// Reads an archive's headers one after the other.
+/// Reads an archive's headers from a window of the file, so that one system call serves many.
 class HeaderReader {
 public:
-    explicit HeaderReader(int fd) : window_(fd) {}
+    // cppcheck-suppress uninitMemberVar // the window begins empty
+    explicit HeaderReader(int fd) : fd_(fd) {}
 
     [[nodiscard]] std::int64_t position() const { return position_; }
 
@@ -81,24 +73,45 @@ public:
 
     bool seekBeforeEnd(std::int64_t distance)
     {
-        const std::int64_t end = ::lseek(window_.fd(), 0, SEEK_END);
+        const std::int64_t end = ::lseek(fd_, 0, SEEK_END);
         return seek(end - distance);
     }
 
-    /// Reads exactly `size` bytes and moves on.
+    /// Reads exactly `size` bytes, at most MaxNameLength of them, and moves on.
     bool read(void* buffer, std::size_t size)
     {
-        const unsigned char* const bytes = window_.bytes(position_, size);
-        if (bytes == nullptr)
+        if (!inWindow(size) && !fill(size))
             return false;
-        std::memcpy(buffer, bytes, size);
+        std::memcpy(buffer, window_ + (position_ - start_), size);
         position_ += static_cast<std::int64_t>(size);
         return true;
     }
 
 private:
-    PackageWindow window_;
+    [[nodiscard]] bool inWindow(std::size_t size) const
+    {
+        return position_ >= start_ && position_ + static_cast<std::int64_t>(size) <= end_;
+    }
+
+    /// Moves the window to the position; true when it then holds `size` bytes.
+    bool fill(std::size_t size)
+    {
+        start_ = end_ = position_;
+        while (!inWindow(size)) {
+            const auto held = static_cast<std::size_t>(end_ - start_);
+            const ssize_t count = ::pread(fd_, window_ + held, sizeof window_ - held, end_);
+            if (count <= 0)
+                return false;
+            end_ += count;
+        }
+        return true;
+    }
+
+    int fd_;
     std::int64_t position_ = 0;
+    std::int64_t start_ = 0; ///< the window holds the bytes from start_ to before end_
+    std::int64_t end_ = 0;
+    unsigned char window_[4096];
 };
 
 /// Reads a name of `length` bytes and cuts it at its first NUL.
@@ -338,6 +351,21 @@ int X__DeflatedInputStream::available()
     return static_cast<std::int32_t>(available_);
 }
 
+bool hasStream(const ZipEntry* entry)
+{
+    return entry != nullptr && entry->compressedSize != 0 && entry->uncompressedSize != 0 &&
+           (entry->method == 0 || entry->method == 8);
+}
+
+std::unique_ptr<InputStream> streamOver(ScopedFd file, const ZipEntry& entry)
+{
+    (void)::lseek(file.get(), dataStart(entry), SEEK_SET); // deliberate: the result is ignored
+    if (entry.method == 0)
+        return std::make_unique<X__StoredInputStream>(std::move(file), entry.uncompressedSize);
+    return std::make_unique<X__DeflatedInputStream>(std::move(file), entry.compressedSize,
+                                                    entry.uncompressedSize);
+}
+
 ZipFile::ZipFile(const char* path) : path_(path == nullptr ? "" : path)
 {
     (void)readDirectory(path, entries_); // an empty list tells
@@ -350,39 +378,17 @@ const ZipEntry* ZipFile::findEntry(const std::string& name) const
     return found == entries_.end() ? nullptr : &*found;
 }
 
-std::shared_ptr<const ScopedFd> ZipFile::openEntry(const ZipEntry* entry) const
+ScopedFd ZipFile::openArchive() const
 {
-    if (!isReadable(entry))
-        return nullptr;
-    if (!file_) {
-        auto file = std::make_shared<const ScopedFd>(openArchive(path_.c_str()));
-        if (file->isOpen())
-            file_ = std::move(file);
-    }
-    return file_;
-}
-
-void ZipFile::fileWasReplaced() const
-{
-    struct stat held = {};
-    struct stat named = {};
-    if (!file_ || fstat(file_->get(), &held) != 0 || stat(path_.c_str(), &named) != 0 ||
-        held.st_ino != named.st_ino || held.st_dev != named.st_dev)
-        file_.reset();
+    return openForReading(path_.c_str());
 }
 
 InputStream* ZipFile::getInputStream(const ZipEntry* entry) const
 {
-    if (!isReadable(entry))
+    if (!hasStream(entry))
         return nullptr;
-    ScopedFd file = openArchive(path_.c_str());
-    if (!file.isOpen())
-        return nullptr;
-    (void)::lseek(file.get(), dataStart(*entry), SEEK_SET); // deliberate: not looked at
-    if (entry->method == 0)
-        return new X__StoredInputStream(std::move(file), entry->uncompressedSize);
-    return new X__DeflatedInputStream(std::move(file), entry->compressedSize,
-                                      entry->uncompressedSize);
+    ScopedFd file = openArchive();
+    return file.isOpen() ? streamOver(std::move(file), *entry).release() : nullptr;
 }
 
 int ZipFile::readDirectory(const char* path, std::vector<ZipEntry>& entries)
@@ -390,7 +396,7 @@ int ZipFile::readDirectory(const char* path, std::vector<ZipEntry>& entries)
     entries.clear();
     if (path == nullptr)
         return ZipCannotOpen;
-    const ScopedFd file = openArchive(path);
+    const ScopedFd file = openForReading(path);
     if (!file.isOpen())
         return ZipCannotOpen;
 

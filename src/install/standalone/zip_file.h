@@ -112,10 +112,15 @@ private:
 /// looks at: such an entry begins at the archive's first byte.
 [[nodiscard]] std::int64_t dataStart(const ZipEntry& entry);
 
-/// An archive and the list of its entries.
-///
-/// Each stream opens the archive by itself. openEntry() keeps it open between its calls: to open it
-/// anew for each of many small entries costs as much as to write some of them.
+/// True if there is a stream for `entry`: it is not null, neither of its sizes is 0, and its method
+/// is stored or deflated.
+[[nodiscard]] bool hasStream(const ZipEntry* entry);
+
+/// A stream over `entry` of the open archive `file`, for which hasStream() is true.
+[[nodiscard]] std::unique_ptr<InputStream> streamOver(ScopedFd file, const ZipEntry& entry);
+
+/// An archive and the list of its entries. It holds no handle: each stream opens the archive by
+/// itself.
 class ZipFile {
 public:
     /// Reads the directory of the archive at `path`. Entries stay empty when there is none to read.
@@ -135,13 +140,11 @@ public:
     /// cannot be opened.
     [[nodiscard]] InputStream* getInputStream(const ZipEntry* entry) const;
 
-    /// The archive, to read `entry` from dataStart() on without moving the descriptor, which all
-    /// callers share; null where getInputStream() returns null.
-    [[nodiscard]] std::shared_ptr<const ScopedFd> openEntry(const ZipEntry* entry) const;
+    /// The archive's path as given to the constructor.
+    [[nodiscard]] const std::string& path() const { return path_; }
 
-    /// To be called when a file was replaced, which may be the archive: lets the next openEntry()
-    /// open what then lies at the archive's path.
-    void fileWasReplaced() const;
+    /// Opens the archive for reading. Not open, with `errno`, if that fails.
+    [[nodiscard]] ScopedFd openArchive() const;
 
     /// Fills `entries` from the archive at `path` (null is allowed): from its central directory,
     /// or, when that cannot be used, from its local headers. Returns a ZipCode (0 to 8); `entries`
@@ -154,5 +157,4 @@ public:
 private:
     std::string path_;
     std::vector<ZipEntry> entries_;
-    mutable std::shared_ptr<const ScopedFd> file_; ///< of openEntry(); null when it is to open
 };

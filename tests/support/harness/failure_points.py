@@ -30,6 +30,7 @@ ERRORS = {
     "fchown": ("EIO", "EPERM"),
     "fgetxattr": ("EIO",),
     "flistxattr": ("EIO",),
+    "fremovexattr": ("EIO",),
     "fsetxattr": ("EIO", "ENOSPC", "EPERM"),
     "fstat": ("EIO",),
     "fstatfs": ("EIO",),
@@ -74,6 +75,7 @@ FIRST_CALL = re.compile(r"getuid(32)?\(")
 CALL = re.compile(r"(\w+)\((.*)\) += +(.*)$")
 # A path, with the directory that it starts from, and a descriptor with what is open behind it.
 PATH = re.compile(r'(?:(?:AT_FDCWD|\d+)<([^>]*)>(?:\(deleted\))?, )?"((?:[^"\\]|\\.)*)"')
+OPENED = re.compile(r"(\d+)<(/[^>]*)>")
 DESCRIPTOR = re.compile(r"^\d+<(.*?)>(?:\(deleted\))?(?:, |$)")
 
 
@@ -117,7 +119,7 @@ def kind_of(name, arguments):
 
 
 # Calls whose first argument is a descriptor and whose strings are no paths.
-OF_DESCRIPTORS = {"read", "write", "fgetxattr", "fsetxattr", "flistxattr", "fstatfs"}
+OF_DESCRIPTORS = {"read", "write", "fgetxattr", "fremovexattr", "fsetxattr", "flistxattr", "fstatfs"}
 
 
 def paths_of(kind, arguments):
@@ -136,6 +138,7 @@ def paths_of(kind, arguments):
 def points_of(trace):
     """The points of a trace of a whole run, in the order made."""
     points, counts, begun, late = [], {}, False, False
+    opened = {}
     for line in trace.splitlines():
         begun = begun or FIRST_CALL.match(line) is not None
         call = CALL.match(line)
@@ -148,6 +151,9 @@ def points_of(trace):
         kind = kind_of(name, arguments)
         assert kind in ERRORS, f"a call that is not known here: {line}"
         path, *others = paths_of(kind, arguments)
+        path = opened.get(path, path)
+        if made := OPENED.match(result):
+            opened["/proc/self/fd/" + made.group(1)] = made.group(2)
         points.append(Point(name, counts[name], kind, path, arguments, late, result,
                             target=others[0] if others else ""))
         late = late or (kind == "chmod" and path == INDEX)

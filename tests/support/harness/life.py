@@ -50,7 +50,7 @@ COMMON_DIRECTORIES = ("/usr/kel", "/usr/kel/corvan", "/usr/kel/corvan/common")
 COMMON_LOGS = "/usr/kel/corvan/common/ZOR"
 
 RULES = (rollback.FILE_INDEX, rollback.INSTALL_TYPE_FILE, rollback.SINGLE_USER_FLAG,
-         rollback.COMMON_SETTING, rollback.REGISTRY_MODE, rollback.OLDER_BACKUP,
+         rollback.COMMON_SETTING, rollback.OLDER_BACKUP,
          rollback.XSS_FILES, rollback.MAIN_PROPERTY_FILE, rollback.TRACE_PROPERTY_FILE,
          rollback.SCRIPTS_OF_OLD)
 

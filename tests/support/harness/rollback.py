@@ -36,11 +36,6 @@ COMMON_SETTING = Rule(
     "the setting of the common directory is written in a transaction that is dropped",
     excuses=lambda change, path: path in COMMON_SETTING_PLACES and change.new(path))
 
-REGISTRY_MODE = Rule(
-    "the registry is restored from a copy, which has the mode of the process umask",
-    excuses=lambda change, path: os.path.basename(path) == "zor.ini"
-    and change.only_mode_differs(path))
-
 OLDER_BACKUP = Rule(
     "only one backup generation exists: an older backup of a replaced file is deleted",
     excuses=lambda change, path: path.endswith(".bak") and change.lost(path))

@@ -1,0 +1,134 @@
+#include "entry_extraction.h"
+
+#include "file_operations.h"
+#include "file_writing.h"
+#include "safe_path.h"
+#include "sound_entry.h"
+#include "zip_file.h"
+
+#include <cerrno>
+#include <utility>
+
+#include <fcntl.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+namespace {
+
+constexpr mode_t NewFileMode = 0666;     // what a file gets that no mode is set for
+constexpr mode_t UnfinishedMode = 0600;  // nobody else can open the file while it is being written
+constexpr int ExtractBlockSize = 8192;
+
+/// True when the last file of the journal took the place of another.
+bool lastReplacedAnother(const FileTransaction& transaction)
+{
+    const auto& journal = transaction.journal;
+    return journal.size() >= 2 && journal[journal.size() - 2].kind == BackedUp;
+}
+
+/// Opens `destination` for a file of `package`, its old content backed up. Returns 0, or the code
+/// of what failed.
+///
+/// In a new installation nothing is in the way, so creating the file comes first, and looking at
+/// what is there only when that fails, whatever the reason. After a file that replaced another,
+/// this one is expected to do so as well.
+int openDestination(FileTransaction& transaction, OpenPackage& package,
+                    const std::string& destination, WritableFile& file)
+{
+    if (!lastReplacedAnother(transaction) &&
+        openForWriting(destination, Existing::Refuse, UnfinishedMode, file) == 0)
+        return FileOk;
+
+    const int backedUp = backupFile(transaction, destination);
+    if (backedUp != FileOk)
+        return backedUp;
+    // After a backup the name is free. Whatever is there again was planted.
+    const Existing existing = transaction.backup ? Existing::Refuse : Existing::Truncate;
+    const int error = openForWriting(destination, existing, UnfinishedMode, file);
+    package.fileWasReplaced();
+    return error == 0 ? FileOk : CannotOpenForWriting;
+}
+
+int writeContent(InputStream& stream, int destination)
+{
+    char block[ExtractBlockSize];
+    for (;;) {
+        const int count = stream.read(block, sizeof block);
+        if (count < 0)
+            return CannotRead;
+        if (count == 0)
+            return FileOk;
+        const int code = writeAll(destination, block, static_cast<std::size_t>(count));
+        if (code != FileOk)
+            return code;
+    }
+}
+
+/// Writes `entry`, which is in the open package `source`, to the new file `destination`.
+int writeEntry(const ZipEntry& entry, int source, int destination)
+{
+    const int copied = copySoundEntry(source, entry, destination);
+    if (copied != EntryNotSound)
+        return copied;
+
+    // A damaged entry holds what its stream delivers in blocks of ExtractBlockSize. A device has
+    // nothing to take back, and says EINVAL.
+    if (lseek(destination, 0, SEEK_SET) != 0 || (ftruncate(destination, 0) != 0 && errno != EINVAL))
+        return writeErrorCode(errno);
+    // From the package as it was opened: this very file may have taken its place.
+    ScopedFd own(fcntl(source, F_DUPFD_CLOEXEC, 0));
+    if (!own.isOpen())
+        return CannotOpenForReading;
+    return writeContent(*streamOver(std::move(own), entry), destination);
+}
+
+} // namespace
+
+std::shared_ptr<const ScopedFd> OpenPackage::open(const ZipEntry* entry)
+{
+    if (!hasStream(entry))
+        return nullptr;
+    if (!file_) {
+        ScopedFd file = archive_.openArchive();
+        if (file.isOpen())
+            file_ = std::make_shared<const ScopedFd>(std::move(file));
+    }
+    return file_;
+}
+
+void OpenPackage::fileWasReplaced()
+{
+    struct stat held = {};
+    struct stat named = {};
+    if (!file_ || fstat(file_->get(), &held) != 0 || stat(archive_.path().c_str(), &named) != 0 ||
+        held.st_ino != named.st_ino || held.st_dev != named.st_dev)
+        file_.reset();
+}
+
+int extractOpenFile(FileTransaction& transaction, OpenPackage& package, const ZipEntry* entry,
+                    const std::string& destination, mode_t mode)
+{
+    const auto source = package.open(entry);
+    if (!source)
+        return CannotOpenForReading;
+
+    WritableFile file;
+    const int opened = openDestination(transaction, package, destination, file);
+    if (opened != FileOk)
+        return opened;
+    record(transaction, Created, destination); // before its first byte: a rollback finds it
+
+    const int code = writeEntry(*entry, source->get(), file.fd.get());
+    if (code == FileOk && mode != 0)
+        (void)fchmod(file.fd.get(), mode); // the content is what counts
+    else if (file.created)
+        (void)fchmod(file.fd.get(), underUmask(NewFileMode)); // it stays under "-norollback"
+    return code == FileOk ? closeWritten(file.fd) : code;
+}
+
+int extractFile(FileTransaction& transaction, const ZipFile& archive, const ZipEntry* entry,
+                const std::string& destination, mode_t mode)
+{
+    OpenPackage package(archive);
+    return extractOpenFile(transaction, package, entry, destination, mode);
+}

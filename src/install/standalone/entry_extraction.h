@@ -1,0 +1,51 @@
+// Copying one entry of a package to its place on the disk.
+#pragma once
+
+#include "file_codes.h"
+#include "scoped.h"
+#include "transaction.h"
+
+#include <memory>
+#include <string>
+
+#include <sys/types.h>
+
+class ZipFile;
+struct ZipEntry;
+
+/// A package that stays open from entry to entry: opening it for each of many small entries costs
+/// as much as writing some of them.
+class OpenPackage {
+public:
+    /// `archive` must outlive this object.
+    explicit OpenPackage(const ZipFile& archive) : archive_(archive) {}
+
+    [[nodiscard]] const ZipFile& archive() const { return archive_; }
+
+    /// The package, to read `entry` from dataStart() on without moving the descriptor, which all
+    /// callers share; null where ZipFile::getInputStream() returns null.
+    [[nodiscard]] std::shared_ptr<const ScopedFd> open(const ZipEntry* entry);
+
+    /// To be called when a file was replaced, which may be the package: lets the next open() use
+    /// what is at the package's path then.
+    void fileWasReplaced();
+
+private:
+    const ZipFile& archive_;
+    std::shared_ptr<const ScopedFd> file_;
+};
+
+/// Writes `entry` of `package` to `destination`, whose old content is backed up, and gives it
+/// exactly `mode` unless that is 0. The directory must exist. Until the file is complete, nobody
+/// but its owner can open it for writing.
+///
+/// Returns 0; CannotOpenForReading (1) if the entry has no stream: nothing was done then; 9 if the
+/// old content cannot be moved; 2, also for a name that is planted meanwhile; 4; or the code of a
+/// failed write (5, 6, 7).
+[[nodiscard]] int extractOpenFile(FileTransaction& transaction, OpenPackage& package,
+                                  const ZipEntry* entry, const std::string& destination,
+                                  mode_t mode);
+
+/// extractOpenFile() of an entry of `archive`, which is opened for it.
+[[nodiscard]] int extractFile(FileTransaction& transaction, const ZipFile& archive,
+                              const ZipEntry* entry, const std::string& destination, mode_t mode);

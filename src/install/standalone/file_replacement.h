@@ -1,0 +1,37 @@
+// Replacing a small file as a whole: whoever looks at its path, whenever the run is killed or the
+// disk fills up, finds the complete old or the complete new content.
+//
+// The new content goes to a temporary file beside the old one, is written to the disk, takes over
+// owner, group, mode and extended attributes, and is renamed to the path. A link of root or of the
+// running user stays a link: what it leads to is replaced. Three kinds of files cannot be replaced
+// and are overwritten in place: one that is not a regular file, one that something is mounted on,
+// and one whose owner or attributes the running user cannot pass on, or in whose directory it
+// cannot create files.
+#pragma once
+
+#include <cstdio>
+#include <functional>
+#include <string>
+
+#include <sys/types.h>
+
+/// Ends the name of a temporary file. A killed run leaves at most one of them; the next run that
+/// replaces the same file deletes it, and so does the last removal.
+extern const std::string TemporarySuffix;
+
+/// Writes the new content to the stream. Failed writes need no report: they stick to the stream.
+using ContentWriter = std::function<void(std::FILE*)>;
+
+/// Replaces the content of `path` by what `write` writes. A new file gets `mode` under the umask.
+///
+/// Returns 0; CannotOpenForWriting (2), with the `errno` of the failed open, if the path cannot be
+/// opened for writing: nothing was changed and `write` was not called; or the code of a failed
+/// write (5, 6, 7): the old content is still there, unless the file had to be written in place.
+[[nodiscard]] int replaceFile(const std::string& path, mode_t mode, const ContentWriter& write);
+
+/// Deletes the temporary file that a killed run may have left for `path`.
+void deleteTemporaryFile(const std::string& path);
+
+/// Gives the file `to` owner, group, mode and extended attributes of the file `from`, both open.
+/// Returns false if something could not be passed on.
+[[nodiscard]] bool copyAttributes(int from, int to);

@@ -1,0 +1,246 @@
+#include "entry_extraction.h"
+
+#include "installer_fixtures.h"
+#include "process_limits.h"
+#include "safe_path.h"
+#include "sample_bytes.h"
+#include "zip_builder.h"
+#include "zip_file.h"
+
+#include <gtest/gtest.h>
+
+#include <cerrno>
+
+#include <sys/stat.h>
+#include <sys/syscall.h>
+#include <unistd.h>
+
+namespace {
+
+class ExtractFileTest : public InstallerTest {
+protected:
+    /// Extracts the one entry of an archive that holds `item`.
+    int extract(const ZipItem& item, const std::string& destination, mode_t mode)
+    {
+        const std::string path = dir / "package.spb";
+        writeFile(path, zipBytes({{item}}));
+        const ZipFile archive(path.c_str());
+        EXPECT_EQ(1U, archive.entries().size());
+        return extractFile(transaction, archive, &archive.entries().at(0), destination, mode);
+    }
+};
+
+TEST_F(ExtractFileTest, WritesStoredAndDeflatedEntriesOfAnySize)
+{
+    for (const std::size_t size : {1U, 8191U, 8192U, 8193U, 16384U, 300000U}) {
+        EXPECT_EQ(0, extract(storedItem("a", noiseBytes(size, 1)), dir / "stored", 0644)) << size;
+        EXPECT_EQ(0, extract(deflatedItem("a", noiseBytes(size, 1)), dir / "deflated", 0644))
+            << size;
+
+        EXPECT_EQ(noiseBytes(size, 1), readFile(dir / "stored")) << size;
+        EXPECT_EQ(noiseBytes(size, 1), readFile(dir / "deflated")) << size;
+    }
+}
+
+TEST_F(ExtractFileTest, RecordsANewFileAsCreated)
+{
+    EXPECT_EQ(0, extract(storedItem("a", "new"), dir / "file", 0644));
+
+    EXPECT_EQ("2 " + dir / "file" + "\n", journalText(transaction));
+    EXPECT_FALSE(pathExists(dir / "file.bak"));
+}
+
+TEST_F(ExtractFileTest, BacksUpTheFileThatItReplaces)
+{
+    writeFile(dir / "file", "old");
+
+    EXPECT_EQ(0, extract(storedItem("a", "new"), dir / "file", 0644));
+
+    EXPECT_EQ("new", readFile(dir / "file"));
+    EXPECT_EQ("old", readFile(dir / "file.bak"));
+    EXPECT_EQ("1 " + dir / "file" + "\n2 " + dir / "file" + "\n", journalText(transaction));
+}
+
+TEST_F(ExtractFileTest, OverwritesInPlaceInATransactionWithoutBackups)
+{
+    transaction.backup = false;
+    writeFile(dir / "file", "old and longer");
+
+    EXPECT_EQ(0, extract(storedItem("a", "new"), dir / "file", 0644));
+
+    EXPECT_EQ("new", readFile(dir / "file"));
+    EXPECT_FALSE(pathExists(dir / "file.bak"));
+    EXPECT_EQ("2 " + dir / "file" + "\n", journalText(transaction));
+}
+
+TEST_F(ExtractFileTest, AnArchiveThatAnEntryReplacesIsReadAnew)
+{
+    const std::string path = dir / "package.spb";
+    writeFile(path, zipBytes({{storedItem("a", "first"), storedItem("b", "replacing"),
+                               storedItem("c", "third"), storedItem("d", "fourth")}}));
+    const ZipFile archive(path.c_str());
+    OpenPackage package(archive);
+    const auto extract = [&](std::size_t index, const std::string& destination) {
+        return extractOpenFile(transaction, package, &archive.entries().at(index), destination,
+                               0644);
+    };
+
+    EXPECT_EQ(0, extract(0, dir / "a"));
+    EXPECT_EQ(0, extract(1, path));
+    EXPECT_EQ(0, extract(2, dir / "c"));
+    ASSERT_EQ(0, unlink(path.c_str()));
+    EXPECT_EQ(0, extract(3, dir / "a")); // replaces a file: the next one looks for the archive
+    EXPECT_EQ(1, extract(0, dir / "e"));
+
+    EXPECT_EQ("", readFile(dir / "c")) << "what replaced the archive is too short for it";
+}
+
+TEST_F(ExtractFileTest, SetsExactlyTheModeWhateverTheUmask)
+{
+    (void)umask(077);
+
+    EXPECT_EQ(0, extract(storedItem("a", "x"), dir / "open", 0777));
+    EXPECT_EQ(0, extract(storedItem("a", "x"), dir / "closed", 0400));
+
+    EXPECT_EQ(0777U, modeOf(dir / "open"));
+    EXPECT_EQ(0400U, modeOf(dir / "closed"));
+}
+
+TEST_F(ExtractFileTest, Mode0LeavesThePermissionsOfTheCreation)
+{
+    (void)umask(027);
+
+    EXPECT_EQ(0, extract(storedItem("a", "x"), dir / "file", 0));
+
+    EXPECT_EQ(0640U, modeOf(dir / "file"));
+}
+
+TEST_F(ExtractFileTest, AModeThatCannotBeSetIsNoFailure)
+{
+    EXPECT_TRUE(passesInChild([&] {
+        failSystemCall(SYS_fchmod, EPERM);
+        failSystemCall(SYS_chmod, EPERM);
+        EXPECT_EQ(0, extract(storedItem("a", "x"), dir / "file", 0755));
+    }));
+
+    EXPECT_EQ("x", readFile(dir / "file"));
+}
+
+TEST_F(ExtractFileTest, AnEntryWithoutAStreamIsCode1AndChangesNothing)
+{
+    writeFile(dir / "file", "old");
+    ZipItem unknownMethod = storedItem("a", "x");
+    unknownMethod.local.method = unknownMethod.central.method = 12;
+
+    EXPECT_EQ(1, extract(storedItem("a", ""), dir / "file", 0755));
+    EXPECT_EQ(1, extract(unknownMethod, dir / "file", 0755));
+
+    EXPECT_EQ("old", readFile(dir / "file"));
+    EXPECT_EQ(0644U, modeOf(dir / "file"));
+    EXPECT_FALSE(pathExists(dir / "file.bak"));
+    EXPECT_TRUE(transaction.journal.empty());
+}
+
+TEST_F(ExtractFileTest, AFileThatCannotBeBackedUpIsCode9AndStays)
+{
+    writeFile(dir / "file", "old");
+    makeDirectories(dir / "file.bak");
+
+    EXPECT_EQ(9, extract(storedItem("a", "new"), dir / "file", 0644));
+
+    EXPECT_EQ("old", readFile(dir / "file"));
+    EXPECT_TRUE(transaction.journal.empty());
+}
+
+TEST_F(ExtractFileTest, ADestinationThatCannotBeOpenedIsCode2AndHasNoEntry)
+{
+    EXPECT_EQ(2, extract(storedItem("a", "new"), dir / "missing/file", 0644));
+
+    EXPECT_TRUE(transaction.journal.empty());
+}
+
+TEST_F(ExtractFileTest, AWriteThatIsDeniedIsCode7AndItsFileIsRecorded)
+{
+    EXPECT_TRUE(passesInChild([&] {
+        const std::string path = dir / "package.spb";
+        writeFile(path, zipBytes({{deflatedItem("a", "new")}}));
+        const ZipFile archive(path.c_str());
+        failSystemCall(SYS_write, EACCES);
+
+        EXPECT_EQ(7, extractFile(transaction, archive, &archive.entries().at(0), dir / "file", 0));
+
+        EXPECT_EQ("2 " + dir / "file" + "\n", journalText(transaction));
+    }));
+}
+
+TEST_F(ExtractFileTest, AnyOtherFailureToWriteIsCode5)
+{
+    EXPECT_TRUE(passesInChild([&] {
+        const std::string path = dir / "package.spb";
+        writeFile(path, zipBytes({{deflatedItem("a", "new")}}));
+        const ZipFile archive(path.c_str());
+        failSystemCall(SYS_write, EIO);
+
+        EXPECT_EQ(5, extractFile(transaction, archive, &archive.entries().at(0), dir / "file", 0));
+    }));
+}
+
+TEST_F(ExtractFileTest, ABlockThatFailsOnlyAsTheFileIsClosedIsAFailedWrite)
+{
+    EXPECT_TRUE(passesInChild([&] {
+        const std::string path = dir / "package.spb";
+        writeFile(path, zipBytes({{storedItem("a", "new")}}));
+        const ZipFile archive(path.c_str());
+        failSystemCall(SYS_close, ENOSPC);
+
+        EXPECT_EQ(6, extractFile(transaction, archive, &archive.entries().at(0), dir / "file", 0));
+    }));
+}
+
+TEST_F(ExtractFileTest, AFileThatFailedIsNotGivenItsMode)
+{
+    transaction.backup = false;
+    const mode_t before = modeOf("/dev/full");
+
+    EXPECT_EQ(6, extract(storedItem("a", "new"), "/dev/full", 0700));
+
+    EXPECT_EQ(before, modeOf("/dev/full"));
+}
+
+class FullDiskExtractionTest : public MachineTest {
+protected:
+    void SetUp() override
+    {
+        MachineTest::SetUp();
+        if (!HasFatalFailure())
+            makeDirectories(dir / "disk");
+    }
+};
+
+TEST_F(FullDiskExtractionTest, AnEntryThatDoesNotFitIsCode6AndIsUndoneByARollback)
+{
+    writeFile(dir / "package.spb", zipBytes({{deflatedItem("a", noiseBytes(100000, 1))}}));
+    const ZipFile archive((dir / "package.spb").c_str());
+    const SmallDisk disk(dir / "disk", 64);
+    writeFile(dir / "disk/file", "old");
+
+    EXPECT_EQ(6, extractFile(transaction, archive, &archive.entries().at(0), dir / "disk/file", 0));
+    EXPECT_EQ("1 " + dir / "disk/file" + "\n2 " + dir / "disk/file" + "\n",
+              journalText(transaction));
+    EXPECT_EQ(0, rollback(transaction));
+
+    EXPECT_EQ("old", readFile(dir / "disk/file"));
+    EXPECT_FALSE(pathExists(dir / "disk/file.bak"));
+}
+
+TEST_F(FullDiskExtractionTest, ASmallFileOnAFullDiskIsCode6)
+{
+    writeFile(dir / "package.spb", zipBytes({{storedItem("a", "x")}}));
+    const ZipFile archive((dir / "package.spb").c_str());
+    const SmallDisk disk(dir / "disk", 64);
+    writeFile(dir / "disk/filler", std::string(65536, 'x'));
+
+    EXPECT_EQ(6, extractFile(transaction, archive, &archive.entries().at(0), dir / "disk/file", 0));
+}
+
+} // namespace
