@@ -1,5 +1,5 @@
-# What ships: the Release builds. Their wzorinst carries zlib, libstdc++ and libgcc, keeps its
-# debug symbols in a file of its own, and has the same bytes wherever the tree is built.
+# What ships: the Release builds. Their wzorinst carries zlib, libdeflate, libstdc++ and libgcc,
+# keeps its debug symbols in a file of its own, and has the same bytes wherever the tree is built.
 set(WZOR_SHIPPING ON)
 
 # The build stamp holds the release's version and date; the project's version is its first three

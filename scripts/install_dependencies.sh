@@ -1,50 +1,80 @@
 #!/bin/sh
-# Installs the Debian packages that building, testing and the demo need.
-# Usage: scripts/install_dependencies.sh
-# Does nothing when all of them are there; as an ordinary user it asks sudo for the rest.
+# Installs the Debian packages that are missing: scripts/install_dependencies.sh demo|test
+#
+# "demo" is what a release build and the demo need, "test" what everything else needs as well. Does
+# nothing if all of them are installed; an ordinary user is asked for sudo's password. No name holds
+# a version: where Debian's differ, a package that depends on the current one is named.
 set -eu
 
-packages='
-    bash-completion
+demo='
     bubblewrap
+    cmake
+    g++
+    libdeflate-dev
+    ninja-build
+    python3
+    zlib1g-dev
+'
+test='
+    bash-completion
+    black
     clang
     clang-format
     clang-tidy
-    cmake
+    cmake-format
+    codespell
     cppcheck
-    g++
     g++-multilib
     gcovr
     googletest
     groff-base
+    isort
     lib32z1-dev
     libc6-dbg
-    libclang-rt-14-dev
+    libclang-rt-dev
     libcli11-dev
+    libdeflate-dev:i386
     man-db
-    ninja-build
     nlohmann-json3-dev
-    python3
+    pylint
     python3-jsonschema
     python3-pytest
     rpm
     scdoc
+    shellcheck
     strace
     time
     valgrind
-    zlib1g-dev
 '
 
+case ${1-} in
+demo) packages=$demo ;;
+test) packages="$demo $test" ;;
+*) echo "Usage: $0 demo|test" >&2; exit 2 ;;
+esac
+
+native=$(dpkg --print-architecture)
+installed=$(dpkg-query --show --showformat='${db:Status-Status} ${Package}:${Architecture}\n')
 missing=
 for package in $packages; do
-    status=$(dpkg-query --show --showformat='${db:Status-Status}' "$package" 2>/dev/null || true)
-    [ "$status" = installed ] || missing="$missing $package"
+    case $package in
+    *:*) line="installed $package" ;;
+    *) line="installed $package:$native" ;;
+    esac
+    if ! printf '%s\n' "$installed" | grep -qxF -e "$line" -e "installed $package:all"; then
+        missing="$missing $package"
+    fi
 done
 [ -n "$missing" ] || exit 0
+echo "Installing:$missing"
 
 as_root=
 [ "$(id -u)" -eq 0 ] || as_root=sudo
-echo "Installing:$missing"
-$as_root apt-get update -qq
+case $missing in
+*:i386*) $as_root dpkg --add-architecture i386 ;;
+esac
+# A mirror that is just being updated fails for some lists: what they lack, the next command names.
+$as_root apt-get update -qq || echo "Some package lists could not be updated" >&2
 # shellcheck disable=SC2086 # a list of words
-DEBIAN_FRONTEND=noninteractive $as_root apt-get install -y -qq --no-install-recommends $missing
+$as_root env DEBIAN_FRONTEND=noninteractive \
+    apt-get install -y -qq --no-install-recommends $missing

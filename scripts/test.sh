@@ -4,7 +4,7 @@
 # Usage: scripts/test.sh [preset...]     (default: fuzz dev test test-i686)
 set -eu
 cd "$(dirname "$0")/.."
-scripts/install_dependencies.sh
+scripts/install_dependencies.sh test
 
 [ $# -gt 0 ] || set -- fuzz dev test test-i686
 for preset in "$@"; do

@@ -16,7 +16,7 @@ IDS = [str(path.relative_to(REPOSITORY)) for path in DOCUMENTS]
 # Directories whose files the documents name as commands.
 COMMAND_PATH = re.compile(r"(?<![\w/.])(?:\./)?((?:scripts|tests|tools|bench|examples)/[\w./-]*\w)")
 PRESET = re.compile(r"--preset (\S+?)[\s`;&]")
-LINK = re.compile(r"\]\(([^)#]+?)(?:#[^)]*)?\)")
+LINK = re.compile(r"\]\(([^)#]*)(?:#([^)]*))?\)")
 
 
 @pytest.fixture
@@ -31,10 +31,26 @@ def code_blocks(document, language=""):
     return re.findall(rf"^```{language}\n(.*?)^```$", text, re.MULTILINE | re.DOTALL)
 
 
+def anchors(document):
+    """The names under which the headings of a document can be reached."""
+    headings = re.findall(r"^#+ (.*)$", document.read_text(), re.MULTILINE)
+    return {re.sub(r"[^\w -]", "", heading.lower()).replace(" ", "-") for heading in headings}
+
+
+def leads_somewhere(document, name, anchor):
+    target = document.parent / name if name else document
+    return target.exists() and (not anchor or anchor in anchors(target))
+
+
 @pytest.mark.parametrize("document", DOCUMENTS, ids=IDS)
-def test_links_lead_to_files(document):
-    links = [link for link in LINK.findall(document.read_text()) if "://" not in link]
-    assert [link for link in links if not (document.parent / link).exists()] == []
+def test_links_lead_to_files_and_headings(document):
+    links = [link for link in LINK.findall(document.read_text()) if "://" not in link[0]]
+    assert [link for link in links if not leads_somewhere(document, *link)] == []
+
+
+def test_the_spelling_is_right():
+    done = subprocess.run(["codespell"], cwd=REPOSITORY, capture_output=True, text=True, check=False)
+    assert (done.stdout, done.stderr, done.returncode) == ("", "", 0)
 
 
 @pytest.mark.parametrize("document", DOCUMENTS, ids=IDS)
@@ -55,7 +71,7 @@ def test_the_documents_name_presets_and_commands():
     text = "".join(document.read_text() for document in DOCUMENTS)
     assert "release-i686" in PRESET.findall(text)
     assert "scripts/demo.sh" in COMMAND_PATH.findall(text)
-    assert "docs/architecture.md" in LINK.findall(text)
+    assert ("docs/architecture.md", "") in LINK.findall(text)
 
 
 def source_text():

@@ -7,11 +7,95 @@
 
 #include <gtest/gtest.h>
 
+#include <algorithm>
 #include <string>
+#include <utility>
 
 #include <fcntl.h>
+#include <zlib.h>
 
 namespace {
+
+/// Writes deflate data bit by bit.
+class BitWriter {
+public:
+    /// Appends the lowest `count` bits of `bits`, the lowest first.
+    void number(std::uint32_t bits, int count)
+    {
+        for (int i = 0; i < count; ++i)
+            bit(bits >> i & 1U);
+    }
+
+    /// Appends a Huffman code, its highest bit first.
+    void code(std::uint32_t bits, int count)
+    {
+        for (int i = count - 1; i >= 0; --i)
+            bit(bits >> i & 1U);
+    }
+
+    [[nodiscard]] const std::string& data() const { return data_; }
+
+private:
+    void bit(std::uint32_t value)
+    {
+        if (used_ % 8 == 0)
+            data_ += '\0';
+        data_.back() =
+            static_cast<char>(static_cast<unsigned char>(data_.back()) | value << used_ % 8);
+        ++used_;
+    }
+
+    std::string data_;
+    unsigned used_ = 0;
+};
+
+/// A block of the fixed code: "a", then the length symbol `length` with a distance of 1, then the
+/// end.
+std::string fixedBlock(std::uint32_t length)
+{
+    BitWriter bits;
+    bits.number(1, 1); // the last block
+    bits.number(1, 2); // of the fixed code
+    bits.code(0x30 + 'a', 8);
+    bits.code(0xC0 + length - 280, 8);
+    bits.code(0, 5); // distance 1
+    bits.code(0, 7);
+    return bits.data();
+}
+
+/// A block of a code of its own: "a" 84 times. It lists `literals` code lengths of literals
+/// and lengths, where deflate allows 286, and `distances` of distances, where it allows 30.
+std::string dynamicBlock(std::uint32_t literals, std::uint32_t distances)
+{
+    BitWriter bits;
+    bits.number(1, 1); // the last block
+    bits.number(2, 2); // of its own code
+    bits.number(literals - 257, 5);
+    bits.number(distances - 1, 5);
+    bits.number(18 - 4, 4);
+    // Codes of the code lengths: 18 (a run of zeros) is 0, 0 is 10, 1 is 11.
+    for (const std::uint32_t length : {0, 0, 1, 2, 0, 0, 0, 0, 0, 0, 0, 0, 0, 0, 0, 0, 0, 2})
+        bits.number(length, 3);
+    const auto zeros = [&](std::uint32_t count) {
+        for (; count >= 11; count -= std::min(count, 138U)) {
+            bits.code(0, 1);
+            bits.number(std::min(count, 138U) - 11, 7);
+        }
+        for (; count > 0; --count)
+            bits.code(2, 2);
+    };
+    zeros(97);
+    bits.code(3, 2); // "a" is 0
+    zeros(158);
+    bits.code(3, 2); // the end is 1
+    zeros(literals - 257);
+    bits.code(3, 2); // distance 1 is 0
+    zeros(distances - 1);
+    for (int i = 0; i < 84; ++i)
+        bits.code(0, 1);
+    bits.code(1, 1);
+    return bits.data();
+}
 
 class SoundEntryTest : public testing::Test {
 protected:
@@ -22,6 +106,15 @@ protected:
         entry.method = method;
         entry.compressedSize = static_cast<std::uint32_t>(packedSize);
         entry.uncompressedSize = static_cast<std::uint32_t>(size);
+        return entry;
+    }
+
+    /// The deflated entry that `data` begins with, with size and CRC-32 of `content`.
+    static ZipEntry confirmedEntry(const std::string& data, const std::string& content)
+    {
+        ZipEntry entry = entryOf(8, data.size(), content.size());
+        entry.crc32 = static_cast<std::uint32_t>(
+            crc32_z(0, reinterpret_cast<const Bytef*>(content.data()), content.size()));
         return entry;
     }
 
@@ -64,6 +157,96 @@ TEST_F(SoundEntryTest, ADeflatedEntryOfManyPiecesArrivesWhole)
 
         EXPECT_TRUE(content == readFile(destination)) << size;
         ASSERT_EQ(0, unlink(destination.c_str()));
+    }
+}
+
+TEST_F(SoundEntryTest, AConfirmedEntryOfAnySizeArrivesWhole)
+{
+    constexpr std::size_t Largest = 16 * 1024 * 1024; // inflated in one call
+    for (const std::size_t size : {std::size_t{40}, std::size_t{8192}, std::size_t{1000000},
+                                   Largest - 1, Largest, Largest + 1, std::size_t{50}}) {
+        const std::string content = textBytes(40, 6) + std::string(size - 40, 'x');
+        const std::string data = rawDeflate(content);
+
+        EXPECT_EQ(0, copy(data + "what follows", confirmedEntry(data, content))) << size;
+
+        EXPECT_TRUE(content == readFile(destination)) << size;
+        ASSERT_EQ(0, unlink(destination.c_str()));
+    }
+}
+
+TEST_F(SoundEntryTest, AnEntryThatDeflatingMadeLargerArrivesWhole)
+{
+    const std::string content = noiseBytes(200000, 7);
+    const std::string data = rawDeflate(content);
+    ASSERT_GT(data.size(), content.size());
+
+    EXPECT_EQ(0, copy(data, confirmedEntry(data, content)));
+
+    EXPECT_TRUE(content == readFile(destination));
+}
+
+TEST_F(SoundEntryTest, AnEntryWithAWrongChecksumArrivesWhole)
+{
+    const std::string content = textBytes(1000, 8);
+    const std::string data = rawDeflate(content);
+    ZipEntry entry = confirmedEntry(data, content);
+    entry.crc32 ^= 1;
+
+    EXPECT_EQ(0, copy(data, entry));
+
+    EXPECT_EQ(content, readFile(destination));
+}
+
+TEST_F(SoundEntryTest, AConfirmedEntryThatEndsBeforeItsDataIsSound)
+{
+    const std::string content = textBytes(1000, 9);
+    const std::string data = rawDeflate(content);
+    ZipEntry entry = confirmedEntry(data, content);
+    entry.compressedSize += 4;
+
+    EXPECT_EQ(0, copy(data + "more", entry));
+
+    EXPECT_EQ(content, readFile(destination));
+}
+
+TEST_F(SoundEntryTest, AConfirmedEntryCutByTheEndOfTheArchiveIsNotSound)
+{
+    const std::string content = textBytes(1000, 10);
+    const std::string data = rawDeflate(content);
+
+    EXPECT_EQ(EntryNotSound, copy(data.substr(0, data.size() - 1), confirmedEntry(data, content)));
+}
+
+TEST_F(SoundEntryTest, AnEntryThatOnlyTheStreamsZlibRefusesArrivesAsItWasPacked)
+{
+    struct Case {
+        std::string data;
+        std::string content;
+    };
+    const std::string text(84, 'a');
+    for (const auto& [data, content] :
+         {Case{fixedBlock(286), std::string(259, 'a')},
+          Case{fixedBlock(287), std::string(259, 'a')}, Case{dynamicBlock(287, 1), text},
+          Case{dynamicBlock(288, 1), text}, Case{dynamicBlock(286, 31), text},
+          Case{dynamicBlock(286, 32), text}}) {
+        const ZipEntry entry = confirmedEntry(data, content);
+        ZipEntry otherwise = entry;
+        otherwise.crc32 ^= 1;
+
+        EXPECT_EQ(EntryNotSound, copy(data, otherwise));
+        EXPECT_EQ(0, copy(data, entry));
+
+        EXPECT_EQ(content, readFile(destination));
+        ASSERT_EQ(0, unlink(destination.c_str()));
+    }
+}
+
+TEST_F(SoundEntryTest, TheHandmadeBlocksAreSoundWithinTheirLimits)
+{
+    for (const auto& [data, content] : {std::pair{fixedBlock(285), std::string(259, 'a')},
+                                        std::pair{dynamicBlock(286, 30), std::string(84, 'a')}}) {
+        EXPECT_EQ(content, rawInflate(data, content.size()));
     }
 }
 
@@ -159,12 +342,14 @@ TEST_F(SoundEntryTest, AnEntryIsReadFromItsPlaceWhereverTheArchiveStands)
     EXPECT_EQ(3, lseek(archive.get(), 0, SEEK_CUR));
 }
 
-TEST_F(SoundEntryTest, AFullDiskIsToldForADeflatedEntry)
+TEST_F(SoundEntryTest, AFullDiskIsReportedForADeflatedEntry)
 {
     const ScopedFd full(open("/dev/full", O_WRONLY));
-    const std::string data = rawDeflate("text");
+    const std::string content(1000, 'x');
+    const std::string data = rawDeflate(content);
 
-    EXPECT_EQ(6, copyTo(full.get(), data, entryOf(8, data.size(), 4)));
+    EXPECT_EQ(6, copyTo(full.get(), data, entryOf(8, data.size(), 1000)));
+    EXPECT_EQ(6, copyTo(full.get(), data, confirmedEntry(data, content)));
 }
 
 TEST_F(SoundEntryTest, AFullDiskIsLeftToTheStreamForAStoredEntry)

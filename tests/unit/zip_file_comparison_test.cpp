@@ -191,6 +191,12 @@ const char* wound(Dice& dice, std::string& data, ZipEntry& entry, bool& cut)
     }
 }
 
+std::uint32_t checksum(const std::string& bytes)
+{
+    return static_cast<std::uint32_t>(
+        crc32_z(0, reinterpret_cast<const Bytef*>(bytes.data()), bytes.size()));
+}
+
 Sample makeSample(std::uint32_t seed)
 {
     Dice dice(seed);
@@ -200,6 +206,8 @@ Sample makeSample(std::uint32_t seed)
     sample.entry.method = 8;
     sample.entry.compressedSize = static_cast<std::uint32_t>(data.size());
     sample.entry.uncompressedSize = static_cast<std::uint32_t>(sample.content.size());
+    if (!dice.oneIn(8)) // else unknown, as some packers leave it
+        sample.entry.crc32 = checksum(sample.content);
     bool cut = false;
     for (std::uint32_t wounds = dice.below(10) * 3 / 10; wounds > 0; --wounds)
         sample.wounds += wound(dice, data, sample.entry, cut);
@@ -435,6 +443,7 @@ TEST_F(ExtractionComparisonTest, TheFileHoldsWhatTheModelDelivers)
 {
     const std::uint32_t entries = numberFromEnvironment("WZOR_STREAM_ENTRIES", 1500);
     const std::uint32_t first = numberFromEnvironment("WZOR_STREAM_SEED", FirstSeed);
+    std::uint32_t rescued = 0;
 
     for (std::uint32_t seed = first; seed != first + entries; ++seed) {
         const Sample sample = makeSample(seed);
@@ -450,8 +459,16 @@ TEST_F(ExtractionComparisonTest, TheFileHoldsWhatTheModelDelivers)
             sample.wounds + ")";
         ASSERT_TRUE(aborts ? WIFSIGNALED(status) && WTERMSIG(status) == SIGABRT : status == 0)
             << again;
-        ASSERT_TRUE(expected == readFile(destination)) << again;
+        const std::string file = readFile(destination);
+        if (file == expected)
+            continue;
+        // Whole where zlib refuses to deliver it whole: see inflateWhole().
+        ASSERT_TRUE(file == sample.content && sample.entry.crc32 == checksum(file)) << again;
+        ++rescued;
     }
+
+    RecordProperty("rescued", static_cast<int>(rescued));
+    EXPECT_LE(rescued, entries / 1000);
 }
 
 } // namespace

@@ -253,6 +253,29 @@ int parseCommandLine(int argc, char** argv, CommandLine& commandLine)
     return code != 0 ? code : checkOptions(commandLine, options);
 }
 
+int fixDestination(CommandLine& commandLine, const std::string& defaultDir)
+{
+    std::string& destDir = commandLine.destDir;
+    if (destDir.empty())
+        destDir = defaultDir;
+    if (destDir.empty()) {
+        *logstream << "*** Error: no destination directory.\n";
+        return printUsage();
+    }
+    if (destDir.back() == '/')
+        destDir.pop_back();
+    return 0;
+}
+
+InstallRegistry requestOf(const CommandLine& commandLine)
+{
+    InstallRegistry request = commandLine.installer;
+    request.exploiters = commandLine.exploiter;
+    request.homeDirectory = commandLine.destDir;
+    request.configRootDirectory = commandLine.destDir;
+    return request;
+}
+
 int printUsage()
 {
     std::cout << "Usage: wzorinst i|r|t <exploiterID> [-o <log file>] [-s <spblock_path>] "

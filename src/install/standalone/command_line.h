@@ -24,5 +24,12 @@ struct CommandLine {
 /// helps.
 [[nodiscard]] int parseCommandLine(int argc, char** argv, CommandLine& commandLine);
 
+/// Fixes the destination: `defaultDir` unless the command line names another, without a final
+/// slash. Returns 0, or 1 when there is none: that and the usage text were printed.
+[[nodiscard]] int fixDestination(CommandLine& commandLine, const std::string& defaultDir);
+
+/// The installer's own record: what it brings, for whom and whereto.
+[[nodiscard]] InstallRegistry requestOf(const CommandLine& commandLine);
+
 /// Prints the usage text on standard output and returns 1, the exit status that goes with it.
 int printUsage();

@@ -49,9 +49,14 @@ void writeDefaultSetting(const std::string& path)
 
 } // namespace
 
+std::string commonSettingPath()
+{
+    return joinPath(SettingDirectory, SettingFileName);
+}
+
 std::string readCommonDirectory(bool readOnly)
 {
-    const std::string path = commonDirectorySetting();
+    const std::string path = commonSettingPath();
     const ScopedFile file = openForReading(path);
     if (file)
         return commonDirectoryOf(file.get());
@@ -59,9 +64,4 @@ std::string readCommonDirectory(bool readOnly)
     if (!readOnly && pathIsMissing(path))
         writeDefaultSetting(path);
     return DefaultCommonDirectory;
-}
-
-std::string commonDirectorySetting()
-{
-    return joinPath(SettingDirectory, SettingFileName);
 }

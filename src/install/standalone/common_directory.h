@@ -8,12 +8,12 @@
 
 extern const std::string KeyCorvanCommonDir; ///< "corvan_common_dir"
 
+/// The setting file.
+[[nodiscard]] std::string commonSettingPath();
+
 /// The common directory.
 ///
 /// Unless `readOnly`, a missing setting file is written with the default, with the directories that
 /// lead to it: not journalled, so they outlive a rollback. Failures are not reported. A setting
 /// file that exists but cannot be read is left alone; the default applies.
 [[nodiscard]] std::string readCommonDirectory(bool readOnly);
-
-/// The path of the setting file.
-[[nodiscard]] std::string commonDirectorySetting();

@@ -10,6 +10,7 @@
 #include <cstdio>
 #include <ostream>
 
+#include <fcntl.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
@@ -18,16 +19,26 @@ namespace {
 constexpr const char* ProbeFileName = "$_ZOR_$";
 constexpr mode_t ProbeFileMode = 0600;
 
-/// Whether a file can be created in `home`; the probe is deleted again.
-int probeHome(const std::string& home)
+/// Creates a file in `home` and deletes it again; false when that fails.
+bool canCreateProbe(const std::string& home)
 {
     const std::string probe = joinPath(home, ProbeFileName);
-    if (!openStream(probe, Existing::TruncateUnlinked, ProbeFileMode)) {
-        *logstream << "*** Error: cannot create file in INI home dir.\n";
-        return HomeNotWritable;
-    }
+    if (!openStream(probe, Existing::TruncateUnlinked, ProbeFileMode))
+        return false;
     (void)unlinkPath(probe); // an empty file at the worst
-    return RegistryOk;
+    return true;
+}
+
+/// Whether a file can be created in `home`.
+int probeHome(const std::string& home, bool readOnly)
+{
+    const bool writable =
+        readOnly ? faccessat(AT_FDCWD, (home + "/.").c_str(), W_OK | X_OK, AT_EACCESS) == 0
+                 : canCreateProbe(home);
+    if (writable)
+        return RegistryOk;
+    *logstream << "*** Error: cannot create file in INI home dir.\n";
+    return HomeNotWritable;
 }
 
 /// Whether the scanner control of the installation in `home` is there and not empty.
@@ -47,15 +58,15 @@ int checkScannerControl(const std::string& home)
     return RegistryOk;
 }
 
-int verifyHome(const std::string& home)
+int verifyHome(const std::string& home, bool readOnly)
 {
     *logstream << "INI file found, verifying...\n";
-    const int status = probeHome(home);
+    const int status = probeHome(home, readOnly);
     return status != RegistryOk ? status : checkScannerControl(home);
 }
 
 /// Reads and verifies the registry; returns the status.
-int findRegistry(InstallRegistry& registry)
+int findRegistry(InstallRegistry& registry, bool readOnly)
 {
     const std::string path = registryPath(localInstall);
     *logstream << "Looking for INI file: " << path << '\n';
@@ -65,7 +76,7 @@ int findRegistry(InstallRegistry& registry)
         registry.configRootDirectory = registry.homeDirectory;
 
     if (status == RegistryOk)
-        return verifyHome(registry.homeDirectory);
+        return verifyHome(registry.homeDirectory, readOnly);
     *logstream << "INI file not found or outdated (code=" << status << ")\n";
     return status;
 }
@@ -93,10 +104,10 @@ void forceUpdate(InstallRegistry& registry, const ZorVersion& installerVersion)
 
 } // namespace
 
-Discovery discoverInstallation(const CommandLine& commandLine)
+Discovery discoverInstallation(const CommandLine& commandLine, bool readOnly)
 {
     Discovery found;
-    found.status = findRegistry(found.registry);
+    found.status = findRegistry(found.registry, readOnly);
     found.registryFound = found.status == RegistryOk;
     found.installAction = decideAction(commandLine.action);
 

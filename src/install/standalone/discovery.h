@@ -28,5 +28,6 @@ enum VerificationCode : int {
 /// Reads and verifies the registry of this run's install type and decides; logs each step.
 ///
 /// A broken installation that is installed again is turned into an upgrade, in which failures to
-/// stop the scanners are tolerated.
-[[nodiscard]] Discovery discoverInstallation(const CommandLine& commandLine);
+/// stop the scanners are tolerated. The home directory is probed by a file that is created and
+/// deleted again; with `readOnly` by asking the system, which changes nothing.
+[[nodiscard]] Discovery discoverInstallation(const CommandLine& commandLine, bool readOnly = false);

@@ -26,12 +26,6 @@ std::string quotedIfBlank(const std::string& text)
     return text.find(' ') == std::string::npos ? text : "\"" + text + "\"";
 }
 
-/// The toolkit's log directory below the common directory.
-std::string commonLogDir(const std::string& common)
-{
-    return joinPath(common, joinPath(zorCommonDir, logDir));
-}
-
 /// Sets the mode of `count` directories from `path` upwards.
 void setModesUpwards(FileTransaction& transaction, std::string path, std::size_t count, mode_t mode)
 {
@@ -120,6 +114,11 @@ void setLibraryPath(const std::string& home)
     if (result != 0)
         *logstream << "Setting up the '" << LibraryPathName
                    << "' variable has failed. Error = " << result << '\n';
+}
+
+std::string commonLogDir(const std::string& common)
+{
+    return joinPath(common, joinPath(zorCommonDir, logDir));
 }
 
 int setupCommonLogDir(FileTransaction& transaction, const std::string& /*home*/, bool useCustomPath,

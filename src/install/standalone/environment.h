@@ -39,6 +39,9 @@ void setLibraryPath(const std::string& home);
 int setupCommonLogDir(FileTransaction& transaction, const std::string& home, bool useCustomPath,
                       const std::string& customPath);
 
+/// The toolkit's log directory below the common directory `common`.
+[[nodiscard]] std::string commonLogDir(const std::string& common);
+
 /// setupCommonLogDir(), then tells the toolkit where its trace files go. Returns the status of the
 /// scanner control program.
 [[nodiscard]] int updateCommonTracePath(FileTransaction& transaction, const std::string& home,

@@ -15,6 +15,7 @@
 #include <iostream>
 #include <memory>
 #include <set>
+#include <vector>
 
 namespace {
 
@@ -25,20 +26,6 @@ void trace(bool debug, const char* what, const std::string& value)
 {
     if (debug)
         std::cout << what << value << '\n';
-}
-
-std::string sourcePrefix(const std::string& subdir)
-{
-    return spbFileRoot + subdir + "/";
-}
-
-/// `dstDir` and `rest`, without two slashes in a row.
-std::string destinationName(const std::string& dstDir, const std::string& rest)
-{
-    std::string name = dstDir + "/" + rest;
-    for (std::size_t at = name.find("//"); at != std::string::npos; at = name.find("//", at))
-        name.erase(at, 1);
-    return name;
 }
 
 /// Extracts one entry to `destination`; a trailing slash means a directory.
@@ -96,21 +83,6 @@ int extractMatching(FileTransaction& transaction, OpenPackage& package,
     return FileOk;
 }
 
-/// Extracts "config", on an upgrade without the main property file. Never traces.
-int extractConfigs(FileTransaction& transaction, OpenPackage& package, const std::string& home,
-                   bool freshInstall)
-{
-    const std::string prefix = sourcePrefix(spbCfgDir);
-    const std::string destination = joinPath(home, spbCfgDir);
-    std::string skipList;
-    if (!freshInstall)
-        appendToNameList(skipList, prefix + zorProps);
-
-    *logstream << "Extracting configs to '" << destination << "'\n" << std::flush;
-    return extractMatching(transaction, package, prefix, destination, PublicMode, &skipList,
-                          zor_file_handle, false);
-}
-
 /// Extracts the package directories in their order; returns the first failing code.
 int extractDirs(FileTransaction& transaction, const ZipFile& archive, const std::string& home,
                 bool freshInstall)
@@ -118,28 +90,54 @@ int extractDirs(FileTransaction& transaction, const ZipFile& archive, const std:
     OpenPackage package(archive);
     const ScopedDirectoryReuse reuse;
     const ScopedUmask mask(globalFilesUmask);
-    const auto extract = [&](const std::string& subdir, mode_t mode) {
-        return extractMatching(transaction, package, sourcePrefix(subdir), joinPath(home, subdir), mode,
-                               nullptr, zor_file_handle, debugMode);
-    };
-
-    int code = extract(spbBinDir, PublicMode);
-    if (code != FileOk)
-        *logstream << "Bin dir file extraction failed\n";
-    if (code == FileOk)
-        code = extract(spbPropertiesDir, PublicMode);
-    if (code == FileOk)
-        code = extractConfigs(transaction, package, home, freshInstall);
-    // Deliberate: the step above has extracted these already; the second pass backs up and lists
-    // them once more.
-    if (code == FileOk)
-        code = extract(joinPath(spbCfgDir, spbCfgXssDir), PublicMode);
-    if (code == FileOk)
-        code = extract(auxDirInstall, InstallDirMode);
-    return code;
+    for (const ExtractionStep& step : extractionSteps(freshInstall)) {
+        const std::string destination = joinPath(home, step.subdir);
+        const bool isConfig = step.subdir == spbCfgDir; // says so, and never traces
+        if (isConfig)
+            *logstream << "Extracting configs to '" << destination << "'\n" << std::flush;
+        const int code =
+            extractMatching(transaction, package, sourcePrefix(step.subdir), destination, step.mode,
+                            isConfig ? &step.skipList : nullptr, zor_file_handle,
+                            debugMode && !isConfig);
+        if (code == FileOk)
+            continue;
+        if (step.subdir == spbBinDir)
+            *logstream << "Bin dir file extraction failed\n";
+        return code;
+    }
+    return FileOk;
 }
 
 } // namespace
+
+std::string sourcePrefix(const std::string& subdir)
+{
+    return spbFileRoot + subdir + "/";
+}
+
+std::string destinationName(const std::string& dstDir, const std::string& rest)
+{
+    std::string name = dstDir + "/" + rest;
+    for (std::size_t at = name.find("//"); at != std::string::npos; at = name.find("//", at))
+        name.erase(at, 1);
+    return name;
+}
+
+std::vector<ExtractionStep> extractionSteps(bool freshInstall)
+{
+    std::string settings; // the owner's by now
+    if (!freshInstall)
+        appendToNameList(settings, sourcePrefix(spbCfgDir) + zorProps);
+    return {
+        {spbBinDir, PublicMode, ""},
+        {spbPropertiesDir, PublicMode, ""},
+        {spbCfgDir, PublicMode, settings},
+        // Deliberate: the step above has extracted these already; the second pass backs up and
+        // lists them once more.
+        {joinPath(spbCfgDir, spbCfgXssDir), PublicMode, ""},
+        {auxDirInstall, InstallDirMode, ""},
+    };
+}
 
 int extractPackage(const std::string& spbPath, FileTransaction& transaction,
                    InstallRegistry& installation, bool freshInstall, const std::string* logPath)

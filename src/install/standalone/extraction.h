@@ -8,12 +8,30 @@
 
 #include <cstdio>
 #include <string>
+#include <vector>
 
 #include <sys/types.h>
 
 class ZipFile;
 struct FileTransaction;
 struct InstallRegistry;
+
+/// One package directory, as an installation extracts it.
+struct ExtractionStep {
+    std::string subdir;   ///< below the image root, and below the home directory
+    mode_t mode;          ///< of the files, and before the permission pass of the directories
+    std::string skipList; ///< names of entries that are passed over
+};
+
+/// The package directories in the order of their extraction.
+[[nodiscard]] std::vector<ExtractionStep> extractionSteps(bool freshInstall);
+
+/// How the names of the entries in the package directory `subdir` begin.
+[[nodiscard]] std::string sourcePrefix(const std::string& subdir);
+
+/// Where an entry goes whose name is a prefix and `rest`: `dstDir` and `rest`, without two slashes
+/// in a row. With one byte or none of it, the entry is passed over.
+[[nodiscard]] std::string destinationName(const std::string& dstDir, const std::string& rest);
 
 /// Extracts the whole package at `spbPath` into the home of `installation`, journalled, and writes
 /// the index of installed files at `logPath` (null: none).

@@ -71,18 +71,12 @@ int customize(const std::string& path, Edit edit)
 int customizeProperties(const std::string& home)
 {
     const std::string config = joinPath(home, spbCfgDir);
-    const int code = customize(joinPath(config, zorProps), [&](PropertyFile& file) {
-        replaceAll(file, tokenZorDestDir, home);
-        replaceAll(file, tokenZorCfgRoot, home);
-        replaceAll(file, tokenFileSeparator, "/");
-        replaceAll(file, tokenScannerMode, fileScannerMode);
-    });
+    const int code = customize(joinPath(config, zorProps),
+                               [&](PropertyFile& file) { fillMainProperties(file, home); });
     if (code != 0)
         return code;
-    return customize(joinPath(config, traceProps), [&](PropertyFile& file) {
-        replaceAll(file, tokenZorDestDir, home);
-        replaceAll(file, tokenZorCfgRoot, home);
-    });
+    return customize(joinPath(config, traceProps),
+                     [&](PropertyFile& file) { fillTraceProperties(file, home); });
 }
 
 /// Completes the exploiter list and saves the registry.
@@ -99,22 +93,6 @@ int registerInstallation(FileTransaction& transaction, InstallRegistry& registry
                              nullptr);
     }
     return saveRegistry(transaction, registry);
-}
-
-/// Records whether the installation is the shared or a per-user one. Not journalled; a failure is
-/// logged only.
-void writeInstallType(const std::string& home, const std::string* indexPath)
-{
-    const ScopedUmask mask(globalFilesUmask);
-    const std::string path = joinPath(home, joinPath(auxDirInstall, installProps));
-    const std::string& type = localInstall ? valueInstallLocal : valueInstallGlobal;
-    const int code = replaceFile(path, NewFileMode, [&](std::FILE* file) {
-        (void)std::fprintf(file, "%s=%s\n", keyInstallType.c_str(), type.c_str());
-    });
-    if (code == CannotOpenForWriting)
-        *logstream << "Could not create file " << path << '\n';
-    else if (indexPath != nullptr)
-        appendToFileIndex(*indexPath, path);
 }
 
 /// The installation up to its last fatal step.
@@ -144,6 +122,34 @@ int installFiles(FileTransaction& transaction, InstallRegistry& registry,
 }
 
 } // namespace
+
+void fillMainProperties(PropertyFile& file, const std::string& home)
+{
+    replaceAll(file, tokenZorDestDir, home);
+    replaceAll(file, tokenZorCfgRoot, home);
+    replaceAll(file, tokenFileSeparator, "/");
+    replaceAll(file, tokenScannerMode, fileScannerMode);
+}
+
+void fillTraceProperties(PropertyFile& file, const std::string& home)
+{
+    replaceAll(file, tokenZorDestDir, home);
+    replaceAll(file, tokenZorCfgRoot, home);
+}
+
+void writeInstallType(const std::string& home, const std::string* indexPath)
+{
+    const ScopedUmask mask(globalFilesUmask);
+    const std::string path = joinPath(home, joinPath(auxDirInstall, installProps));
+    const std::string& type = localInstall ? valueInstallLocal : valueInstallGlobal;
+    const int code = replaceFile(path, NewFileMode, [&](std::FILE* file) {
+        (void)std::fprintf(file, "%s=%s\n", keyInstallType.c_str(), type.c_str());
+    });
+    if (code == CannotOpenForWriting)
+        *logstream << "Could not create file " << path << '\n';
+    else if (indexPath != nullptr)
+        appendToFileIndex(*indexPath, path);
+}
 
 int freshInstall(FileTransaction& transaction, InstallRegistry& registry,
                  const std::string* indexPath, bool writeRegistry, bool useCustomPath,

@@ -5,6 +5,17 @@
 
 struct FileTransaction;
 struct InstallRegistry;
+struct PropertyFile;
+
+/// Fills the placeholders of a new "Zor.properties" in.
+void fillMainProperties(PropertyFile& file, const std::string& home);
+
+/// Fills the placeholders of a new "ZorTrace.properties" in.
+void fillTraceProperties(PropertyFile& file, const std::string& home);
+
+/// Records in `home` whether the installation is the shared or a per-user one, and adds the record
+/// to the index at `indexPath` (null: none). Not journalled; a failure is logged only.
+void writeInstallType(const std::string& home, const std::string* indexPath);
 
 /// Installs `spbPackage` into the home of `registry`, journalled.
 ///

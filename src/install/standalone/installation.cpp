@@ -37,7 +37,7 @@ std::vector<std::string> writtenDirectories(const std::string& home, bool useCus
         directories.push_back(customPath);
     else if (!localInstall)
         directories.insert(directories.end(),
-                           {readCommonDirectory(true), commonDirectorySetting()});
+                           {readCommonDirectory(true), commonSettingPath()});
     return directories;
 }
 

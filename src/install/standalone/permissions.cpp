@@ -13,23 +13,23 @@
 
 namespace {
 
-struct Permission {
+struct Row {
     std::string base;
     std::string relativePath;
     mode_t mode;
     std::string scope; ///< "all", or the install type that it is for
 };
 
-std::vector<Permission> permissionTable(const Discovery& found)
+std::vector<Row> rowsOf(const Discovery& found)
 {
     const std::string& home = found.currentZorHome;
     const std::string& cfg = found.currentCfgHome;
     const std::string reg = registryDirectory(localInstall);
 
-    std::vector<Permission> table;
+    std::vector<Row> table;
     if (!found.homeExists || (applySingleUserMode && !localInstall))
         table.push_back({home, "", 0755, "all"});
-    const Permission fixed[] = {
+    const Row fixed[] = {
         {cfg, "cache_data", CacheDirRootMode, "global"},
         {cfg, "cache_data", 0770, "local"},
         {cfg, "config", 0755, "all"},
@@ -60,14 +60,22 @@ std::vector<Permission> permissionTable(const Discovery& found)
 
 void apply(const Permission& permission)
 {
-    if (permission.scope != installTypeName(localInstall) && permission.scope != "all")
-        return;
-    const std::string path = joinPath(permission.base, permission.relativePath);
+    const std::string& path = permission.path;
     if (changeMode(path, permission.mode) == ModeChange::Failed)
         *logstream << "Unable to change permissions to '" << path << "' file/directory\n";
 }
 
 } // namespace
+
+std::vector<Permission> permissionTable(const Discovery& found)
+{
+    std::vector<Permission> table;
+    for (const Row& row : rowsOf(found)) {
+        if (row.scope == installTypeName(localInstall) || row.scope == "all")
+            table.push_back({joinPath(row.base, row.relativePath), row.mode});
+    }
+    return table;
+}
 
 void applyPermissions(FileTransaction& transaction, const Discovery& found)
 {

@@ -3,6 +3,20 @@
 
 #include "discovery.h"
 
+#include <string>
+#include <vector>
+
+#include <sys/types.h>
+
+/// A path, and the mode that it has if it exists.
+struct Permission {
+    std::string path;
+    mode_t mode;
+};
+
+/// What the permission pass sets for this run's install type, in its order.
+[[nodiscard]] std::vector<Permission> permissionTable(const Discovery& found);
+
 /// Sets the mode of everything in the installation and its registry that has a fixed one; what does
 /// not exist is passed over, a failure is logged only. Then an upgrade starts with an empty scanner
 /// cache: its directory is removed through `transaction`.

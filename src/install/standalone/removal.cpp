@@ -17,6 +17,7 @@
 
 #include <cstdio>
 #include <cstring>
+#include <iterator>
 #include <ostream>
 
 namespace {
@@ -35,94 +36,77 @@ struct ClientDirs {
     std::string catalogueC = joinPath(catalogues, "C");
 };
 
-/// Removes directories of one installation, deeper ones first by the order of the calls.
-class DirectoryRemoval {
-public:
-    DirectoryRemoval(FileTransaction& transaction, const std::string& home)
-        : transaction_(transaction), home_(home)
-    {
-    }
-
-    /// The files directly in it, then the directory if that leaves it empty.
-    void withFiles(const std::string& sub) const
-    {
-        (void)removeDir(transaction_, home_, sub, false);
-    }
-
-    void withEverything(const std::string& sub) const
-    {
-        (void)removeDir(transaction_, home_, sub, true);
-    }
-
-    void ifEmpty(const std::string& sub) const
-    {
-        (void)removeDirectory(joinPathOptional(home_, sub)); // stays otherwise
-    }
-
-private:
-    FileTransaction& transaction_;
-    const std::string& home_;
-};
-
-void removeScannerDirs(const DirectoryRemoval& remove)
+/// The steps for the directories of the scanners, in "bin/etc", and for that directory.
+void addScannerDirs(std::vector<RemovalStep>& steps)
 {
     const std::string binEtc = joinPath(spbBinDir, etcDir);
     for (const char* const name : ScannerDirs)
-        remove.withFiles(joinPath(binEtc, name));
-    remove.withFiles(binEtc);
+        steps.push_back({WithFiles, joinPath(binEtc, name)});
+    steps.push_back({WithFiles, binEtc});
 }
 
 /// After the listed files: what is left of the directories.
-void removeLeftovers(const DirectoryRemoval& remove)
+std::vector<RemovalStep> leftovers()
 {
     const ClientDirs dirs;
-    remove.withFiles(UninstallFileName);
-    remove.ifEmpty(dirs.platformBin);
-    remove.ifEmpty(dirs.platformLib);
-    remove.ifEmpty(dirs.catalogueC);
-    remove.withFiles(dirs.catalogues);
-    remove.withFiles(dirs.platform);
-    remove.withFiles(dirs.client);
-    remove.withFiles(auxDirInstall);
-    removeScannerDirs(remove);
-    remove.ifEmpty(joinPath(spbBinDir, spbBinPluginsDir));
-    remove.ifEmpty(joinPath(spbBinDir, spbBinCustomScannersDir));
-    remove.ifEmpty(spbBinDir);
-    remove.withEverything(spbPropertiesDir);
-    remove.withEverything(spbCfgDir);
-    remove.withFiles(logDir);
-    remove.withEverything(cacheDir);
-    remove.ifEmpty("");
+    std::vector<RemovalStep> steps = {
+        {WithFiles, UninstallFileName}, {IfEmpty, dirs.platformBin},  {IfEmpty, dirs.platformLib},
+        {IfEmpty, dirs.catalogueC},     {WithFiles, dirs.catalogues}, {WithFiles, dirs.platform},
+        {WithFiles, dirs.client},       {WithFiles, auxDirInstall},
+    };
+    addScannerDirs(steps);
+    const RemovalStep rest[] = {
+        {IfEmpty, joinPath(spbBinDir, spbBinPluginsDir)},
+        {IfEmpty, joinPath(spbBinDir, spbBinCustomScannersDir)},
+        {IfEmpty, spbBinDir},
+        {WithEverything, spbPropertiesDir},
+        {WithEverything, spbCfgDir},
+        {WithFiles, logDir},
+        {WithEverything, cacheDir},
+        {IfEmpty, ""},
+    };
+    steps.insert(steps.end(), std::begin(rest), std::end(rest));
+    return steps;
 }
 
 /// Without a list of files: everything at its known place.
-void removeKnownPlaces(const DirectoryRemoval& remove)
+std::vector<RemovalStep> knownPlaces()
 {
     const ClientDirs dirs;
-    remove.withFiles(UninstallFileName);
-    remove.withFiles(dirs.platformBin);
-    remove.withFiles(dirs.platformLib);
-    remove.withFiles(dirs.catalogueC);
-    remove.withFiles(dirs.catalogues);
-    remove.withFiles(dirs.platform);
-    remove.withFiles(dirs.client);
-    remove.withFiles(auxDirInstall);
-    removeScannerDirs(remove);
-    remove.withFiles(joinPath(spbBinDir, spbBinPluginsDir));
-    remove.withFiles(joinPath(spbBinDir, spbBinCustomScannersDir));
-    remove.withFiles(spbBinDir);
-    remove.withEverything(spbPropertiesDir);
-    remove.withFiles(joinPath(spbCfgDir, spbCfgXssDir));
-    remove.withEverything(spbCfgDir);
-    remove.withFiles(logDir);
-    remove.withEverything(cacheDir);
-    remove.withFiles("");
+    std::vector<RemovalStep> steps = {
+        {WithFiles, UninstallFileName}, {WithFiles, dirs.platformBin},
+        {WithFiles, dirs.platformLib},  {WithFiles, dirs.catalogueC},
+        {WithFiles, dirs.catalogues},   {WithFiles, dirs.platform},
+        {WithFiles, dirs.client},       {WithFiles, auxDirInstall},
+    };
+    addScannerDirs(steps);
+    const RemovalStep rest[] = {
+        {WithFiles, joinPath(spbBinDir, spbBinPluginsDir)},
+        {WithFiles, joinPath(spbBinDir, spbBinCustomScannersDir)},
+        {WithFiles, spbBinDir},
+        {WithEverything, spbPropertiesDir},
+        {WithFiles, joinPath(spbCfgDir, spbCfgXssDir)},
+        {WithEverything, spbCfgDir},
+        {WithFiles, logDir},
+        {WithEverything, cacheDir},
+        {WithFiles, ""},
+    };
+    steps.insert(steps.end(), std::begin(rest), std::end(rest));
+    return steps;
+}
+
+void perform(FileTransaction& transaction, const std::string& home, const RemovalStep& step)
+{
+    if (step.kind == IfEmpty)
+        (void)removeDirectory(joinPathOptional(home, step.path)); // stays otherwise
+    else
+        (void)removeDir(transaction, home, step.path, step.kind == WithEverything);
 }
 
 void removeCommonLogDir(FileTransaction& transaction)
 {
     const std::string common = readCommonDirectory(true);
-    deleteTemporaryFile(commonDirectorySetting());
+    deleteTemporaryFile(commonSettingPath());
     (void)removeDir(transaction, common, joinPath(zorCommonDir, logDir), false);
     (void)removeDir(transaction, common, zorCommonDir, false);
 }
@@ -152,11 +136,9 @@ int removeToolkit(FileTransaction& transaction, const InstallRegistry& registry,
         refreshFileIndex(registry, *logPath);
         deleteTemporaryFile(*logPath); // of a run that was killed
     }
-    const DirectoryRemoval remove(transaction, home);
-    if (removeListedFiles(logPath))
-        removeLeftovers(remove);
-    else
-        removeKnownPlaces(remove);
+    const bool listed = removeListedFiles(logPath);
+    for (const RemovalStep& step : removalSteps(listed))
+        perform(transaction, home, step);
 
     if (!localInstall)
         removeCommonLogDir(transaction);
@@ -165,6 +147,11 @@ int removeToolkit(FileTransaction& transaction, const InstallRegistry& registry,
 }
 
 } // namespace
+
+std::vector<RemovalStep> removalSteps(bool listed)
+{
+    return listed ? leftovers() : knownPlaces();
+}
 
 int removeInstallation(FileTransaction& transaction, InstallRegistry& registry,
                        const InstallRegistry& request, const std::string* logPath)

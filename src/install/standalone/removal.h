@@ -2,6 +2,7 @@
 #pragma once
 
 #include <string>
+#include <vector>
 
 struct FileTransaction;
 struct InstallRegistry;
@@ -14,6 +15,22 @@ struct InstallRegistry;
 /// Deletion is best effort and not journalled: no failure of it changes the result.
 [[nodiscard]] int removeInstallation(FileTransaction& transaction, InstallRegistry& registry,
                                      const InstallRegistry& request, const std::string* logPath);
+
+/// What a removal does with a directory.
+enum RemovalKind : int {
+    WithFiles,      ///< deletes the files directly in it, and then it if it is empty
+    WithEverything, ///< deletes it with all that is below
+    IfEmpty,        ///< deletes it if it is empty
+};
+
+struct RemovalStep {
+    RemovalKind kind;
+    std::string path; ///< relative to the home directory; empty for the home directory itself
+};
+
+/// What a removal does with the directories of an installation, in its order: after it deleted the
+/// files of an index (`listed`), or without any index.
+[[nodiscard]] std::vector<RemovalStep> removalSteps(bool listed);
 
 /// Deletes every file that the index at `logPath` (null: none) lists, and then the index. Returns
 /// true when it listed any; an empty line counts. A line of more than 1023 bytes is taken in

@@ -1,19 +1,22 @@
-// The quick road of an archive entry that is as its headers say.
+// Fast path for an archive entry that matches its headers.
 //
-// A stream (zip_file.h) delivers an entry in the blocks that its reader asks for. Of a damaged
-// entry the blocks decide how much is left; a sound one arrives whole whatever the steps. So it is
-// copied here in steps that suit zlib, which copies its window at every call, and the system. At
-// the first sign of anything else this gives up, and the caller starts again with the stream.
+// A stream (zip_file.h) delivers an entry in the blocks that its reader asks for, and of a damaged
+// entry the block size decides how much is delivered. A sound entry arrives whole whatever the
+// block size, so it is copied here in the steps that suit the inflater and the system. At the first
+// sign of damage this gives up, and the caller starts again with the stream.
 #pragma once
 
 struct ZipEntry;
 
-/// What copySoundEntry() returns beside the codes of file_codes.h.
+/// What copySoundEntry() returns besides the codes of file_codes.h.
 inline constexpr int EntryNotSound = -1;
 
-/// Writes the content of `entry` of `archive` to the empty file `destination`. The place where
-/// `archive` stands is neither used nor changed.
+/// Writes the content of `entry` of `archive` to the empty file `destination`. The file offset of
+/// `archive` is neither used nor changed.
 ///
 /// Returns 0; the code of a failed write (5, 6, 7); or EntryNotSound (-1): `destination` may then
-/// hold anything, and only the entry's stream tells what belongs there.
+/// hold anything, and the entry's stream decides what belongs there.
+///
+/// Keeps its buffers for the next entry: at most twice 16 MiB, and no more than the largest entry
+/// so far needed.
 [[nodiscard]] int copySoundEntry(int archive, const ZipEntry& entry, int destination);

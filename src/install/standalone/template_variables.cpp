@@ -18,6 +18,13 @@ int replaceAll(PropertyFile& file, const std::string& placeholder, const std::st
     return file.replaceText(placeholder, value);
 }
 
+void fillScript(PropertyFile& script, const std::string& home, const std::string& common)
+{
+    replaceAll(script, tokenZorDestDir, home);
+    replaceAll(script, tokenZorCfgRoot, home); // not the configuration root of the registry
+    replaceAll(script, tokenCorvanCommonDir, common);
+}
+
 int updateScript(const std::string& fileName, const std::string& home, const std::string& common)
 {
     const std::string path = joinPath(home, joinPath(auxDirInstall, fileName));
@@ -33,9 +40,7 @@ int updateScript(const std::string& fileName, const std::string& home, const std
     if (loaded != 0)
         return loaded;
 
-    replaceAll(script, tokenZorDestDir, home);
-    replaceAll(script, tokenZorCfgRoot, home); // not the configuration root of the registry
-    replaceAll(script, tokenCorvanCommonDir, common);
+    fillScript(script, home, common);
 
     const int saved = script.save(path);
     if (saved != 0)
@@ -45,6 +50,6 @@ int updateScript(const std::string& fileName, const std::string& home, const std
 
 void updateScripts(const std::string& home, const std::string& common)
 {
-    (void)updateScript("trawlcfg.sh", home, common);
-    (void)updateScript("rmdirs.sh", home, common);
+    for (const char* const name : ScriptNames)
+        (void)updateScript(name, home, common);
 }

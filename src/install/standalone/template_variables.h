@@ -16,6 +16,12 @@ extern const std::string tokenScannerMode;     ///< "$(fscanner_mode)"; property
 /// returns the number of replacements.
 int replaceAll(PropertyFile& file, const std::string& placeholder, const std::string& value);
 
+/// The scripts in "install" that carry placeholders.
+inline constexpr const char* ScriptNames[] = {"trawlcfg.sh", "rmdirs.sh"};
+
+/// Fills the placeholders of a script in.
+void fillScript(PropertyFile& script, const std::string& home, const std::string& common);
+
 /// Fills the placeholders of the script "install/"`fileName` in `home` in, and logs what it does.
 ///
 /// Returns 0, also when there is no such script, or the `errno` with which loading or saving

@@ -116,23 +116,6 @@ int loadOrSay(PropertyFile& file, const std::string& path)
     return code;
 }
 
-/// Edits the lines of the installed "Zor.properties", the user's settings among them, for the
-/// package's version.
-void upgradeProperties(PropertyFile& file, const std::string& home, const InstallRegistry& package,
-                       const std::string& common)
-{
-    for (const char* const key : ObsoleteKeys)
-        file.clearWhereKeyContains(key);
-    setPackageVersion(file, package);
-    addMissingKeys(file);
-
-    replaceAll(file, tokenZorDestDir, home);
-    replaceAll(file, tokenZorCfgRoot, home);
-    replaceAll(file, tokenCorvanCommonDir, common);
-    replaceAll(file, tokenFileSeparator, "/");
-    replaceAll(file, tokenScannerMode, fileScannerMode);
-}
-
 /// Logs the trace directory that "Zor.properties" names, if it names one.
 void lookForTraceDir(PropertyFile& file, const KeptTraceTexts& kept)
 {
@@ -161,7 +144,59 @@ int upgradeTraceProperties(const KeptTraceTexts& kept, const std::string& home)
     return saved;
 }
 
-/// Property files and scripts of the extracted package.
+/// Replaces the installed files, whose scanners are stopped, by those of the package.
+int deployFiles(FileTransaction& transaction, InstallRegistry& registry,
+                const InstallRegistry& package, const std::string* indexPath, bool useCustomPath)
+{
+    const std::string& home = registry.homeDirectory;
+    (void)removeDir(transaction, home, spbPropertiesDir, true);
+    removeObsoleteFiles(home);
+
+    const int extracted = extractPackage(spbPackage, transaction, registry, false, indexPath);
+    if (extracted != FileOk) {
+        *logstream << "File extraction failed\n";
+        return extracted;
+    }
+    (void)setSelinuxContext(home); // never fatal
+    if (isInterrupted())
+        return RunInterrupted;
+    return customizeDeployment(home, package, useCustomPath);
+}
+
+/// The common log directory and the registry, after `deployed` files or without any.
+int finishUpgrade(FileTransaction& transaction, InstallRegistry& registry,
+                  const InstallRegistry& package, bool deployed, bool useCustomPath,
+                  const std::string& customPath)
+{
+    if (!localInstall && !useCustomPath) {
+        const int code =
+            setupCommonLogDir(transaction, registry.homeDirectory, useCustomPath, customPath);
+        if (code != 0)
+            return code;
+    }
+    if (deployed)
+        registry.version = package.version;
+    const bool changed = updateRegistration(registry, package);
+    return deployed || changed ? saveRegistry(transaction, registry) : FileOk;
+}
+
+} // namespace
+
+void upgradeProperties(PropertyFile& file, const std::string& home, const InstallRegistry& package,
+                       const std::string& common)
+{
+    for (const char* const key : ObsoleteKeys)
+        file.clearWhereKeyContains(key);
+    setPackageVersion(file, package);
+    addMissingKeys(file);
+
+    replaceAll(file, tokenZorDestDir, home);
+    replaceAll(file, tokenZorCfgRoot, home);
+    replaceAll(file, tokenCorvanCommonDir, common);
+    replaceAll(file, tokenFileSeparator, "/");
+    replaceAll(file, tokenScannerMode, fileScannerMode);
+}
+
 int customizeDeployment(const std::string& home, const InstallRegistry& package, bool useCustomPath)
 {
     const std::string path = joinPath(joinPath(home, spbCfgDir), zorProps);
@@ -188,26 +223,6 @@ int customizeDeployment(const std::string& home, const InstallRegistry& package,
     return code;
 }
 
-/// Replaces the installed files, whose scanners are stopped, by those of the package.
-int deployFiles(FileTransaction& transaction, InstallRegistry& registry,
-                const InstallRegistry& package, const std::string* indexPath, bool useCustomPath)
-{
-    const std::string& home = registry.homeDirectory;
-    (void)removeDir(transaction, home, spbPropertiesDir, true);
-    removeObsoleteFiles(home);
-
-    const int extracted = extractPackage(spbPackage, transaction, registry, false, indexPath);
-    if (extracted != FileOk) {
-        *logstream << "File extraction failed\n";
-        return extracted;
-    }
-    (void)setSelinuxContext(home); // never fatal
-    if (isInterrupted())
-        return RunInterrupted;
-    return customizeDeployment(home, package, useCustomPath);
-}
-
-/// Adds the calling exploiter and a later build date to `registry`; true when that changed it.
 bool updateRegistration(InstallRegistry& registry, const InstallRegistry& package)
 {
     bool changed = false;
@@ -229,29 +244,17 @@ bool updateRegistration(InstallRegistry& registry, const InstallRegistry& packag
     return changed;
 }
 
-/// The common log directory and the registry, after `deployed` files or without any.
-int finishUpgrade(FileTransaction& transaction, InstallRegistry& registry,
-                  const InstallRegistry& package, bool deployed, bool useCustomPath,
-                  const std::string& customPath)
+std::vector<std::string> obsoleteFiles(const std::string& home)
 {
-    if (!localInstall && !useCustomPath) {
-        const int code =
-            setupCommonLogDir(transaction, registry.homeDirectory, useCustomPath, customPath);
-        if (code != 0)
-            return code;
-    }
-    if (deployed)
-        registry.version = package.version;
-    const bool changed = updateRegistration(registry, package);
-    return deployed || changed ? saveRegistry(transaction, registry) : FileOk;
+    std::vector<std::string> paths;
+    for (const char* const name : ObsoleteFiles)
+        paths.push_back(joinPath(joinPath(home, spbBinDir), name));
+    return paths;
 }
-
-} // namespace
 
 void removeObsoleteFiles(const std::string& home)
 {
-    for (const char* const name : ObsoleteFiles) {
-        const std::string path = joinPath(joinPath(home, spbBinDir), name);
+    for (const std::string& path : obsoleteFiles(home)) {
         if (pathExists(path))
             (void)deleteFile(path); // best effort
     }

@@ -48,31 +48,6 @@ std::string printSettings()
     return defaultDir;
 }
 
-/// Fixes the destination; returns 0, or 1 when there is none.
-int fixDestination(CommandLine& commandLine, const std::string& defaultDir)
-{
-    std::string& destDir = commandLine.destDir;
-    if (destDir.empty())
-        destDir = defaultDir;
-    if (destDir.empty()) {
-        *logstream << "*** Error: no destination directory.\n";
-        return printUsage();
-    }
-    if (destDir.back() == '/')
-        destDir.pop_back();
-    return 0;
-}
-
-/// The installer's own record: what it brings, for whom and whereto.
-InstallRegistry requestOf(const CommandLine& commandLine)
-{
-    InstallRegistry request = commandLine.installer;
-    request.exploiters = commandLine.exploiter;
-    request.homeDirectory = commandLine.destDir;
-    request.configRootDirectory = commandLine.destDir;
-    return request;
-}
-
 int removeRegistered(Discovery& found, const InstallRegistry& request)
 {
     if (!found.registryFound) {

@@ -1,6 +1,8 @@
 #undef NDEBUG // the assertion below holds in every build type
 #include "zip_file.h"
 
+#include "package_window.h"
+
 #include <algorithm>
 #include <cassert>
 #include <cstdio>
@@ -53,11 +55,10 @@ ScopedFd openForReading(const char* path)
     return ScopedFd(::open(path, O_RDONLY | O_NOCTTY | O_CLOEXEC));
 }
 
-/// Reads an archive's headers from a window of the file, so that one system call serves many.
+/// Reads an archive's headers one after the other.
 class HeaderReader {
 public:
-    // cppcheck-suppress uninitMemberVar // the window begins empty
-    explicit HeaderReader(int fd) : fd_(fd) {}
+    explicit HeaderReader(int fd) : window_(fd) {}
 
     [[nodiscard]] std::int64_t position() const { return position_; }
 
@@ -73,45 +74,24 @@ public:
 
     bool seekBeforeEnd(std::int64_t distance)
     {
-        const std::int64_t end = ::lseek(fd_, 0, SEEK_END);
+        const std::int64_t end = ::lseek(window_.fd(), 0, SEEK_END);
         return seek(end - distance);
     }
 
-    /// Reads exactly `size` bytes, at most MaxNameLength of them, and moves on.
+    /// Reads exactly `size` bytes and moves on.
     bool read(void* buffer, std::size_t size)
     {
-        if (!inWindow(size) && !fill(size))
+        const unsigned char* const bytes = window_.bytes(position_, size);
+        if (bytes == nullptr)
             return false;
-        std::memcpy(buffer, window_ + (position_ - start_), size);
+        std::memcpy(buffer, bytes, size);
         position_ += static_cast<std::int64_t>(size);
         return true;
     }
 
 private:
-    [[nodiscard]] bool inWindow(std::size_t size) const
-    {
-        return position_ >= start_ && position_ + static_cast<std::int64_t>(size) <= end_;
-    }
-
-    /// Moves the window to the position; true when it then holds `size` bytes.
-    bool fill(std::size_t size)
-    {
-        start_ = end_ = position_;
-        while (!inWindow(size)) {
-            const auto held = static_cast<std::size_t>(end_ - start_);
-            const ssize_t count = ::pread(fd_, window_ + held, sizeof window_ - held, end_);
-            if (count <= 0)
-                return false;
-            end_ += count;
-        }
-        return true;
-    }
-
-    int fd_;
+    PackageWindow window_;
     std::int64_t position_ = 0;
-    std::int64_t start_ = 0; ///< the window holds the bytes from start_ to before end_
-    std::int64_t end_ = 0;
-    unsigned char window_[4096];
 };
 
 /// Reads a name of `length` bytes and cuts it at its first NUL.

@@ -4,6 +4,7 @@
 #include "exit_status.h"
 #include "settings.h"
 #include "status.h"
+#include "verify.h"
 
 #include <CLI/CLI.hpp>
 #include <clocale>
@@ -41,6 +42,22 @@ void addStatus(CLI::App& app, int& status)
     });
 }
 
+/// Adds the subcommand "verify".
+void addVerify(CLI::App& app, int& status)
+{
+    CLI::App* const command =
+        app.add_subcommand("verify", "Compare the installation with its package or its index");
+    static VerifyOptions options;
+    command->add_option("SPB", options.spb, "the package; without it, the index is compared with");
+    command->add_flag("--json", options.json, "print JSON");
+    command->add_option("--type", options.type, "the shared (global) or your own (local) one")
+        ->check(CLI::IsMember({"global", "local"}));
+    command->add_flag("--no-foreign", options.noForeign, "leave out files that nobody installed");
+    command->add_flag("--no-customised", options.noCustomised, "leave out changed settings");
+    command->add_flag("--strict", options.strict, "end with 1 for these two as well");
+    command->callback([&status] { status = verifyInstallation(options); });
+}
+
 } // namespace
 
 int main(int argc, char** argv)
@@ -55,6 +72,7 @@ int main(int argc, char** argv)
     app.require_subcommand(1);
     int status = ExitAsAsked;
     addStatus(app, status);
+    addVerify(app, status);
 
     try {
         app.parse(argc, argv);

@@ -1,0 +1,146 @@
+#include "package_window.h"
+#include "sample_bytes.h"
+#include "scoped.h"
+#include "test_files.h"
+
+#include <gtest/gtest.h>
+
+#include <random>
+#include <string>
+
+#include <fcntl.h>
+#include <unistd.h>
+
+namespace {
+
+constexpr std::size_t FileSize = 3000000;
+
+class PackageWindowTest : public testing::Test {
+protected:
+    /// The bytes as text; "(none)" for null.
+    std::string bytes(std::int64_t at, std::size_t size)
+    {
+        const unsigned char* const found = window.bytes(at, size);
+        return found == nullptr ? "(none)" : std::string(found, found + size);
+    }
+
+    std::string expected(std::int64_t at, std::size_t size) const
+    {
+        return content.substr(static_cast<std::size_t>(at), size);
+    }
+
+    /// How many bytes from `at` on the window holds: what it gives when the file has become empty.
+    std::size_t heldFrom(std::int64_t at)
+    {
+        EXPECT_EQ(0, truncate(path.c_str(), 0));
+        std::size_t count = 0;
+        while (window.bytes(at + static_cast<std::int64_t>(count), 1) != nullptr)
+            ++count;
+        return count;
+    }
+
+    TempDir dir;
+    std::string path = dir / "package";
+    std::string content = noiseBytes(FileSize, 1);
+    ScopedFd file = [this] {
+        writeFile(path, content);
+        return ScopedFd(open(path.c_str(), O_RDONLY));
+    }();
+    PackageWindow window{file.get()};
+};
+
+TEST_F(PackageWindowTest, AnyBytesAreThoseOfTheFile)
+{
+    std::mt19937 random(1);
+    std::int64_t at = 0;
+    for (int i = 0; i < 3000; ++i) {
+        if (random() % 20 == 0)
+            at = random() % FileSize;
+        const std::size_t size = random() % (random() % 10 == 0 ? 600000 : 3000);
+        if (at + static_cast<std::int64_t>(size) > static_cast<std::int64_t>(FileSize))
+            at = 0;
+
+        ASSERT_TRUE(expected(at, size) == bytes(at, size)) << at << " " << size;
+
+        at += static_cast<std::int64_t>(size + random() % 200);
+        at %= FileSize;
+    }
+}
+
+TEST_F(PackageWindowTest, TheLastBytesAreThereAndNoneBehindThem)
+{
+    EXPECT_EQ(expected(FileSize - 5, 5), bytes(FileSize - 5, 5));
+    EXPECT_EQ("(none)", bytes(FileSize - 5, 6));
+    EXPECT_EQ("(none)", bytes(FileSize, 1));
+    EXPECT_EQ("(none)", bytes(FileSize + 100000, 1));
+    EXPECT_EQ("(none)", bytes(10, FileSize));
+    EXPECT_EQ(expected(0, 5), bytes(0, 5));
+}
+
+TEST_F(PackageWindowTest, NoBytesAreThereAnywhere)
+{
+    EXPECT_EQ("", bytes(0, 0));
+    EXPECT_EQ("", bytes(FileSize, 0));
+    EXPECT_EQ("", bytes(2 * FileSize, 0));
+}
+
+TEST_F(PackageWindowTest, TheFileOffsetStaysAsItIs)
+{
+    ASSERT_EQ(7, lseek(file.get(), 7, SEEK_SET));
+
+    EXPECT_EQ(expected(100, 5000), bytes(100, 5000));
+
+    EXPECT_EQ(7, lseek(file.get(), 0, SEEK_CUR));
+}
+
+TEST_F(PackageWindowTest, AFileThatCannotBeReadHasNoBytes)
+{
+    PackageWindow closed(-1);
+
+    EXPECT_EQ(nullptr, closed.bytes(0, 1));
+}
+
+TEST_F(PackageWindowTest, TheFirstReadIsSmall)
+{
+    (void)bytes(100, 30);
+
+    EXPECT_EQ(4096U, heldFrom(100));
+}
+
+TEST_F(PackageWindowTest, ReadsGrowWhileTheyGoForward)
+{
+    for (std::int64_t at = 0; at < 1000000; at += 1000)
+        (void)bytes(at, 900);
+
+    // 4, 8, ... 128 KiB end at 258048 or little before, and from there each window has 256 KiB.
+    const std::size_t held = heldFrom(999900);
+    EXPECT_GT(held, 20000U);
+    EXPECT_LE(held, 262144U);
+}
+
+TEST_F(PackageWindowTest, AJumpMakesReadsSmallAgain)
+{
+    for (std::int64_t at = 0; at < 1000000; at += 1000)
+        (void)bytes(at, 900);
+
+    (void)bytes(2000000, 30);
+    EXPECT_EQ(4096U, heldFrom(2000000));
+}
+
+TEST_F(PackageWindowTest, AStepBackIsAJump)
+{
+    for (std::int64_t at = 500000; at < 1000000; at += 1000)
+        (void)bytes(at, 900);
+
+    (void)bytes(499000, 30);
+    EXPECT_EQ(4096U, heldFrom(499000));
+}
+
+TEST_F(PackageWindowTest, ALargeReadIsOfItsSize)
+{
+    (void)bytes(100, 1000000);
+
+    EXPECT_EQ(1000000U, heldFrom(100));
+}
+
+} // namespace
