@@ -11,7 +11,7 @@ target_compile_definitions(wzor_options INTERFACE _FILE_OFFSET_BITS=64 _TIME_BIT
 target_compile_definitions(wzor_options INTERFACE _GLIBCXX_ASSERTIONS)
 
 target_link_options(wzor_options INTERFACE
-  -Wl,-z,relro,-z,now,-z,noexecstack,-z,separate-code,-z,text)
+                    -Wl,-z,relro,-z,now,-z,noexecstack,-z,separate-code,-z,text)
 
 # wzor_warnings: linked privately, so that a user of the library chooses its own warnings. They are
 # errors only where a preset sets CMAKE_COMPILE_WARNING_AS_ERROR: never for a release build, whose

@@ -17,9 +17,9 @@ target_compile_definitions(wzor_options INTERFACE _FORTIFY_SOURCE=3)
 
 # The debug symbols name this directory in place of the one where the tree happens to lie.
 set(source_name /usr/src/wzorinst-${PROJECT_VERSION})
-target_compile_options(wzor_options INTERFACE -g
-  -ffile-prefix-map=${CMAKE_SOURCE_DIR}=${source_name}
-  -ffile-prefix-map=${CMAKE_BINARY_DIR}=${source_name}/build)
+target_compile_options(
+  wzor_options INTERFACE -g -ffile-prefix-map=${CMAKE_SOURCE_DIR}=${source_name}
+                         -ffile-prefix-map=${CMAKE_BINARY_DIR}=${source_name}/build)
 
 # Archives without times and owners.
 set(CMAKE_CXX_ARCHIVE_CREATE "<CMAKE_AR> qcD <TARGET> <LINK_FLAGS> <OBJECTS>")
@@ -28,18 +28,18 @@ set(CMAKE_CXX_ARCHIVE_FINISH "<CMAKE_RANLIB> -D <TARGET>")
 # wzor_shipping: for programs that bring their own C++ runtime. What nothing uses is left out, and
 # with it what would need a newer C library.
 add_library(wzor_shipping INTERFACE)
-target_sources(wzor_shipping INTERFACE
-  ${CMAKE_SOURCE_DIR}/src/install/standalone/unwind_tables.cpp)
-target_link_options(wzor_shipping INTERFACE
-  -static-libstdc++ -static-libgcc -Wl,--gc-sections)
+target_sources(wzor_shipping INTERFACE ${CMAKE_SOURCE_DIR}/src/install/standalone/unwind_tables.cpp)
+target_link_options(wzor_shipping INTERFACE -static-libstdc++ -static-libgcc -Wl,--gc-sections)
 
 # Moves the symbols of the program `target` to a ".debug" file beside it, which it names.
 function(split_debug_symbols target)
   set(program $<TARGET_FILE:${target}>)
-  add_custom_command(TARGET ${target} POST_BUILD
+  add_custom_command(
+    TARGET ${target}
+    POST_BUILD
     COMMAND ${CMAKE_OBJCOPY} --only-keep-debug ${program} ${program}.debug
     COMMAND ${CMAKE_OBJCOPY} --strip-all --remove-section=.comment
-      --add-gnu-debuglink=${program}.debug ${program}
+            --add-gnu-debuglink=${program}.debug ${program}
     BYPRODUCTS ${target}.debug
     VERBATIM)
 endfunction()

@@ -79,10 +79,16 @@ set(CPACK_RPM_DEBUG_PACKAGE_GROUP Development/Debug)
 set(CPACK_RPM_DEBUG_PACKAGE_REQUIRES "wzorinst = ${PROJECT_VERSION}-1")
 # Directories that belong to the system's own packages; and rpm neither changes files nor adds any.
 set(CPACK_RPM_EXCLUDE_FROM_AUTO_FILELIST_ADDITION
-  /usr/share/bash-completion /usr/share/bash-completion/completions
-  /usr/share/man /usr/share/man/man1 /usr/share/man/man8
-  /usr/lib/debug /usr/lib/debug/usr /usr/lib/debug/usr/bin)
-set(CPACK_RPM_SPEC_MORE_DEFINE "%define __os_install_post %{nil}
+    /usr/share/bash-completion
+    /usr/share/bash-completion/completions
+    /usr/share/man
+    /usr/share/man/man1
+    /usr/share/man/man8
+    /usr/lib/debug
+    /usr/lib/debug/usr
+    /usr/lib/debug/usr/bin)
+set(CPACK_RPM_SPEC_MORE_DEFINE
+    "%define __os_install_post %{nil}
 %define _build_id_links none
 %define _buildhost localhost
 %define use_source_date_epoch_as_buildtime 1
