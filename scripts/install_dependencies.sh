@@ -35,6 +35,8 @@ test='
     libcli11-dev
     libdeflate-dev:i386
     man-db
+    nettle-dev
+    nettle-dev:i386
     nlohmann-json3-dev
     pylint
     python3-jsonschema
