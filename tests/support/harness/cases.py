@@ -11,6 +11,7 @@ from harness.failure_points import Point
 from harness.scenarios import HOME, Scenario
 
 BACKUP = ".bak"
+TEMPORARY = ".wzorinst-new"
 
 
 @dataclass(frozen=True)
@@ -104,8 +105,9 @@ class FailedCall(Case):
 
     @property
     def hit(self):
-        """The path of the failing call, without a slash at its end."""
-        return self.point.path.rstrip("/")
+        """The path of the failing call, without a slash at its end; of the new content of a file
+        the path of that file."""
+        return self.point.path.rstrip("/").removesuffix(TEMPORARY)
 
     @property
     def kind(self):

@@ -43,18 +43,15 @@ DEPLOYING = "performing upgrade (deploying files)"
 
 CONTROL_FAILED = re.compile(r"^Exec '\S*/bin/trawlcfg .*' returned [1-9]", re.M)
 
-OPENINGS = ("open", "open to create")
+TRACE_PATH_SET = re.compile(r"^Setting common trace path='.*' result=0$", re.M)
+
+# Calls that look at a name or at what is behind it.
+LOOKS = ("access", "fstat", "open", "read", "stat", "walk")
 
 
 def is_index(content):
     """True for lines of comments and paths; the last one may be cut."""
     return content is not None and all(line[:1] in (b"", b"#", b"/") for line in lines_of(content))
-
-
-def lacks_lines_only(content, whole):
-    """True when `content` is `whole` without some of its lines, or with lines cut short."""
-    rest = iter(lines_of(whole))
-    return all(any(line.startswith(part) for line in rest) for part in lines_of(content))
 
 
 # Where nothing was lost, only left.
@@ -63,13 +60,14 @@ def lacks_lines_only(content, whole):
       "The probe file shows that home can be written; if it cannot be deleted, it stays, empty.",
       0, 1)
 def probe_stays(case, path):
-    return path == PROBE == case.hit and case.kind == "unlink" and case.content(path) == b""
+    return (path == PROBE == case.hit and case.kind in ("unlink", "walk")
+            and case.content(path) == b"")
 
 
 @rule("a failed step of a commit",
       "A commit ignores failures: the backup that cannot be deleted stays beside the new file.", 0)
 def backup_stays(case, path):
-    return (path.endswith(BACKUP) and path == case.hit and case.kind == "unlink"
+    return (path.endswith(BACKUP) and path == case.hit and case.kind in ("unlink", "walk")
             and case.new(path)
             and case.content(path) in contents_before(case, path.removesuffix(BACKUP)))
 
@@ -79,15 +77,16 @@ def backup_stays(case, path):
       "the old content of a file that was not renamed back lies in its backup.", 1)
 def rollback_step_fails(case, path):
     original = case.hit.removesuffix(BACKUP)
-    if not case.point.late or case.kind not in ("unlink", "rename", "rmdir"):
+    if not case.point.late or case.kind not in ("unlink", "rename", "rmdir", "walk"):
         return False
-    if path == case.hit and case.kind == "rmdir":
+    if path == case.hit and case.kind in ("rmdir", "walk") and case.after.get(path) and (
+            case.after[path].kind == "d"):
         return case.new(path)
     if path == original + BACKUP:
         return case.new(path) and case.content(path) in contents_before(case, original)
     if path != original:
         return False
-    if case.kind == "unlink":
+    if case.kind == "unlink" or case.kind == "walk" and case.content(path) is not None:
         return case.content(path) is not None
     # The second backup of a file of "config/xss" holds what the first pass had written.
     in_backup = case.content(original + BACKUP) in contents_before(case, original)
@@ -101,7 +100,8 @@ def removal_is_best_effort(case, path):
     if case.scenario.arguments[0] != "r" or not (case.hits_above(path) or is_below(case.hit, path)):
         return False
     if case.hit == INDEX:
-        return path == INDEX and case.kind == "unlink" and is_index(case.content(path))
+        return (path == INDEX and case.kind in ("unlink", "walk")
+                and is_index(case.content(path)))
     disabled = path == CONTROL_STATE and (case.content(path) or b"").startswith(DISABLED)
     return path in case.after and (disabled or case.unchanged(path))
 
@@ -113,7 +113,8 @@ def upgrade_deletion_is_best_effort(case, path):
     place = next((p for p in (HOME + "/properties", HOME + "/cache_data", *OBSOLETE_FILES)
                   if is_below(path, p)), None)
     return (place is not None and is_below(case.hit, place) and case.unchanged(path)
-            and case.kind in ("access", "open", "fstat", "getdents64", "stat", "unlink", "rmdir"))
+            and case.kind in ("access", "open", "fstat", "getdents64", "stat", "unlink", "rmdir",
+                              "walk"))
 
 
 # Records that are kept beside the journal.
@@ -155,13 +156,13 @@ def removal_goes_by_the_index(case, path):
 
 @rule("the install type is best effort",
       "The install-type file is neither journalled nor checked: one that cannot be written is "
-      "missing or empty, and a rollback leaves it.", 0, 1)
+      "missing, and a rollback leaves it.", 0, 1)
 def install_type_is_best_effort(case, path):
     if path != INSTALL_TYPE:
         return False
     if case.status == 1:
-        return case.new(path) and case.content(path) in (b"", TYPE_TEXT)
-    return case.hit == INSTALL_TYPE and case.content(path) in (None, b"")
+        return case.new(path) and case.content(path) == TYPE_TEXT
+    return case.hit == INSTALL_TYPE and case.lost(path)
 
 
 @rule("the single-user flag is not journalled",
@@ -173,23 +174,20 @@ def flag_is_not_journalled(case, path):
 
 @rule("the common setting outlives a rollback",
       "The setting file of the common directory is the house's, not the installation's: once "
-      "written, it stays, also empty, which counts as the default.", 0, 1)
+      "written, it stays. One that cannot be written is missing: the default counts.", 0, 1)
 def setting_outlives(case, path):
     if not is_below(path, "/etc/kel") or path in case.before:
         return False
     if path == COMMON_SETTING and case.status == 0:
-        return case.hit == path and case.content(path) == b""
-    return case.new(path) and case.content(path) in (None, b"", DEFAULT_SETTING)
+        return case.hit == path and case.lost(path)
+    return case.new(path) and case.content(path) in (None, DEFAULT_SETTING)
 
 
-@rule("a common setting that cannot be read counts as none",
-      "The default common directory is used, and a setting file that cannot be opened is written "
-      "anew with it: the directory that it named before is lost.", 0, 1)
+@rule("a common setting that cannot be read is left alone",
+      "The default common directory is used in this run.", 0)
 def unreadable_setting(case, path):
-    if case.hit != COMMON_SETTING or case.kind not in ("open", "read"):
+    if case.hit != COMMON_SETTING or case.kind not in LOOKS or is_below(path, "/etc/kel"):
         return False
-    if case.status == 1:
-        return path == COMMON_SETTING and case.content(path) == DEFAULT_SETTING
     without = case.reference("without a common setting")
     return case.after.get(path) == without.get(path)
 
@@ -198,7 +196,7 @@ def unreadable_setting(case, path):
       "A common or log directory that cannot be created does not fail an installation.", 0)
 def common_directory_is_best_effort(case, path):
     return (is_below(path, "/usr/kel") and case.lost(path) and case.hits_above(path)
-            and case.kind in ("access", "mkdir"))
+            and case.kind in ("mkdir", *LOOKS))
 
 
 # What an upgrade changes outside of the journal.
@@ -211,29 +209,21 @@ def deletions_are_not_undone(case, path):
             and (path in OBSOLETE_FILES or is_below(path, HOME + "/properties")))
 
 
-@rule("the settings are edited in place",
+@rule("the settings are not journalled",
       "An upgrade brings Zor.properties to the new version without a journal entry: after a "
       "failure the edited file stays, with every setting of its owner.", 1)
-def settings_are_edited_in_place(case, path):
+def settings_are_not_journalled(case, path):
     return path == SETTINGS and case.after.get(path) == case.normal.get(path)
 
 
-@rule("writes of property files are not checked",
-      "A line of a property file or script that cannot be written is lost without an error.", 0, 1)
-def property_writes_are_not_checked(case, path):
-    if path not in (SETTINGS, TRACE_SETTINGS, *SCRIPTS) or case.kind != "write":
+@rule("a property file that cannot be written keeps its old content",
+      "Property files and scripts are replaced as a whole; a failure is no error.", 0)
+def property_file_keeps_its_content(case, path):
+    if path not in (SETTINGS, TRACE_SETTINGS, *SCRIPTS) or path != case.hit:
         return False
-    content = case.content(path)
-    return (path == case.hit and content is not None and path in case.normal
-            and lacks_lines_only(content, case.normal[path].content))
-
-
-@rule("a restored registry has the mode of its copy",
-      "The registry's backup is a copy, made under the process umask; a rollback puts the copy "
-      "back.", 1)
-def restored_registry_has_the_mode_of_its_copy(case, path):
-    return (path == REGISTRY and case.only_mode_differs(path)
-            and case.after[path].mode == 0o644)
+    extracted = path in case.package and (path != SETTINGS or path not in case.before)
+    old = case.package[path] if extracted else case.before[path].content
+    return case.content(path) == old
 
 
 @rule("the second pass over \"config/xss\" takes the backup",
@@ -250,14 +240,14 @@ def second_pass_takes_the_backup(case, path):
       "A mode that cannot be set is left as it is; the content is what counts.", 0)
 def modes_are_best_effort(case, path):
     return (case.only_mode_differs(path) and path == case.hit
-            and case.kind in ("fchmod", "chmod", "access"))
+            and case.kind in ("fchmod", "chmod", *LOOKS))
 
 
 @rule("scripts are best effort",
       "A script that cannot be looked at, read or opened keeps its placeholders.", 0)
 def scripts_are_best_effort(case, path):
     return (path in SCRIPTS and path == case.hit
-            and case.kind in ("access", "read", *OPENINGS)
+            and case.kind in ("open to create", *LOOKS)
             and case.content(path) == case.package[path])
 
 
@@ -282,6 +272,15 @@ def control_does_not_run(case, path):
             and (content is None or content.startswith(DISABLED)))
 
 
+@rule("the common trace path is the scanner control's",
+      "The last step of a fresh installation makes the scanner control keep the path, in a file of "
+      "its own. If the installation fails after that, the file stays.", 1)
+def trace_path_stays(case, path):
+    return (path == CONTROL_STATE and case.scenario.name == "install" and case.new(path)
+            and case.content(path) == case.normal[path].content
+            and TRACE_PATH_SET.search(case.output) is not None)
+
+
 @rule("the toolkit's programs leave their own files",
       "A scanner control that fails on a full disk leaves its empty scratch file.", 0, 1)
 def scratch_file_stays(case, path):
@@ -295,8 +294,8 @@ def scratch_file_stays(case, path):
       "If zor.ini cannot be opened or read, or home cannot be written, i makes a fresh "
       "installation: other exploiters, a newer version and the owner's settings are replaced.", 0)
 def unreadable_registry(case, _):
-    unreadable = case.hit == REGISTRY and case.kind in ("open", "read")
-    unwritable = case.hit == PROBE and case.kind in OPENINGS
+    unreadable = case.hit == REGISTRY and case.kind in LOOKS
+    unwritable = case.hit == PROBE and case.kind in ("open to create", *LOOKS)
     return (case.scenario.arguments[0] == "i" and (unreadable or unwritable)
             and not differences(case.reference("with an empty registry"), case.after))
 
@@ -306,20 +305,18 @@ def unreadable_registry(case, _):
       "newer one.", 0)
 def unreadable_control(case, path):
     if (case.scenario.arguments[0] != "i" or case.hit != CONTROL
-            or case.kind not in ("access", "stat")):
+            or case.kind not in ("access", "stat", "walk")):
         return False
     repaired = case.reference("without a scanner control")
     return path == REGISTRY and case.after[path] == repaired[path]
 
 
 @rule("a removal is not rolled back",
-      "A removal that cannot save the registry leaves it as it then is; the old one lies complete "
-      "in zor.ini.bak.", 1)
+      "A removal that cannot save the registry leaves the old one, and its copy in zor.ini.bak.", 1)
 def removal_is_not_rolled_back(case, path):
-    copy = case.after.get(REGISTRY + BACKUP)
-    return (case.scenario.arguments[0] == "r" and path in (REGISTRY, REGISTRY + BACKUP)
-            and case.hit == REGISTRY and case.kind in ("open to create", "write", "close")
-            and copy is not None and copy.content == case.before[REGISTRY].content)
+    return (case.scenario.arguments[0] == "r" and path == REGISTRY + BACKUP and case.new(path)
+            and case.hit in (REGISTRY, path)
+            and case.before[REGISTRY].content.startswith(case.content(path) or b""))
 
 
 KEPT_DIRECTORY = Rule(

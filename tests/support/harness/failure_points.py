@@ -13,6 +13,7 @@ import re
 import signal
 from dataclasses import dataclass, replace
 
+from harness.machine import Outcome
 from harness.scenarios import INDEX, PACKAGES
 
 TRACE = "/var/strace/trace"
@@ -30,7 +31,7 @@ ERRORS = {
     "fchown": ("EIO", "EPERM"),
     "fgetxattr": ("EIO",),
     "flistxattr": ("EIO",),
-    "fremovexattr": ("EIO",),
+    "fremovexattr": ("EIO", "EPERM"),
     "fsetxattr": ("EIO", "ENOSPC", "EPERM"),
     "fstat": ("EIO",),
     "fstatfs": ("EIO",),
@@ -51,6 +52,7 @@ ERRORS = {
     "sync_file_range": ("EIO", "ENOSPC"),
     "syncfs": ("EIO", "ENOSPC", "EDQUOT"),
     "unlink": ("EIO", "EACCES"),
+    "walk": ("EIO", "EACCES", "EMFILE"),
     "write": ("EIO", "ENOSPC", "EACCES"),
 }
 
@@ -107,6 +109,10 @@ class Point:
         return ERRORS[self.kind]
 
 
+# For a run in which no call failed.
+NO_POINT = Point("", 0, "", "", "", False, "")
+
+
 def kind_of(name, arguments):
     kind = KINDS.get(name, name)
     if kind in ("newfstatat", "fstatat64", "lstat", "lstat64", "stat64", "statx"):
@@ -119,7 +125,8 @@ def kind_of(name, arguments):
 
 
 # Calls whose first argument is a descriptor and whose strings are no paths.
-OF_DESCRIPTORS = {"read", "write", "fgetxattr", "fremovexattr", "fsetxattr", "flistxattr", "fstatfs"}
+OF_DESCRIPTORS = {"read", "write", "fgetxattr", "flistxattr", "fremovexattr", "fsetxattr",
+                  "fstatfs"}
 
 
 def paths_of(kind, arguments):
@@ -138,7 +145,7 @@ def paths_of(kind, arguments):
 def points_of(trace):
     """The points of a trace of a whole run, in the order made."""
     points, counts, begun, late = [], {}, False, False
-    opened = {}
+    opened = {}  # what is behind the names of descriptors below /proc
     for line in trace.splitlines():
         begun = begun or FIRST_CALL.match(line) is not None
         call = CALL.match(line)
@@ -152,13 +159,30 @@ def points_of(trace):
         assert kind in ERRORS, f"a call that is not known here: {line}"
         path, *others = paths_of(kind, arguments)
         path = opened.get(path, path)
-        if made := OPENED.match(result):
-            opened["/proc/self/fd/" + made.group(1)] = made.group(2)
+        if new := OPENED.match(result):
+            opened["/proc/self/fd/" + new.group(1)] = new.group(2)
         points.append(Point(name, counts[name], kind, path, arguments, late, result,
                             target=others[0] if others else ""))
         late = late or (kind == "chmod" and path == INDEX)
     assert begun, "the trace shows no first call of the installer"
-    return with_entries(points)
+    return with_entries(with_walks(points))
+
+
+def with_walks(points):
+    """Makes a directory that is only opened to reach a name a point of kind "walk" on that name.
+
+    The name is that of the next call below the directory.
+    """
+    result = []
+    for number, point in enumerate(points):
+        opened = OPENED.match(point.result)
+        if point.kind == "open" and "O_PATH" in point.arguments and opened:
+            below = opened.group(0) + ", "
+            reached = next((p.path for p in points[number + 1 :] if p.arguments.startswith(below)),
+                           point.path)
+            point = replace(point, kind="walk", path=reached)
+        result.append(point)
+    return result
 
 
 def with_entries(points):
@@ -176,9 +200,14 @@ def with_entries(points):
     return result
 
 
-def strace(*options):
-    return ("/usr/bin/timeout", "--kill-after=1", str(TIME_LIMIT), "/usr/bin/strace", "-qq", "-y",
-            "-s", "512", "-e", "signal=none", "-o", TRACE, *options)
+# What strace tells beside the calls: nothing, or only how the process ended.
+CALLS_ONLY = ("-qq", "-e", "signal=none")
+WITH_THE_END = ("-e", "quiet=attach,personality", "-e", "signal=all")
+
+
+def strace(*options, tells=CALLS_ONLY):
+    return ("/usr/bin/timeout", "--kill-after=1", str(TIME_LIMIT), "/usr/bin/strace", *tells, "-y",
+            "-s", "512", "-o", TRACE, *options)
 
 
 NAME_CHANGES = "rename,renameat,renameat2,unlink,unlinkat"
@@ -235,3 +264,30 @@ def run_killed(scenario, machine, point):
                                        f"inject={point.name}:signal=KILL:when={point.count}"))
     met = outcome.status == 128 + signal.SIGKILL and machine.read(TRACE).endswith("= ?\n")
     assert met, f"{point.label} was not met as expected: status {outcome.status}"
+
+
+STARTS = "clone,clone3,fork,vfork"
+
+
+@dataclass(frozen=True)
+class Signalled:
+    """What a run did that got a signal: also the commands that it started after that."""
+
+    outcome: Outcome
+    died: bool
+    commands_after: int
+    name_changes: list
+
+
+def run_signalled(scenario, machine, point, name):
+    """Runs `scenario` and sends the installer a signal as the call of `point` is made."""
+    outcome = scenario.run(machine, strace(
+        "-e", f"trace={point.name},{NAME_CHANGES},{STARTS}", "-e",
+        f"inject={point.name}:signal={name}:when={point.count}", tells=WITH_THE_END))
+    trace = machine.read(TRACE)
+    _, met, rest = trace.partition(f"--- SIG{name} ")
+    assert met, f"{point.label} was not met as expected: {trace}"
+    died = rest.endswith((f"+++ killed by SIG{name} +++\n",
+                          f"+++ killed by SIG{name} (core dumped) +++\n"))
+    commands = [line for line in rest.splitlines() if line.startswith(tuple(STARTS.split(",")))]
+    return Signalled(outcome, died, len(commands), name_changes_of(trace))

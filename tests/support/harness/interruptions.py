@@ -3,21 +3,19 @@
 The journal lives in memory, so a run that is killed undoes nothing; the same command does the work
 again. Each rule names one place where that cannot lead to the same tree, and excuses a difference
 only if the state that the kill left shows that it was killed there. Left-over backups are counted,
-not excused: they must be old contents that the second run did not touch.
+not excused: they must be old contents that the second run did not touch. So is the file with new
+content that was not renamed yet, of which there must be at most one.
 """
 
 from dataclasses import dataclass, field
 
-from harness.cases import BACKUP, Case, RuleBook, contents_before, lines_of
+from harness.cases import BACKUP, TEMPORARY, Case, RuleBook, contents_before, lines_of
 from harness.scenarios import (
-    COMMON_SETTING,
     CONTROL,
     CONTROL_STATE,
     INDEX,
     INSTALL_TYPE,
     REGISTRY,
-    SETTINGS,
-    TRACE_SETTINGS,
     differences,
 )
 
@@ -31,6 +29,7 @@ class Interruption(Case):
 
     between: dict
     backups: list = field(default_factory=list)
+    temporaries: list = field(default_factory=list)
 
     @property
     def wanted(self):
@@ -44,11 +43,6 @@ class Interruption(Case):
     def removes_all(self):
         return self.scenario.name == "remove"
 
-    def was_empty(self, path):
-        """True when the kill left `path` without content."""
-        node = self.between.get(path)
-        return node is not None and node.kind == "f" and node.content == b""
-
 
 RULES = RuleBook()
 rule = RULES.rule
@@ -56,28 +50,6 @@ rule = RULES.rule
 
 def lines_at(tree, path):
     return set(lines_of(tree[path].content)) if path in tree else set()
-
-
-def key_of(line):
-    return line.partition(b"=")[0].strip()
-
-
-@rule("the registry was being written",
-      "zor.ini is truncated and then written at once; killed in between, it is empty and counts as "
-      "none. i then makes a fresh installation for its exploiter alone (the scanners stay as they "
-      "were, disabled if an upgrade was killed), r has nothing to remove. Until then, zor.ini.bak "
-      "holds the old registry.", 0, 1)
-def registry_was_being_written(case, path):
-    if not case.was_empty(REGISTRY) or REGISTRY not in case.before:
-        return False
-    backup = case.between.get(REGISTRY + BACKUP)  # a copy, with a mode of its own
-    if backup is None or backup.content != case.before[REGISTRY].content:
-        return False
-    if not case.installs:
-        return case.status == 1 and not differences(case.between, case.after)
-    if path == CONTROL_STATE:
-        return case.after.get(path) == case.between.get(path)
-    return case.after.get(path) == case.reference("with an empty registry").get(path)
 
 
 @rule("the installation was registered already",
@@ -104,8 +76,7 @@ def only_fresh_installations_make_it(case, path):
 
 
 def is_finished_installation(case):
-    return (case.scenario.name == "install" and REGISTRY in case.between
-            and not case.was_empty(REGISTRY))
+    return case.scenario.name == "install" and REGISTRY in case.between
 
 
 @rule("the index was being written",
@@ -117,44 +88,6 @@ def index_was_being_written(case, path):
     missing = lines_at(case.normal, INDEX) - lines_at(case.after, INDEX)
     return (missing <= lines_at(case.before, INDEX) - lines_at(case.between, INDEX)
             and lines_at(case.after, INDEX) <= lines_at(case.normal, INDEX))
-
-
-@rule("the settings were being written",
-      "Zor.properties is truncated and then written line by line; killed in between, the lines "
-      "behind are lost, the owner's too. The second run adds the missing keys with their defaults, "
-      "and ZorTrace.properties follows what the settings then say about traces.", 0)
-def settings_were_being_written(case, path):
-    if case.scenario.name != "upgrade" or SETTINGS not in case.between:
-        return False
-    written, whole = case.between[SETTINGS].content, case.normal[SETTINGS].content
-    if written == whole or not whole.startswith(written):
-        return False
-    if path == SETTINGS:
-        added = case.after[path].content.removeprefix(written)
-        keys = {key_of(line) for line in lines_of(whole)}
-        return (case.after[path].content.startswith(written)
-                and all(key_of(line) in keys for line in lines_of(added)))
-    changed = lines_at(case.normal, path) ^ lines_at(case.after, path)
-    return path == TRACE_SETTINGS and all(
-        key_of(line) == b"handlers.traceFile.fileName"
-        or b".loggers.trcLogger.level" in key_of(line) for line in changed)
-
-
-@rule("the common setting was being written",
-      "log.properties is created and then written; killed in between, it is empty, which counts as "
-      "the default, and the second run takes it as it is.", 0)
-def setting_was_being_written(case, path):
-    return (path == COMMON_SETTING and path not in case.before and case.was_empty(path)
-            and case.after[path] == case.between[path])
-
-
-@rule("the index was being rewritten for a removal",
-      "A removal truncates the index to write it anew; killed in between, the second run knows the "
-      "installer's own files only, and leaves the others.", 0)
-def index_was_being_rewritten(case, path):
-    return (case.removes_all and case.was_empty(INDEX)
-            and case.after.get(path)
-            == case.reference("with an index that lists nothing").get(path))
 
 
 @rule("the scanner control was deleted already",
@@ -187,7 +120,9 @@ def judge(case):
     """Fills in the left-over backups, what is excused by which rule, and what by none."""
     paths = differences(case.normal, case.after)
     case.backups = [path for path in paths if path in case.after and is_left_backup(case, path)]
-    paths = [path for path in paths if path not in case.backups]
+    case.temporaries = [path for path in paths if path.endswith(TEMPORARY)
+                        and case.after.get(path) == case.between.get(path)][:1]
+    paths = [path for path in paths if path not in case.backups + case.temporaries]
     if case.status != 0:
         paths.append("(status)")
     for path in paths:

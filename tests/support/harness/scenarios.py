@@ -86,6 +86,7 @@ def new_machine(binary, packages):
     for path, content in packages.items():
         machine.plant(path, content)
     machine.make_directory("/var/strace", 0o777)
+    machine.make_directory("/run")
     return machine
 
 
@@ -188,12 +189,12 @@ SCENARIOS = {scenario.name: scenario for scenario in (
 # Trees.
 
 def tree_of(machine):
-    """The machine's whole tree; the time in the index's first line is left out."""
+    """The machine's whole tree; the time in the first line of an index is left out."""
     tree = machine.tree()
-    if INDEX in tree:
-        node = tree[INDEX]
-        content = re.sub(rb"( installed on )[-0-9T:]+\n", rb"\1TIME\n", node.content, count=1)
-        tree[INDEX] = replace(node, content=content)
+    for path, node in tree.items():
+        if os.path.basename(path) == os.path.basename(INDEX):
+            content = re.sub(rb"( installed on )[-0-9T:]+\n", rb"\1TIME\n", node.content, count=1)
+            tree[path] = replace(node, content=content)
     return tree
 
 

@@ -36,37 +36,71 @@ from harness.zip_archive import IMAGE_ROOT
 PRESETS = ("release", "release-i686")
 
 
+def parser_of(description):
+    """A parser of the options that every sweep has."""
+    parser = argparse.ArgumentParser(
+        description=description, formatter_class=argparse.RawDescriptionHelpFormatter
+    )
+    binary = parser.add_mutually_exclusive_group()
+    binary.add_argument(
+        "--preset",
+        choices=PRESETS,
+        default=PRESETS[0],
+        help="build and run the 64-bit or the 32-bit program (default: release)",
+    )
+    binary.add_argument("--binary", metavar="FILE", help="run this wzorinst instead")
+    parser.add_argument(
+        "--jobs",
+        type=int,
+        default=os.cpu_count(),
+        metavar="N",
+        help="runs at the same time (default: one a processor)",
+    )
+    return parser
+
+
+def parsed(parser):
+    """Parses the command line; `binary` becomes the path of the installer, built if need be."""
+    arguments = parser.parse_args()
+    if arguments.jobs < 1:
+        parser.error("N must be at least 1")
+    arguments.binary = os.path.realpath(arguments.binary or built(arguments.preset))
+    return arguments
+
+
 def arguments_of(description, scenarios, sample=False):
     """Parses a sweep's command line. `scenarios` are the names of those that it can take.
 
     `sample` adds an option for a sweep that has a better sample than every Nth point.
     """
-    parser = argparse.ArgumentParser(
-        description=description, formatter_class=argparse.RawDescriptionHelpFormatter)
-    binary = parser.add_mutually_exclusive_group()
-    binary.add_argument("--preset", choices=PRESETS, default=PRESETS[0],
-                        help="build and run the 64-bit or the 32-bit program (default: release)")
-    binary.add_argument("--binary", metavar="FILE", help="run this wzorinst instead")
-    parser.add_argument("--scenario", action="append", choices=scenarios, metavar="SCENARIO",
-                        help="take only this scenario; can be given again. Scenarios: " + ", ".join(
-                            f"{name} ({SCENARIOS[name].title})" for name in scenarios))
-    parser.add_argument("--every", type=int, default=1, metavar="N",
-                        help="try every Nth point only")
-    parser.add_argument("--point", metavar="POINT",
-                        help="try only this point, as the list of violations names it, and show "
-                        "everything about it; with one --scenario")
+    parser = parser_of(description)
+    parser.add_argument(
+        "--scenario",
+        action="append",
+        choices=scenarios,
+        metavar="SCENARIO",
+        help="take only this scenario; can be given again. Scenarios: "
+        + ", ".join(f"{name} ({SCENARIOS[name].title})" for name in scenarios),
+    )
+    parser.add_argument(
+        "--every", type=int, default=1, metavar="N", help="try every Nth point only"
+    )
+    parser.add_argument(
+        "--point",
+        metavar="POINT",
+        help="try only this point, as the list of violations names it, and show everything about "
+        "it; with one --scenario",
+    )
     if sample:
-        parser.add_argument("--sample", action="store_true",
-                            help="try only what can be done in some seconds")
-    parser.add_argument("--jobs", type=int, default=os.cpu_count(), metavar="N",
-                        help="runs at the same time (default: one a processor)")
-    arguments = parser.parse_args()
-    if arguments.every < 1 or arguments.jobs < 1:
+        parser.add_argument(
+            "--sample", action="store_true", help="try only what can be done in some seconds"
+        )
+    arguments = parsed(parser)
+    if arguments.every < 1:
         parser.error("N must be at least 1")
     if arguments.point and len(arguments.scenario or ()) != 1:
         parser.error("--point needs one --scenario")
     arguments.scenarios = [SCENARIOS[name] for name in arguments.scenario or scenarios]
-    arguments.binary = os.path.realpath(arguments.binary or built(arguments.preset))
     return arguments
 
 
@@ -81,10 +115,10 @@ def built(preset):
 class Laboratory:
     """The binary, the packages and the machines of a sweep; use it by `with`."""
 
-    def __init__(self, binary, jobs):
+    def __init__(self, binary, jobs, packages=None):
         self.binary = binary
         self.jobs = jobs
-        self.packages = toolkit_packages()
+        self.packages = packages or toolkit_packages()
         self.free = queue.Queue()
 
     def __enter__(self):
@@ -204,6 +238,12 @@ def table(heading, rows):
         "  ".join([row[0].ljust(widths[0])] +
                   [cell.rjust(width) for cell, width in zip(row[1:], widths[1:])]).rstrip() + "\n"
         for row in texts)
+
+
+def shortened(names):
+    """The first of many names, and how many more there are."""
+    others = f" and {len(names) - 3} more" if len(names) > 3 else ""
+    return " ".join(names[:3]) + others
 
 
 def paragraph(first, text):
