@@ -24,6 +24,7 @@ test='
     cmake-format
     codespell
     cppcheck
+    e2fsprogs
     g++-multilib
     gcovr
     googletest
@@ -47,6 +48,7 @@ test='
     strace
     time
     valgrind
+    xfsprogs
 '
 
 case ${1-} in
