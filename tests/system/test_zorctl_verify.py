@@ -11,6 +11,12 @@ from harness.zorctl import report, zorctl
 HOME = "/opt/corvan/zor"
 
 
+@pytest.fixture(autouse=True)
+def lockable(machine):
+    """The lock can be taken."""
+    machine.make_directory("/run")
+
+
 @pytest.fixture
 def installed(machine):
     assert machine.run("i", "SHOP", "-s", SPB).status == 0
@@ -24,11 +30,11 @@ def check(machine, expected, *arguments, status=1, spb=(SPB,), **options):
 
 @pytest.mark.parametrize("spb", [(SPB,), ()], ids=["package", "index"])
 def test_a_fresh_installation_is_as_it_should_be(installed, spb):
-    before = installed.tree()
+    before = installed.tree("/etc", "/opt", "/usr")
 
     check(installed, "", spb=spb, status=0)
 
-    assert installed.tree() == before
+    assert installed.tree("/etc", "/opt", "/usr") == before
 
 
 @pytest.mark.parametrize("spb", [(SPB,), ()], ids=["package", "index"])

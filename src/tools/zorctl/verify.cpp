@@ -6,6 +6,7 @@
 #include "fresh_install.h"
 #include "guarded_file.h"
 #include "install_log.h"
+#include "installation_lock.h"
 #include "json_report.h"
 #include "locations.h"
 #include "package_files.h"
@@ -503,6 +504,7 @@ int complain(const std::string& what, int status)
 int verifyInstallation(const VerifyOptions& options)
 {
     localInstall = options.type.empty() ? !isRoot() : options.type == valueInstallLocal;
+    const ScopedFd lock = lockForReading(localInstall);
     const Installation found = localInstall ? surveyOwn() : surveyShared();
     if (found.registryState == "missing")
         return complain(found.registryPath + ": nothing is installed", ExitNoInstallation);
@@ -527,6 +529,7 @@ int verifyInstallation(const VerifyOptions& options)
         return status;
     }
     Json report = reportHead("verify", VerifySchema);
+    report["locked"] = lock.isOpen();
     report["type"] = installTypeName(localInstall);
     report["home"] = jsonText(found.registry.homeDirectory);
     report["compared_with"] = options.spb.empty() ? "index" : "package";

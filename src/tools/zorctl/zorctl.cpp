@@ -2,15 +2,20 @@
 
 #include "build_stamp.h"
 #include "exit_status.h"
+#include "plan.h"
+#include "run.h"
 #include "settings.h"
 #include "status.h"
 #include "verify.h"
 
 #include <CLI/CLI.hpp>
 #include <clocale>
+#include <csignal>
 #include <iostream>
 #include <ostream>
 #include <string>
+#include <string_view>
+#include <vector>
 
 namespace {
 
@@ -20,6 +25,32 @@ constexpr const char* ExitTable =
 
 /// The installer's library reports on its log stream; here, reports are our own.
 std::ostream silence(nullptr);
+
+/// What follows the first "--" of the command line of "plan" or "run": the installer's alone.
+std::vector<std::string> afterDashes;
+
+/// Cuts that off the command line; returns how many arguments are left.
+int cutAfterDashes(int argc, char** argv)
+{
+    const std::string_view command = argc > 1 ? argv[1] : "";
+    if (command != "plan" && command != "run")
+        return argc;
+    for (int at = 2; at < argc; ++at) {
+        if (std::string_view(argv[at]) == "--") {
+            afterDashes.assign(argv + at + 1, argv + argc);
+            return at;
+        }
+    }
+    return argc;
+}
+
+/// The command line of the installer: what `command` did not know, and what follows "--".
+std::vector<std::string> installerArguments(const CLI::App& command)
+{
+    std::vector<std::string> arguments = command.remaining();
+    arguments.insert(arguments.end(), afterDashes.begin(), afterDashes.end());
+    return arguments;
+}
 
 /// Adds the subcommand "status", which puts its result into `status`.
 void addStatus(CLI::App& app, int& status)
@@ -58,6 +89,46 @@ void addVerify(CLI::App& app, int& status)
     command->callback([&status] { status = verifyInstallation(options); });
 }
 
+/// Adds the subcommand "plan".
+void addPlan(CLI::App& app, int& status)
+{
+    CLI::App* const command =
+        app.add_subcommand("plan", "Tell what a run of wzorinst would do, without doing it");
+    static PlanOptions options;
+    command->add_flag("--json", options.json, "print JSON");
+    command->add_flag("--files", options.files, "name all files");
+    command
+        ->add_option("--unchanged-exit", options.unchangedExit,
+                     "the exit status if nothing would change")
+        ->check(CLI::Range(0, 255));
+    command->footer("Behind the options: i|r EXPLOITER and the options of wzorinst.");
+    command->prefix_command();
+    command->callback([command, &status] {
+        options.arguments = installerArguments(*command);
+        status = planRun(options);
+    });
+}
+
+/// Adds the subcommand "run".
+void addRun(CLI::App& app, int& status)
+{
+    CLI::App* const command = app.add_subcommand(
+        "run", "Run wzorinst under a lock, with a log, on a package that was checked");
+    static RunOptions options;
+    command->add_option("--signers", options.signers,
+                        "ask for a signature by one of these (see ssh-keygen(1), ALLOWED SIGNERS)");
+    command->add_option("--signature", options.signature, "the signature, if not SPB.sig");
+    command->add_option("--log-dir", options.logDirectory, "the directory of the log");
+    command->add_option("--wait", options.wait, "how many seconds to wait for the lock")
+        ->check(CLI::Range(0L, 1'000'000L));
+    command->footer("Behind the options: -- i|r EXPLOITER and the options of wzorinst.");
+    command->prefix_command();
+    command->callback([command, &status] {
+        options.arguments = installerArguments(*command);
+        status = runInstaller(options);
+    });
+}
+
 } // namespace
 
 int main(int argc, char** argv)
@@ -65,6 +136,7 @@ int main(int argc, char** argv)
     (void)std::setlocale(LC_ALL, "C"); // the start-up locale; cannot fail
     logstream = &silence;
     completeLayoutNames();
+    (void)std::signal(SIGPIPE, SIG_IGN); // writes fail instead; programs we start get theirs back
 
     CLI::App app("Looks at, checks, plans and repairs installations of the ZOR toolkit.", "zorctl");
     app.footer(ExitTable);
@@ -73,9 +145,11 @@ int main(int argc, char** argv)
     int status = ExitAsAsked;
     addStatus(app, status);
     addVerify(app, status);
+    addPlan(app, status);
+    addRun(app, status);
 
     try {
-        app.parse(argc, argv);
+        app.parse(cutAfterDashes(argc, argv), argv);
     } catch (const CLI::ParseError& error) {
         return app.exit(error) == 0 ? ExitAsAsked : ExitCouldNotCheck;
     }

@@ -1,0 +1,81 @@
+#include "installation_lock.h"
+
+#include "locations.h"
+#include "paths.h"
+#include "text_output.h"
+
+#include <cerrno>
+#include <iostream>
+
+#include <fcntl.h>
+#include <sys/file.h>
+#include <sys/stat.h>
+#include <time.h>
+#include <unistd.h>
+
+namespace {
+
+constexpr const char* SharedLock = "/run/wzorinst.lock";
+constexpr const char* LocalLockName = ".wzorinst.lock";
+constexpr mode_t LockMode = 0644;
+
+time_t now()
+{
+    timespec moment = {};
+    (void)clock_gettime(CLOCK_MONOTONIC, &moment); // always there
+    return moment.tv_sec;
+}
+
+void pauseShortly()
+{
+    const timespec moment = {0, 100'000'000};
+    (void)nanosleep(&moment, nullptr); // a signal only shortens it
+}
+
+} // namespace
+
+std::string lockPath(bool local)
+{
+    if (!local)
+        return SharedLock;
+    const std::string home = homeDirectory();
+    return home.empty() ? std::string() : joinPath(home, LocalLockName);
+}
+
+LockState takeLock(const std::string& path, bool exclusive, long waitSeconds, ScopedFd& lock)
+{
+    ScopedFd file(open(path.c_str(),
+                       O_RDONLY | O_CREAT | O_NOFOLLOW | O_NONBLOCK | O_NOCTTY | O_CLOEXEC,
+                       LockMode));
+    if (!file.isOpen()) // one of another user can be locked, too
+        file =
+            ScopedFd(open(path.c_str(), O_RDONLY | O_NOFOLLOW | O_NONBLOCK | O_NOCTTY | O_CLOEXEC));
+    struct stat status = {};
+    if (!file.isOpen() || fstat(file.get(), &status) != 0 || !S_ISREG(status.st_mode))
+        return LockState::CannotLock;
+
+    const time_t deadline = now() + waitSeconds;
+    while (flock(file.get(), (exclusive ? LOCK_EX : LOCK_SH) | LOCK_NB) != 0) {
+        if (errno != EWOULDBLOCK && errno != EINTR)
+            return LockState::CannotLock;
+        if (now() >= deadline)
+            return LockState::Busy;
+        pauseShortly();
+    }
+    lock = std::move(file);
+    return LockState::Held;
+}
+
+ScopedFd lockForReading(bool local)
+{
+    const std::string path = lockPath(local);
+    ScopedFd lock(-1);
+    const LockState state = takeLock(path, false, 0, lock);
+    if (state == LockState::Busy)
+        std::cerr << "zorctl: warning: another run holds " << shown(path)
+                  << "; this may change while it is reported\n";
+    else if (state != LockState::Held)
+        std::cerr << "zorctl: warning: cannot lock " << shown(path)
+                  << "; this may change while it is reported\n";
+    return lock;
+}

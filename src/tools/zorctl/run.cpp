@@ -1,0 +1,354 @@
+#include "run.h"
+
+#include "child_process.h"
+#include "exit_status.h"
+#include "file_codes.h"
+#include "file_operations.h"
+#include "file_writing.h"
+#include "installation_lock.h"
+#include "locations.h"
+#include "paths.h"
+#include "plan.h"
+#include "settings.h"
+#include "simulation.h"
+#include "text_output.h"
+#include "time_stamps.h"
+
+#include <cerrno>
+#include <csignal>
+#include <cstdlib>
+#include <cstring>
+#include <iostream>
+#include <sstream>
+
+#include <fcntl.h>
+#include <sys/stat.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+namespace {
+
+constexpr const char* SignatureNamespace = "spb";
+constexpr const char* SharedLogDirectory = "/var/log/zorctl";
+constexpr const char* LocalLogDirectory = ".local/state/zorctl";
+constexpr off_t SmallFileLimit = off_t{1} << 20; // a signature, a list of signers
+constexpr off_t PackageLimit = off_t{1} << 31;   // what the installer can read ends there
+constexpr int PackageFails = 2;                  // spb check: the package cannot be installed
+
+/// A directory of our own that goes with everything in it when this ends.
+class PrivateDirectory {
+public:
+    PrivateDirectory()
+    {
+        const char* const wanted = std::getenv("TMPDIR");
+        std::string name =
+            joinPath(wanted != nullptr && *wanted == '/' ? wanted : "/var/tmp", "zorctl-XXXXXX");
+        if (mkdtemp(name.data()) == nullptr && errno != 0) {
+            name = "/tmp/zorctl-XXXXXX";
+            if (mkdtemp(name.data()) == nullptr)
+                return;
+        }
+        path_ = name;
+    }
+    PrivateDirectory(const PrivateDirectory&) = delete;
+    PrivateDirectory& operator=(const PrivateDirectory&) = delete;
+    ~PrivateDirectory()
+    {
+        for (const char* const name : {"package.spb", "signature", "signers"})
+            (void)unlink(joinPath(path_, name).c_str());
+        if (!path_.empty())
+            (void)rmdir(path_.c_str());
+    }
+
+    [[nodiscard]] const std::string& path() const { return path_; }
+
+private:
+    std::string path_;
+};
+
+/// Copies the regular file `from`, of at most `limit` bytes, to the new file `to` of mode 0400.
+/// Returns 0 or an `errno`.
+int copyPrivately(const std::string& from, const std::string& to, off_t limit)
+{
+    const ScopedFd in(open(from.c_str(), O_RDONLY | O_NONBLOCK | O_NOCTTY | O_CLOEXEC));
+    if (!in.isOpen())
+        return errno;
+    struct stat status = {};
+    if (fstat(in.get(), &status) != 0)
+        return errno;
+    if (!S_ISREG(status.st_mode))
+        return EINVAL;
+    ScopedFd out(open(to.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_NOFOLLOW | O_CLOEXEC, 0400));
+    if (!out.isOpen())
+        return errno;
+    static char block[1 << 16];
+    off_t size = 0;
+    for (;;) {
+        const ssize_t count = read(in.get(), block, sizeof block);
+        if (count < 0)
+            return errno;
+        if (count == 0)
+            return closeWritten(out) == FileOk ? 0 : EIO;
+        size += count;
+        if (size > limit)
+            return EFBIG;
+        if (writeAll(out.get(), block, static_cast<std::size_t>(count)) != FileOk)
+            return errno != 0 ? errno : EIO;
+    }
+}
+
+/// The log of one run: a file of its own, named by the time and what was asked for.
+class RunLog {
+public:
+    /// Opens the log in `directory`, which is created if it is missing.
+    bool open(const std::string& directory, const std::string& action, const std::string& exploiter)
+    {
+        FileTransaction scratch; // never rolled back: the directory is for all logs
+        const ScopedUmask mask(077);
+        (void)createFullPath(scratch, directory, 0700, nullptr); // the open says so
+        std::string name = localTimeStamp() + "-" + action + "-" + exploiter + "-" +
+                           std::to_string(getpid()) + ".log";
+        for (char& c : name) {
+            if (c == '/' || static_cast<unsigned char>(c) < 0x20)
+                c = '_';
+        }
+        path_ = joinPath(directory, name);
+        file_ = ScopedFd(::open(
+            path_.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_APPEND | O_NOFOLLOW | O_CLOEXEC, 0600));
+        return file_.isOpen();
+    }
+
+    void line(const std::string& text)
+    {
+        const std::string whole = localTimeStamp() + " zorctl: " + shown(text) + "\n";
+        (void)writeAll(file_.get(), whole.data(), whole.size()); // a full disk stops no run
+    }
+
+    [[nodiscard]] int descriptor() const { return file_.get(); }
+    [[nodiscard]] const std::string& path() const { return path_; }
+
+private:
+    ScopedFd file_{-1};
+    std::string path_;
+};
+
+/// One guarded run.
+class GuardedRun {
+public:
+    explicit GuardedRun(const RunOptions& options) : options_(options) {}
+
+    int run()
+    {
+        const PlannedRun asked = parseRun(options_.arguments);
+        if (!asked.error.empty())
+            return refuse(ExitCouldNotCheck,
+                          "wzorinst would not accept this command line: " + asked.error);
+        installer_ = findProgram("wzorinst");
+        if (installer_.empty())
+            return refuse(ExitCouldNotCheck, "wzorinst is neither next to zorctl nor in PATH");
+        if (!log_.open(logDirectory(), std::string(1, asked.commandLine.action),
+                       asked.commandLine.exploiter))
+            return refuse(ExitCouldNotCheck, "cannot write a log in " + logDirectory());
+
+        const int locked = lock();
+        if (locked != ExitAsAsked)
+            return locked;
+        const bool installs = asked.commandLine.action == 'i';
+        const int checked = installs ? checkPackage() : ExitAsAsked;
+        if (checked != ExitAsAsked)
+            return checked;
+        logPlan(asked);
+        return start();
+    }
+
+private:
+    int refuse(int status, const std::string& reason)
+    {
+        std::cerr << "zorctl: " << shown(reason) << '\n';
+        if (log_.descriptor() >= 0)
+            log_.line(reason);
+        return status;
+    }
+
+    std::string logDirectory() const
+    {
+        if (!options_.logDirectory.empty())
+            return options_.logDirectory;
+        return isRoot() ? SharedLogDirectory : joinPath(homeDirectory(), LocalLogDirectory);
+    }
+
+    int lock()
+    {
+        const std::string path = lockPath(localInstall);
+        switch (takeLock(path, true, options_.wait, lock_)) {
+        case LockState::Held:
+            log_.line("holding the lock " + path);
+            return ExitAsAsked;
+        case LockState::Busy:
+            return refuse(ExitLocked, "another run holds " + path);
+        case LockState::CannotLock:
+            break;
+        }
+        return refuse(ExitLocked, "cannot lock " + path);
+    }
+
+    int checkPackage()
+    {
+        if (private_.path().empty())
+            return refuse(ExitCouldNotCheck, "cannot create a directory for the package");
+        package_ = joinPath(private_.path(), "package.spb");
+        const int error = copyPrivately(spbPackage, package_, PackageLimit);
+        if (error == ENOSPC || error == EDQUOT || error == EIO)
+            return refuse(ExitCouldNotCheck,
+                          "cannot copy " + spbPackage + ": " + std::strerror(error));
+        if (error != 0)
+            return refuse(ExitBadPackage, spbPackage + ": " + std::strerror(error));
+        const int verified = options_.signers.empty() ? ExitAsAsked : checkSignature();
+        return verified == ExitAsAsked ? checkContent() : verified;
+    }
+
+    int checkSignature()
+    {
+        const std::string source =
+            options_.signature.empty() ? spbPackage + ".sig" : options_.signature;
+        const std::string signature = joinPath(private_.path(), "signature");
+        const std::string signers = joinPath(private_.path(), "signers");
+        const int failed = copyPrivately(options_.signers, signers, SmallFileLimit);
+        if (failed != 0)
+            return refuse(ExitCouldNotCheck, options_.signers + ": " + std::strerror(failed));
+        const int error = copyPrivately(source, signature, SmallFileLimit);
+        if (error != 0)
+            return refuse(ExitBadSignature, source + ": " + std::strerror(error));
+        const std::string tool = findProgram("ssh-keygen");
+        if (tool.empty())
+            return refuse(ExitCouldNotCheck, "ssh-keygen is not in PATH");
+
+        const std::string signer = findSigner(tool, signature, signers);
+        if (signer.empty())
+            return refuse(ExitBadSignature,
+                          spbPackage + ": signed by nobody of " + options_.signers);
+        const ScopedFd content(open(package_.c_str(), O_RDONLY | O_CLOEXEC));
+        const ChildSetup setup = {content.get(), log_.descriptor(), log_.descriptor(), -1};
+        const int status = runProgram({tool, "-Y", "verify", "-f", signers, "-I", signer, "-n",
+                                       SignatureNamespace, "-s", signature},
+                                      setup);
+        if (status != 0)
+            return refuse(ExitBadSignature, spbPackage + ": the signature is not valid");
+        log_.line("signed by " + signer);
+        return ExitAsAsked;
+    }
+
+    /// The first name in `signers` under which the key of `signature` may sign; empty if there is
+    /// none.
+    std::string findSigner(const std::string& tool, const std::string& signature,
+                           const std::string& signers)
+    {
+        int ends[2];
+        if (pipe2(ends, O_CLOEXEC) != 0)
+            return {};
+        const ScopedFd readEnd(ends[0]);
+        ScopedFd writeEnd(ends[1]);
+        // The names fit the pipe, or what does not is cut off: only the first line counts.
+        (void)fcntl(writeEnd.get(), F_SETFL, O_NONBLOCK);
+        const ChildSetup setup = {-1, writeEnd.get(), log_.descriptor(), -1};
+        const int status =
+            runProgram({tool, "-Y", "find-principals", "-s", signature, "-f", signers}, setup);
+        writeEnd = ScopedFd(-1);
+        char text[4096];
+        const ssize_t count = status == 0 ? read(readEnd.get(), text, sizeof text) : 0;
+        const std::string names(text, count > 0 ? static_cast<std::size_t>(count) : 0);
+        return names.substr(0, names.find_first_of("\n,"));
+    }
+
+    int checkContent()
+    {
+        const std::string tool = findProgram("spb");
+        if (tool.empty())
+            return refuse(ExitCouldNotCheck, "spb is neither next to zorctl nor in PATH");
+        const int status =
+            runProgram({tool, "check", package_}, {-1, log_.descriptor(), log_.descriptor(), -1});
+        if (status < 0 || !WIFEXITED(status) || WEXITSTATUS(status) > PackageFails)
+            return refuse(ExitCouldNotCheck, "spb check could not be run");
+        if (WEXITSTATUS(status) == PackageFails)
+            return refuse(ExitBadPackage, spbPackage + " cannot be installed; see " + log_.path());
+        return ExitAsAsked;
+    }
+
+    void logPlan(const PlannedRun& asked)
+    {
+        if (!package_.empty())
+            spbPackage = package_;
+        std::ostringstream text;
+        std::streambuf* const screen = std::cout.rdbuf(text.rdbuf());
+        printForecast(forecastRun(asked), true);
+        std::cout.rdbuf(screen);
+        std::istringstream lines(text.str());
+        for (std::string one; std::getline(lines, one);)
+            log_.line("plan: " + one);
+    }
+
+    /// The command line of the installer, with our copy of the package.
+    std::vector<std::string> commandLine() const
+    {
+        std::vector<std::string> line = {installer_};
+        const std::vector<std::string>& asked = options_.arguments;
+        for (std::size_t at = 0; at < asked.size(); ++at) {
+            line.push_back(asked[at]);
+            const bool takesArgument = at >= 2 && asked[at].size() == 2 && asked[at][0] == '-' &&
+                                       std::strchr("dfsoc", asked[at][1]) != nullptr;
+            if (!takesArgument || at + 1 == asked.size())
+                continue;
+            ++at;
+            line.push_back(asked[at - 1] == "-s" && !package_.empty() ? package_ : asked[at]);
+        }
+        return line;
+    }
+
+    int start()
+    {
+        log_.line("starting " + installer_);
+        // The lock stays with the installer even if we are killed; it passes it on to nobody.
+        const int status = runProgramTwofold(commandLine(), {STDIN_FILENO, -1, -1, lock_.get()},
+                                             STDOUT_FILENO, log_.descriptor());
+        if (status < 0)
+            return refuse(ExitCouldNotCheck, "cannot start " + installer_);
+        if (WIFSIGNALED(status)) {
+            log_.line("wzorinst was ended by signal " + std::to_string(WTERMSIG(status)));
+            endedBy_ = WTERMSIG(status);
+            return ExitDifferences;
+        }
+        log_.line("wzorinst ended with status " + std::to_string(WEXITSTATUS(status)));
+        return WEXITSTATUS(status) == 127 ? ExitCouldNotCheck : WEXITSTATUS(status);
+    }
+
+public:
+    /// The signal that ended the installer; 0 if none did.
+    [[nodiscard]] int endedBy() const { return endedBy_; }
+
+private:
+    const RunOptions& options_;
+    PrivateDirectory private_;
+    RunLog log_;
+    ScopedFd lock_{-1};
+    std::string installer_;
+    std::string package_;
+    int endedBy_ = 0;
+};
+
+} // namespace
+
+int runInstaller(const RunOptions& options)
+{
+    int signalNumber = 0;
+    int status = ExitAsAsked;
+    {
+        GuardedRun run(options);
+        status = run.run();
+        signalNumber = run.endedBy();
+    } // our copies are gone before we end as the installer did
+    if (signalNumber != 0) {
+        (void)std::signal(signalNumber, SIG_DFL);
+        (void)raise(signalNumber);
+    }
+    return status;
+}
