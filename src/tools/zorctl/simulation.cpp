@@ -11,6 +11,7 @@
 #include "paths.h"
 #include "permissions.h"
 #include "removal.h"
+#include "safe_path.h"
 #include "settings.h"
 #include "template_variables.h"
 #include "upgrade.h"

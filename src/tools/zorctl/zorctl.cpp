@@ -1,6 +1,7 @@
 // zorctl: looks at, checks, plans and repairs installations of the ZOR toolkit.
 
 #include "build_stamp.h"
+#include "doctor.h"
 #include "exit_status.h"
 #include "plan.h"
 #include "run.h"
@@ -129,6 +130,21 @@ void addRun(CLI::App& app, int& status)
     });
 }
 
+/// Adds the subcommand "doctor".
+void addDoctor(CLI::App& app, int& status)
+{
+    CLI::App* const command =
+        app.add_subcommand("doctor", "Tell what an interrupted run left, and put it right");
+    static DoctorOptions options;
+    command->add_flag("--apply", options.apply, "do what is to be done");
+    command->add_flag("--json", options.json, "print JSON");
+    command->add_option("--type", options.type, "the shared (global) or your own (local) one")
+        ->check(CLI::IsMember({"global", "local"}));
+    command->add_option("--home", options.home,
+                        "where a first installation was interrupted, if not in the usual place");
+    command->callback([&status] { status = examine(options); });
+}
+
 } // namespace
 
 int main(int argc, char** argv)
@@ -147,6 +163,7 @@ int main(int argc, char** argv)
     addVerify(app, status);
     addPlan(app, status);
     addRun(app, status);
+    addDoctor(app, status);
 
     try {
         app.parse(cutAfterDashes(argc, argv), argv);
