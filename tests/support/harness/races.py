@@ -79,7 +79,7 @@ def as_guest(machine, act, *paths):
 
 def fill(machine, directory):
     """Makes a directory with a file for each of NAMES."""
-    os.makedirs(machine.at(directory))
+    os.makedirs(machine.at(directory), exist_ok=True)
     for name in NAMES:
         with open(machine.at(f"{directory}/{name}"), "w", encoding="ascii") as file:
             file.write("kept\n")
@@ -103,10 +103,14 @@ def removal_with_cache(machine):
 
 
 def upgrade_with_deep_cache(machine):
-    """As above, a level deeper, and others have files next to where the directory is moved."""
+    """As above, a level deeper.
+
+    Where the directory is moved to, others have files whose names are next to it in the cache.
+    """
     furnish(machine, "upgrade")
     fill(machine, SECRET + "/names")
-    fill(machine, "/tmp/names")
+    fill(machine, "/tmp")
+    machine.as_user(GUEST, lambda: fill(machine, CACHE + "/top"))
     machine.as_user(GUEST, lambda: fill(machine, CACHE + "/top/dir"))
 
 
