@@ -212,3 +212,33 @@ def test_a_scanner_control_that_cannot_be_executed_has_status_126(machine):
     assert outcome.status == 1
     printed_lines(outcome, "Exec '/opt/corvan/zor/bin/trawlcfg -s common_trace_path "
                            "/usr/kel/corvan/common/ZOR/logs >/dev/null 2>&1' returned 32256")
+
+
+# What a command finds.
+
+def test_a_command_finds_the_lines_before_it_in_the_log_file(machine):
+    machine.pack({"bin/trawlcfg": b"#!/bin/sh\ncp /tmp/log /var/scanners/log\n"})
+
+    outcome = machine.run("i", "ABC", "-s", SPB, "-o", "/tmp/log")
+
+    assert outcome.status == 0
+    found, whole = machine.read("/var/scanners/log"), machine.read("/tmp/log")
+    assert found.splitlines()[-1] == (
+        "Updating common trace path='/usr/kel/corvan/common' result=0")
+    assert whole.startswith(found + "Exec '/opt/corvan/zor/bin/trawlcfg -s common_trace_path ")
+
+
+# SIGPIPE and SIGXFSZ in the kernel's mask of ignored signals.
+PIPE_AND_XFSZ = 1 << 12 | 1 << 24
+
+
+@pytest.mark.parametrize("trap, ignored", [("", 0), ("trap '' PIPE XFSZ; ", PIPE_AND_XFSZ)],
+                         ids=["not ignored", "ignored"])
+def test_a_command_ignores_the_signals_that_the_caller_ignores(machine, trap, ignored):
+    script = b"#!/bin/sh\ngrep SigIgn: /proc/self/status >/var/scanners/mask\n"
+    machine.pack({"bin/trawlcfg": script})
+
+    outcome = machine.run_in_shell(trap + "exec \"$0\" \"$@\"", "i", "ABC", "-s", SPB)
+
+    assert outcome.status == 0
+    assert int(machine.read("/var/scanners/mask").split()[1], 16) & PIPE_AND_XFSZ == ignored

@@ -291,13 +291,15 @@ def test_an_abort_loses_no_trace_line(machine):
     assert outcome.stdout.endswith("\nextractFile: /opt/corvan/zor/bin/zz\n")
 
 
-def test_an_abort_loses_no_line_of_the_log_file(machine):
-    package = archive().add(IMAGE_ROOT + "config/zz", b"0123456789", DEFLATED, size=9)
+@pytest.mark.parametrize("entry, last_line", [
+    ("bin/zz", "Starting file extraction..."),
+    ("config/zz", "Extracting configs to '/opt/corvan/zor/config'")])
+def test_an_abort_loses_no_line_of_the_log_file(machine, entry, last_line):
+    package = archive().add(IMAGE_ROOT + entry, b"0123456789", DEFLATED, size=9)
 
     run(machine, package, "-o", "/tmp/log")
 
-    assert machine.read("/tmp/log").endswith("\nStarting file extraction...\n"
-                                             "Extracting configs to '/opt/corvan/zor/config'\n")
+    assert machine.read("/tmp/log").splitlines()[-1] == last_line
 
 
 @pytest.mark.parametrize("root", [
@@ -414,6 +416,26 @@ def test_a_link_in_the_way_of_a_file_is_replaced_and_its_target_kept(machine):
 
     assert machine.read("/opt/target") == "kept"
     assert machine.tree(HOME)[HOME + "/bin/trawlhw"].kind == "f"
+
+
+def test_a_link_to_itself_in_the_way_of_a_file_cannot_be_replaced(machine):
+    machine.link(HOME + "/bin/trawlhw", "trawlhw")
+
+    outcome = run(machine)
+
+    assert outcome.status == 1
+    printed_lines(outcome, "Bin dir file extraction failed",
+                  "File extraction failed, error = 2 (Cannot open file for writing)")
+    assert machine.tree(HOME + "/bin/trawlhw")[HOME + "/bin/trawlhw"].content == b"trawlhw"
+
+
+def test_a_name_that_the_file_system_does_not_take_cannot_be_written(machine):
+    outcome = run(machine, archive({"bin/" + "n" * 300: b"content"}))
+
+    assert outcome.status == 1
+    printed_lines(outcome, "Bin dir file extraction failed",
+                  "File extraction failed, error = 2 (Cannot open file for writing)")
+    assert not machine.exists(HOME)
 
 
 def test_without_an_index_the_installation_goes_on(machine):

@@ -11,7 +11,7 @@ namespace {
 
 const std::string HomeError = "*** Error: cannot retrieve home directory for current user.\n";
 
-/// The machine's users; those of before are back at the end.
+/// Replaces the machine's users while it lives.
 class Users {
 public:
     explicit Users(const std::string& entries) { writeFile("/etc/passwd", entries); }
@@ -51,6 +51,18 @@ TEST_F(LocationsTest, AnotherUserIsNotRoot)
     EXPECT_TRUE(passesInChild([] {
         becomeUser(1234);
         EXPECT_FALSE(isRoot());
+    }));
+}
+
+TEST_F(LocationsTest, TheRealUserCountsAndNotTheEffectiveOne)
+{
+    const Users users("root:x:0:0::/root:/bin/sh\n");
+
+    EXPECT_TRUE(passesInChild([] {
+        changeEffectiveUser();
+
+        EXPECT_TRUE(isRoot());
+        EXPECT_EQ("/root", homeDirectory());
     }));
 }
 
@@ -108,7 +120,7 @@ TEST_F(LocationsTest, TheSharedInstallationHasFixedPlaces)
     EXPECT_EQ("", log.text());
 }
 
-TEST_F(LocationsTest, AUsersInstallationLiesInTheHomeDirectory)
+TEST_F(LocationsTest, AUsersInstallationIsInTheHomeDirectory)
 {
     const Users users("ann:x:0:0::/home/ann:/bin/sh\n");
 

@@ -30,6 +30,13 @@ void capabilities(long call, __user_cap_data_struct* data)
     EXPECT_EQ(0, syscall(call, &header, data));
 }
 
+/// Lets `program` decide about every system call of this process from now on.
+void useFilter(const sock_fprog& program)
+{
+    ASSERT_EQ(0, prctl(PR_SET_NO_NEW_PRIVS, 1, 0, 0, 0));
+    ASSERT_EQ(0, prctl(PR_SET_SECCOMP, SECCOMP_MODE_FILTER, &program));
+}
+
 } // namespace
 
 OrdinaryRights::OrdinaryRights()
@@ -90,6 +97,25 @@ void becomeUser(uid_t uid)
     ASSERT_EQ(uid, getuid());
 }
 
+void changeEffectiveUser()
+{
+#ifdef SYS_geteuid32
+    const __u32 wanted = SYS_geteuid32;
+#else
+    const __u32 wanted = SYS_geteuid;
+#endif
+    // Without a second id in the sandbox's user namespace there is none to change to: the system
+    // call fails, which geteuid() returns like an id.
+    sock_filter program[] = {
+        BPF_STMT(BPF_LD | BPF_W | BPF_ABS, static_cast<__u32>(offsetof(seccomp_data, nr))),
+        BPF_JUMP(BPF_JMP | BPF_JEQ | BPF_K, wanted, 0, 1),
+        BPF_STMT(BPF_RET | BPF_K, SECCOMP_RET_ERRNO | EPERM),
+        BPF_STMT(BPF_RET | BPF_K, SECCOMP_RET_ALLOW),
+    };
+    useFilter({static_cast<unsigned short>(std::size(program)), program});
+    ASSERT_NE(0U, geteuid());
+}
+
 void failSystemCall(long number, int error)
 {
     const auto wanted = static_cast<__u32>(number);
@@ -102,7 +128,5 @@ void failSystemCall(long number, int error)
         BPF_STMT(BPF_RET | BPF_K, answer),
         BPF_STMT(BPF_RET | BPF_K, SECCOMP_RET_ALLOW),
     };
-    const sock_fprog filter = {static_cast<unsigned short>(std::size(program)), program};
-    ASSERT_EQ(0, prctl(PR_SET_NO_NEW_PRIVS, 1, 0, 0, 0));
-    ASSERT_EQ(0, prctl(PR_SET_SECCOMP, SECCOMP_MODE_FILTER, &filter));
+    useFilter({static_cast<unsigned short>(std::size(program)), program});
 }

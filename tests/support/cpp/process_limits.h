@@ -1,4 +1,4 @@
-// What a test takes away from its own process: rights, identity, system calls, room on a disk.
+// Limits that a test sets for its own process: rights, identity, system calls, room on a disk.
 #pragma once
 
 #include <functional>
@@ -56,3 +56,6 @@ void becomeUser(uid_t uid);
 /// Makes the system call `number` (SYS_...) fail with `error` from now on, unless its first
 /// argument is 0 to 2, a standard stream. For a child only.
 void failSystemCall(long number, int error);
+
+/// Makes geteuid() return an id that is not root's from now on. For a child only.
+void changeEffectiveUser();
