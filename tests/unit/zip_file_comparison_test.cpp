@@ -1,4 +1,4 @@
-// The deflated stream, and the files that are extracted, beside the stream's plain model, on random
+// Compares the deflated stream, and the extracted files, with a plain model of the stream on random
 // entries, sound and damaged.
 //
 // Each entry comes from a seed of its own: its content, how it was compressed, what is wrong with
@@ -351,7 +351,7 @@ protected:
 
 TEST_F(StreamComparisonTest, TheStreamDoesWhatItsModelDoesOnRandomEntries)
 {
-    const std::uint32_t entries = numberFromEnvironment("WZOR_STREAM_ENTRIES", 3000);
+    const std::uint32_t entries = numberFromEnvironment("WZOR_STREAM_ENTRIES", 1000);
     const std::uint32_t first = numberFromEnvironment("WZOR_STREAM_SEED", FirstSeed);
     std::uint32_t endings[Mismatch] = {};
 
@@ -368,7 +368,7 @@ TEST_F(StreamComparisonTest, TheStreamDoesWhatItsModelDoesOnRandomEntries)
         ++endings[ending];
     }
 
-    // The samples are worth something only when they end in every way.
+    // The samples are useful only if they end in every way.
     if (entries >= 1000) {
         EXPECT_GT(endings[Whole], entries / 5);
         EXPECT_GT(endings[Part], entries / 8);
@@ -402,8 +402,8 @@ TEST_F(StreamComparisonTest, TheProgramEndsWhereTheModelSaysSo)
 
 class ExtractionComparisonTest : public StreamComparisonTest {
 protected:
-    /// What a run that reads the sample in blocks leaves in a file; `aborts` tells whether the
-    /// program ends over it.
+    /// What a run that reads the sample in blocks leaves in a file; `aborts` says whether the
+    /// program is aborted.
     static std::string expectedFile(const Sample& sample, bool& aborts)
     {
         ReferenceInflateStream model = modelOf(sample);
@@ -441,7 +441,7 @@ protected:
 
 TEST_F(ExtractionComparisonTest, TheFileHoldsWhatTheModelDelivers)
 {
-    const std::uint32_t entries = numberFromEnvironment("WZOR_STREAM_ENTRIES", 1500);
+    const std::uint32_t entries = numberFromEnvironment("WZOR_STREAM_ENTRIES", 500);
     const std::uint32_t first = numberFromEnvironment("WZOR_STREAM_SEED", FirstSeed);
     std::uint32_t rescued = 0;
 
@@ -468,7 +468,7 @@ TEST_F(ExtractionComparisonTest, TheFileHoldsWhatTheModelDelivers)
     }
 
     RecordProperty("rescued", static_cast<int>(rescued));
-    EXPECT_LE(rescued, entries / 1000);
+    EXPECT_LE(rescued, 1 + entries / 1000);
 }
 
 } // namespace
