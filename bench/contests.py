@@ -4,7 +4,7 @@
     contests.py PLAN        (PLAN: JSON, see bench/run)
 
 Only the contestants' own processes are timed; the sandbox, the cleaning of targets and the
-preparation of states stand outside. Contestants take turns, A B A B, on the same tmpfs.
+preparation of states are not measured. Contestants take turns, A B A B, on the same tmpfs.
 """
 
 import json
@@ -114,7 +114,7 @@ class Bench:
                             Contestant("rm -rf", everything, prepare), self.plan["pairs"])
 
     def fixed_cost(self, preset):
-        """The smallest package without external commands beside a program that prints a line."""
+        """The smallest package, without external commands, against a program that prints a line."""
         bare = self.installer(preset, "i", "tiny", "wzorinst_no_commands")
         whole = self.installer(preset, "i", "tiny")
         line = Contestant("line", [self.program(preset, "line")])

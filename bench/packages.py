@@ -36,7 +36,7 @@ def smallest_toolkit():
 
 @dataclass(frozen=True)
 class Package:
-    """`entries` makes the (name, content) pairs beside those of SMALLEST."""
+    """`entries` makes the (name, content) pairs that are added to SMALLEST."""
 
     name: str
     entries: object

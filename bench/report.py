@@ -1,4 +1,4 @@
-"""Turns the results of a benchmark into tables: ratios beside their goals.
+"""Turns the results of a benchmark into tables: ratios and their goals.
 
 A ratio is the median of the installer over the median of its opponent in the same contest. A goal
 for times holds for wall and for CPU time. The pairs of goals are for the 64-bit and the 32-bit
@@ -21,7 +21,7 @@ TIME_GOALS = {
     ("removal", "typical"): {"rm -rf": (2.50, 2.50)},
     ("removal", "many"): {"rm -rf": (1.25, 1.25)},
 }
-# Peak memory: no more than this opponent's; many100k has a limit of its own, in KiB.
+# Peak memory: no more than this opponent's; many100k has its own limit, in KiB.
 MEMORY_GOALS = {"typical": "unzip", "large": "unzip", "stored": "unzip", "many": "bsdtar"}
 MEMORY_LIMITS = {"many100k": 36 * 1024}
 FIXED_COST_GOAL = 1.5
@@ -72,7 +72,7 @@ def table(head, rows):
 
 
 def beside_goal(contest, measure):
-    """The ratio, and behind it the goal and whether it is met."""
+    """The ratio, followed by the goal and whether it is met."""
     text = f"{contest['ratios'][measure]:.2f}"
     if measure in contest["goals"]:
         text += f" <= {contest['goals'][measure]:.2f} {verdict(contest['verdicts'][measure])}"

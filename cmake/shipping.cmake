@@ -15,7 +15,7 @@ execute_process(
 
 target_compile_definitions(wzor_options INTERFACE _FORTIFY_SOURCE=3)
 
-# The debug symbols name this directory in place of the one where the tree happens to lie.
+# The debug symbols name this directory instead of the path of the source tree.
 set(source_name /usr/src/wzorinst-${PROJECT_VERSION})
 target_compile_options(
   wzor_options INTERFACE -g -ffile-prefix-map=${CMAKE_SOURCE_DIR}=${source_name}
@@ -31,7 +31,7 @@ add_library(wzor_shipping INTERFACE)
 target_sources(wzor_shipping INTERFACE ${CMAKE_SOURCE_DIR}/src/install/standalone/unwind_tables.cpp)
 target_link_options(wzor_shipping INTERFACE -static-libstdc++ -static-libgcc -Wl,--gc-sections)
 
-# Moves the symbols of the program `target` to a ".debug" file beside it, which it names.
+# Moves the symbols of the program `target` to a ".debug" file next to it, which it names.
 function(split_debug_symbols target)
   set(program $<TARGET_FILE:${target}>)
   add_custom_command(

@@ -17,7 +17,7 @@ for dir in bin properties config install; do
 done
 cp -R "$examples/toolkit/." "$out"
 
-# Relative names and no build id: the bytes do not depend on where the tree lies.
+# Relative names and no build id: the bytes do not depend on the path of the tree.
 cd "$examples/toolkit-src"
 compile()
 {
@@ -27,7 +27,7 @@ compile()
 }
 compile -shared -fPIC -o "$out/bin/libzorhw.so" zorhw.c
 compile -shared -fPIC -o "$out/bin/libzorfs.so" zorfs.c
-# Finds its libraries beside itself, also when nobody has set LD_LIBRARY_PATH.
+# Finds its libraries in its own directory, even without LD_LIBRARY_PATH.
 # shellcheck disable=SC2016
 compile -o "$out/bin/trawlprobe" trawlprobe.c -L "$out/bin" -lzorhw -lzorfs \
     -Wl,-rpath,'$ORIGIN'

@@ -11,7 +11,7 @@ cd /tmp
 
 say() { printf '\n### %s\n' "$*"; }
 
-# Runs the installer, then shows what the machine has become and what the scanner control was told.
+# Runs the installer, then shows the state of the machine and the calls of the scanner control.
 run()
 {
     : >"$ZOR_COMMAND_LOG"

@@ -7,7 +7,7 @@
 // callers are compiled for a function that never throws. The jump skips no destructor: between it
 // and the mark there is nothing but the stream's own read(), which owns nothing.
 //
-// An assertion outside of readBlock() and readByte() ends the process as ever, and is a finding.
+// An assertion outside of readBlock() and readByte() ends the process as usual, and is a finding.
 #pragma once
 
 class InputStream;

@@ -1,6 +1,6 @@
 // An entry, made of the input's head, is read from the archive that the rest of the input is, and
 // compared with what zlib makes of the same bytes at once. Extracted, it must be what its stream
-// delivers, though the extraction takes a quicker road where it can.
+// delivers, although the extraction takes a fast path where it can.
 //
 // Head: 1 byte (bit 0: deflated; bits 1 to 3: how it is read), 1 byte offset of the data, 4 bytes
 // compressed size, 4 bytes uncompressed size, little-endian.
@@ -67,7 +67,7 @@ bool readInBlocks(InputStream& stream, int blockSize, std::string& bytes)
         const int count = readBlock(stream, block, blockSize);
         if (count == AssertionStruck)
             return false;
-        require(count >= 0 && count <= blockSize, "a count lies between 0 and the block's size");
+        require(count >= 0 && count <= blockSize, "a count is between 0 and the block's size");
         if (count == 0) {
             require(readBlock(stream, block, blockSize) == 0, "an ended stream stays ended");
             return true;
@@ -109,7 +109,7 @@ void checkDeflatedBytes(InputStream& stream, std::uint32_t size, const Expected&
             break;
         require(byte == right, "a deflated entry's byte is zlib's, as a signed char");
     }
-    // Of damaged data, zlib may tell in the call that delivers the byte before.
+    // zlib may report damage in the call that delivers the byte before it.
     require(!expected.whole && count + 1 >= expected.bytes.size(),
             "only damaged data ends a deflated entry early");
 }
@@ -136,10 +136,10 @@ void checkDeflatedBlocks(InputStream& stream, int blockSize, std::uint32_t size,
     if (expected.whole) {
         require(bytes.size() == total, "an intact entry is delivered to its last byte");
     } else {
-        // The block in which the damage or the end lies is dropped. zlib may tell of damage
+        // The block with the damage or the end is dropped. zlib may report damage
         // in the call that has just filled the block before.
         require(bytes.size() == wholeBlocks || bytes.size() + block == wholeBlocks,
-                "damage costs the block that it lies in");
+                "damage costs the block that it is in");
     }
 }
 

@@ -1,7 +1,7 @@
 // The whole input is a package: it is extracted into an empty directory and rolled back again.
 //
 // The image root is "/" here, so that entries are called "/bin/x" and not by a long name that the
-// fuzzer would have to keep. Names are used as they stand, ".." included, so archives with such
+// fuzzer would have to keep. Names are used unchanged, ".." included, so archives with such
 // ones are left out: they would leave the directory. The others stay in it by their making.
 #include "assertion_trap.h"
 #include "extraction.h"

@@ -14,7 +14,7 @@
 
 namespace {
 
-bool deletes = true; ///< false: unlink() only looks at what it is asked for
+bool deletes = true; ///< false: unlink() only records the request
 std::size_t deletions = 0;
 
 } // namespace
@@ -63,7 +63,7 @@ void checkRemoval(const std::string& path)
     deletions = 0;
     const bool listed = removeListedFiles(&path);
     deletes = true;
-    require(listed == (deletions != 0), "an index that lists something is told apart");
+    require(listed == (deletions != 0), "an index that lists something is recognized");
 }
 
 } // namespace

@@ -13,7 +13,7 @@
 
 namespace {
 
-/// How much more the heap may grow; looked at only while a ResourceBound lives.
+/// How much more the heap may grow; checked only while a ResourceBound exists.
 std::ptrdiff_t heapAllowance = 0;
 bool heapIsBounded = false;
 

@@ -1,4 +1,4 @@
-// What the fuzz targets share: foreign bytes as a file, checks, and a bound on memory and time.
+// Helpers of the fuzz targets: untrusted bytes as a file, checks, and a bound on memory and time.
 #pragma once
 
 #include <cstddef>

@@ -1,8 +1,8 @@
 #!/usr/bin/python3 -B
 """Writes the seed corpora of the fuzz targets: make_seeds.py DIR
 
-Each target finds its inputs in a directory of its name below DIR. The archives come from the
-builder of the system tests, right ones and one for each way in which they can be wrong.
+Each target finds its inputs in a directory of its name below DIR. The archives come from
+the writer of the system tests: valid ones, and one for each kind of damage.
 """
 
 import os
@@ -21,7 +21,7 @@ REGISTRY = (b"ZOR_Version = 9.2.30.0000\nZOR_BuildDate = 22/12/02\n"
 
 
 def two_files():
-    """A sound archive, still open to changes."""
+    """A valid archive, still open to changes."""
     return (Archive().add("/bin/").add("/bin/a", TEXT).add("/config/")
             .add("/config/b", NOISE, STORED))
 

@@ -1,9 +1,9 @@
-"""Which options the program itself takes, found out by asking it."""
+"""The options that the program takes, found by running it."""
 
 import string
 
-# One answer a line: what the run that meets the option complains about first. It ends there in any
-# case: "-?" is no option, and "%" is none either if the option has taken "-?" for its argument.
+# One line for each option: the first complaint of a run with it. Every run ends with one: "-?" is
+# not an option, nor is "%" if the option has taken "-?" as its argument.
 ASK = """
 for letter; do
     for before in '' -eeo; do

@@ -1,4 +1,4 @@
-"""The shipping binary as a file: what it needs, its debug symbols, and what it does not tell."""
+"""The shipping binary as a file: what it needs, its debug symbols, and what it must not contain."""
 
 import re
 import subprocess

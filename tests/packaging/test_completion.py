@@ -1,4 +1,4 @@
-"""The bash completion, in an interactive bash on a terminal of its own.
+"""The bash completion, in an interactive bash on a pseudo terminal.
 
 A test types a line and presses the key that puts in all completions; what then stands in the line
 is compared.
@@ -42,7 +42,7 @@ ZOR_ConfigRootDirectory = /opt/corvan/zor
 
 
 class InteractiveBash:
-    """A bash on a pseudo terminal, on a machine of its own."""
+    """A bash on a pseudo terminal, on its own machine."""
 
     def __init__(self, machine):
         terminal, inside = pty.openpty()

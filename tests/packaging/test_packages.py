@@ -1,7 +1,7 @@
 """The packages: names, contents, and the life of an installed .deb and .rpm.
 
 A package is installed into a root directory of the test's own, while the machine's own files can
-only be read. In that directory lies nothing but the package, so a program that runs there needs
+only be read. That directory holds nothing but the package, so a program that runs there needs
 nothing else than the C library, which alone is borrowed.
 """
 

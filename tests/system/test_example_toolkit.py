@@ -20,7 +20,7 @@ def built(tmp_path_factory):
 
 @pytest.fixture
 def home(built, tmp_path):
-    """A toolkit as it lies after an installation; the blank shows that its programs quote."""
+    """A toolkit as it is after an installation; the blank shows that its programs quote."""
     home = tmp_path / "zor home"
     shutil.copytree(built, home)
     (home / "bin" / "etc").mkdir()

@@ -98,13 +98,13 @@ def remove(machine, exploiter="ABC", *options, **how):
 
 
 def without_index(machine):
-    """Puts something that cannot be written in place of the index."""
+    """Replaces the index by something that cannot be written."""
     machine.remove(HOME + "/ZOR_files")
     machine.link(HOME + "/ZOR_files", "/nowhere/index")
 
 
 def with_sorted_deletions(text):
-    """`text` with each run of "DEL: " lines sorted: a directory has no order of its own."""
+    """`text` with each run of "DEL: " lines sorted: directories list files in any order."""
     lines, run = [], []
     for line in text.splitlines(True) + [""]:
         if line.startswith("DEL: "):
@@ -612,7 +612,7 @@ def test_the_directories_are_removed_in_a_fixed_order_by_the_index(machine):
                  "bin/plugins", "bin/customscanners", "logs"):
         machine.make_directory(f"{HOME}/{path}")
 
-    # Those removed only if empty go without a word.
+    # Those removed only if empty are removed without a message.
     printed_lines(remove(machine),
                   "RM FILE: /opt/corvan/zor/zor.log.bak",
                   "RMDIR: /opt/corvan/zor/_uninst",

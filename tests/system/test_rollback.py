@@ -1,4 +1,4 @@
-"""Each fatal failure of a fresh installation, and what its rollback brings back."""
+"""Each fatal failure of a fresh installation, and what its rollback restores."""
 
 import pytest
 

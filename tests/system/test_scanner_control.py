@@ -1,4 +1,4 @@
-"""The scanners' control programs: what is run in which order, and what their failures cost."""
+"""The scanners' control programs: what is run in which order, and the effect of their failures."""
 
 import pytest
 

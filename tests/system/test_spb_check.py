@@ -1,4 +1,4 @@
-"""What `spb check` tells of a package, and that the installer does what it tells."""
+"""What `spb check` reports about a package, and that the installer behaves as reported."""
 
 import json
 import random
@@ -85,7 +85,7 @@ def with_damaged_data():
 
 
 def as_stored_in_the_directory():
-    """A deflated entry that only its local header calls so; the scan reads it all the same."""
+    """An entry that only its local header calls deflated; the scan reads it anyway."""
     archive = spb_tool.archive().add(IMAGE_ROOT + "bin/x", b"x" * 100, DEFLATED)
     archive.entries[-1].method = STORED
     return archive.content()
@@ -431,7 +431,7 @@ NOTHING = {
 
 
 def told(findings, last_kind):
-    """`findings` with their kinds: what makes a package fail stands last in its case."""
+    """`findings` with their kinds: what makes a package fail comes last in its case."""
     triples = [("surprises", code, entry) for code, entry in findings]
     return [*triples[:-1], (last_kind, *findings[-1])]
 
@@ -515,7 +515,7 @@ def test_check_and_installer_agree_on_a_damaged_package(empty_machine, seed):
 
     status, findings = spb_tool.check(empty_machine.at(SPB))
 
-    # What a damaged scanner control does when it is called, nobody can tell beforehand.
+    # What a damaged scanner control does when it is called cannot be predicted.
     if "bin/trawlcfg" not in [entry for _, _, entry in findings]:
         assert (status == 2) == (outcome.status != 0), (findings, outcome.stdout)
 

@@ -1,4 +1,4 @@
-"""The manual page of `spb`: it renders, and tells what the tool does."""
+"""The manual page of `spb` renders, and says what the tool does."""
 
 import re
 import subprocess

@@ -97,7 +97,7 @@ def test_a_property_file_keeps_comments_blanks_order_and_unknown_lines(machine, 
 
 
 def test_a_placeholder_that_forms_when_another_is_filled_in_is_filled_in_later(machine):
-    # "$(ZOR_ConfigRootDirectory)" stands whole only where "$(FileSeparator)" still follows it.
+    # "$(ZOR_ConfigRootDirectory)" is whole only where "$(FileSeparator)" still follows it.
     text = installed(machine, "config/Zor.properties",
                      b"$(FileSeparator)$(FileSeparator)$(ZOR_ConfigRootDirectory)\n")
 

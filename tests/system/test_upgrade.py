@@ -554,7 +554,7 @@ def test_the_property_file_keeps_carriage_returns_and_comments(machine):
 # The trace property file.
 
 def traces_after_upgrade(machine, settings, traces):
-    """What becomes of the package's text `traces` beside the installed `settings`."""
+    """What an upgrade makes of the package's text `traces` with the installed `settings`."""
     install_older(machine)
     machine.plant(MAIN, settings)
     machine.pack({"config/ZorTrace.properties": traces.encode()})

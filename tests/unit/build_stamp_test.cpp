@@ -17,7 +17,7 @@ TEST(BuildStampTest, TheStampOfThisInstaller)
     EXPECT_EQ("22/12/02", stampBuildDate(zorBuildStamp));
 }
 
-TEST(BuildStampTest, TheVersionIsUpToFourNumbersBehindTheUnderscore)
+TEST(BuildStampTest, TheVersionIsUpToFourNumbersAfterTheUnderscore)
 {
     EXPECT_EQ("1.2.3.0004/0", versionOf("22/12/02zor_1.2.3.4"));
     EXPECT_EQ("1.2.3.0000/0", versionOf("zor_1.2.3"));

@@ -115,7 +115,7 @@ TEST_F(CommandLineTest, AColonInTheExploiterEndsTheRunWithoutTheUsage)
     EXPECT_EQ("", spbPackage);
 }
 
-TEST_F(CommandLineTest, AnActionIsLookedAtBeforeTheExploiter)
+TEST_F(CommandLineTest, TheActionIsCheckedBeforeTheExploiter)
 {
     expectUsageError({"x", "AB:C"}, "Invalid command: x\n");
 }
@@ -162,7 +162,7 @@ TEST_F(CommandLineTest, DNamesTheTargetAndThePrivatePath)
     EXPECT_EQ("Target directory: /opt/x/\n", log.text());
 }
 
-TEST_F(CommandLineTest, TheLastOfTwoTargetsCounts)
+TEST_F(CommandLineTest, TheLastOfTwoTargetsWins)
 {
     EXPECT_EQ(0, parse({"r", "ABC", "-d", "/a", "-d", "/b"}));
 
@@ -346,7 +346,7 @@ TEST_F(CommandLineTest, ZToleratesNonFatalErrors)
     EXPECT_TRUE(ignoreNonFatalErrors);
 }
 
-TEST_F(CommandLineTest, TheLastOfTwoInstallTypesCountsAndAWarningTells)
+TEST_F(CommandLineTest, TheLastOfTwoInstallTypesWinsWithAWarning)
 {
     EXPECT_EQ(0, parse({"i", "ABC", "-s", "x.spb", "-eeo", "-l", "-g"}));
 

@@ -66,7 +66,7 @@ TEST_F(CommonDirectoryTest, AValueOfBlanksIsNotTrimmed)
     EXPECT_EQ("  ", directoryOf("corvan_common_dir=  \n"));
 }
 
-TEST_F(CommonDirectoryTest, WithoutTheKeyTheDefaultStands)
+TEST_F(CommonDirectoryTest, WithoutTheKeyTheDefaultIsUsed)
 {
     EXPECT_EQ("/usr/kel/corvan/common", directoryOf("other=/x\n"));
     EXPECT_EQ("/usr/kel/corvan/common", directoryOf(""));

@@ -216,7 +216,7 @@ TEST_F(DiscoveryTest, AnEmptyScannerControlIsStatus6)
                               "size.\n"));
 }
 
-TEST_F(DiscoveryTest, AHomeThatEndsInASlashGetsNoSecondOneButInTheIndex)
+TEST_F(DiscoveryTest, AHomeThatEndsInASlashGetsASecondOneInTheIndexOnly)
 {
     makeDirectories("/etc/zor");
     writeFile("/etc/zor/zor.ini", "ZOR_Version = 1\nZOR_HomeDirectory = /opt/corvan/zor/\n"
@@ -290,7 +290,7 @@ TEST_F(DiscoveryTest, ALaterBuildOrANewerVersionNeedsNoUpgrade)
     EXPECT_FALSE(discoverVersion("9.2.30.0004.1", "22/01/01").upgradeNeeded);
 }
 
-TEST_F(DiscoveryTest, ARemovalIsNoInstallation)
+TEST_F(DiscoveryTest, ARemovalIsNotAnInstallation)
 {
     commandLine.action = 'r';
 

@@ -12,7 +12,7 @@
 
 namespace {
 
-/// Lets the process live in the time zone `zone` for a while.
+/// Sets the time zone of the process while it lives.
 class TimeZone {
 public:
     explicit TimeZone(const char* zone)

@@ -60,7 +60,7 @@ TEST_F(DeleteFileTest, DeletesALinkAndNotWhatItNames)
     EXPECT_EQ(Lines{"f 0644 file"}, treeOf(dir.path()));
 }
 
-TEST_F(DeleteFileTest, LogsAlsoWhatItCannotDelete)
+TEST_F(DeleteFileTest, LogsEvenWhatItCannotDelete)
 {
     EXPECT_EQ(-1, deleteFile(dir / "missing"));
 
@@ -77,7 +77,7 @@ protected:
         writeFile(dir / "tree/sub/deep/file", "");
     }
 
-    /// Closes a directory for changes by the test itself, whoever runs it.
+    /// Makes a directory read-only for the test itself, even if root runs it.
     void protect(const std::string& name)
     {
         EXPECT_EQ(0, chmod((dir / name).c_str(), 0555));
@@ -165,14 +165,14 @@ TEST_F(RemoveTreeTest, KeepingDirectoriesWithoutRecursionDeletesTheFilesOnTop)
               treeOf(dir.path()));
 }
 
-TEST_F(RemoveTreeTest, AMissingDirectoryIsFalseWithoutAWord)
+TEST_F(RemoveTreeTest, AMissingDirectoryIsFalseAndPrintsNothing)
 {
     EXPECT_FALSE(removeTree(dir / "missing", true, false));
 
     EXPECT_EQ("", log.text());
 }
 
-TEST_F(RemoveTreeTest, AFileIsNoTree)
+TEST_F(RemoveTreeTest, AFileIsNotATree)
 {
     EXPECT_FALSE(removeTree(dir / "tree/file", true, false));
 

@@ -15,8 +15,8 @@ using Names = std::vector<std::string>;
 
 constexpr std::uint64_t TwoGiB = 0x80000000U;
 
-/// Three items that the directory lists backwards, so that the order of the entries tells which of
-/// the two roads was taken.
+/// Three items that the directory lists backwards, so that the order of the entries shows
+/// whether the directory was read or the file scanned.
 ZipArchive twoRoads()
 {
     return {{storedItem("one", "1"), storedItem("two", "22"), storedItem("three", "333")},
@@ -62,7 +62,7 @@ TEST_F(ZipDirectoryTest, EntriesComeInTheOrderOfTheCentralDirectory)
     EXPECT_EQ(FromDirectory, namesOf(twoRoads()));
 }
 
-TEST_F(ZipDirectoryTest, AnEntryTellsWhatItsHeadersSay)
+TEST_F(ZipDirectoryTest, AnEntryHoldsWhatItsHeadersSay)
 {
     ZipArchive archive = {{storedItem("bin/a", "abc"), deflatedItem("bin/b", "")}};
     archive.items[1].data = "12345";
@@ -95,7 +95,7 @@ TEST_F(ZipDirectoryTest, TheNameIsThatOfTheLocalHeader)
     EXPECT_EQ(FromDirectory, namesOf(archive));
 }
 
-TEST_F(ZipDirectoryTest, SizesAndCrcOfTheLocalHeaderAreNotLookedAt)
+TEST_F(ZipDirectoryTest, SizesAndCrcOfTheLocalHeaderAreIgnored)
 {
     ZipArchive archive = twoRoads();
     archive.items[0].local.crc = 1;
@@ -185,7 +185,7 @@ TEST_F(ZipDirectoryTest, AFileCommentOnTheLastCentralHeaderDoesNoHarm)
     EXPECT_EQ(FromDirectory, namesOf(archive));
 }
 
-TEST_F(ZipDirectoryTest, TheLocalSignatureIsNotLookedAt)
+TEST_F(ZipDirectoryTest, TheLocalSignatureIsIgnored)
 {
     ZipArchive archive = twoRoads();
     archive.items[1].local.signature = "ZZZZ";
@@ -385,7 +385,7 @@ TEST_F(ZipDirectoryTest, ALocalNameCutShortLeadsToTheScan)
     EXPECT_EQ((Names{"one", "two"}), namesOf(archive));
 }
 
-TEST_F(ZipDirectoryTest, BytesBeforeTheArchiveSpoilBothRoads)
+TEST_F(ZipDirectoryTest, BytesBeforeTheArchiveSpoilDirectoryAndScan)
 {
     EXPECT_EQ(3, codeOf(std::string("#!") + zipBytes(twoRoads())));
     EXPECT_TRUE(entries.empty());
@@ -659,7 +659,7 @@ TEST_F(ZipDirectoryTest, TheScanSkipsDataThatEndsJustBelow2ToThe31)
     EXPECT_EQ(7, codeOf(headerBytes(header)));
 }
 
-/// A first entry that reaches to `second`, where another local header stands.
+/// A first entry that reaches to `second`, where another local header begins.
 class FarHeaderTest : public ZipDirectoryTest {
 protected:
     int codeOfFar(std::uint64_t offset, const std::string& second)

@@ -16,7 +16,7 @@ const std::string ImageRoot = "/home/zorbuild/zor_src_dir/ZOR/zor_pkgs/images/li
 
 ZipItem itemOf(const std::string& name, const std::string& content)
 {
-    // Both kinds of stream are met: small files are stored.
+    // Small files are stored, so that both kinds of stream are used.
     return content.size() < 100 ? storedItem(ImageRoot + name, content)
                                 : deflatedItem(ImageRoot + name, content);
 }

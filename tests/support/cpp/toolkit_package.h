@@ -1,5 +1,5 @@
-// A small toolkit for tests: its files, the SPB that carries them, and scanner programs that tell
-// how they were called.
+// A small toolkit for tests: its files, the SPB that carries them, and scanner programs that log
+// their calls.
 #pragma once
 
 #include <string>

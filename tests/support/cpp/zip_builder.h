@@ -2,7 +2,7 @@
 //
 // An archive is its items (local header, data, central header, in the order of the file) and an end
 // record. Fields that are left unset get the value that makes the archive sound: offsets, counts,
-// lengths of names. Every other field is written as it stands, so a test says in one assignment
+// lengths of names. Every other field is written unchanged, so a test says in one assignment
 // what is wrong with its archive:
 //
 //     ZipArchive archive = {{storedItem("a", "text")}};
@@ -39,13 +39,13 @@ struct CentralHeader {
     std::string name;
     std::string extra;
     std::string comment;
-    std::optional<std::uint32_t> localOffset; ///< unset: where the item lies
+    std::optional<std::uint32_t> localOffset; ///< unset: the item's place
 };
 
 struct ZipItem {
     LocalHeader local;
     CentralHeader central;
-    std::string data; ///< as it lies in the archive
+    std::string data; ///< as it is in the archive
 };
 
 struct EndRecord {
@@ -54,7 +54,7 @@ struct EndRecord {
     std::uint32_t directoryDisk = 0;
     std::optional<std::uint32_t> entriesOnDisk;   ///< unset: as many as listed
     std::optional<std::uint32_t> totalEntries;    ///< unset: as many as listed
-    std::optional<std::uint32_t> directoryOffset; ///< unset: where the directory lies
+    std::optional<std::uint32_t> directoryOffset; ///< unset: the directory's place
     std::string comment;
 };
 
@@ -64,10 +64,10 @@ struct ZipArchive {
     EndRecord end = {};
 };
 
-/// An item whose headers tell the truth about `content`, stored as it is.
+/// An item with correct headers: `content`, stored.
 ZipItem storedItem(const std::string& name, const std::string& content);
 
-/// An item whose headers tell the truth about `content`, deflated at `level` (0 to 9).
+/// An item with correct headers: `content`, deflated at `level` (0 to 9).
 ZipItem deflatedItem(const std::string& name, const std::string& content, int level = 6);
 
 /// The whole archive.

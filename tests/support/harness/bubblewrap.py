@@ -1,6 +1,6 @@
-"""A machine of a test's own: a root directory, and the bwrap command line that runs in it.
+"""A machine for one test: a root directory, and the bwrap command line that runs in it.
 
-The root directory lies on the host, so that whatever a test plants or inspects in it has exact
+The root directory is on the host, so that whatever a test plants or inspects in it has exact
 bytes and modes. Only programs and libraries are borrowed from the real machine, read-only; its
 /etc, /opt, /usr/kel and homes are never seen. A user namespace with a single mapping makes the
 answers the same whether the suite is run by root or by an ordinary user: user 0 of the sandbox
@@ -13,11 +13,11 @@ import shutil
 import stat
 import tempfile
 
-# Children of /usr that are not borrowed: the toolkit's common directory lies in /usr/kel, and
+# Children of /usr that are not borrowed: the toolkit's common directory is in /usr/kel, and
 # /usr/sbin must not bring the real machine's SELinux tools.
 OWN_USR_CHILDREN = ("kel", "sbin")
 
-# Merged into /usr on the supported systems; elsewhere they are borrowed as they are.
+# Merged into /usr on the supported systems; elsewhere they are mounted unchanged.
 MERGED_DIRECTORIES = ("bin", "lib", "lib32", "lib64", "libx32")
 
 # The settings of a sanitizer or of GoogleTest reach the sandboxed program, nothing else does.
@@ -37,7 +37,7 @@ SKELETON = {
     "/var": 0o755,
 }
 
-# Nothing that a test looks at.
+# Not part of what tests compare.
 COUNTS = "/var/counts"
 
 NAME_SERVICES = "passwd: files\ngroup: files\nhosts: files\n"
@@ -49,7 +49,7 @@ def at(root, path):
 
 
 def new_root():
-    """Makes a furnished root directory below the host's temporary directory."""
+    """Makes a root directory with its basic files below the host's temporary directory."""
     root = os.path.realpath(tempfile.mkdtemp(prefix="wzorinst-"))
     os.chmod(root, 0o755)
     for path, mode in SKELETON.items():
@@ -117,7 +117,7 @@ def make_mount_point(root, path):
 def environment_of(home, changes=None):
     """The sandboxed program's whole environment: `changes` win, None takes a variable away.
 
-    WZOR_SANDBOX tells tests that plant files in /etc or /usr that these are their own.
+    WZOR_SANDBOX allows the tests that plant files in /etc or /usr to do so.
     """
     environment = {"PATH": "/usr/bin", "TZ": "UTC0", "HOME": home, "WZOR_SANDBOX": "1"}
     environment.update({name: value for name, value in os.environ.items()

@@ -1,4 +1,4 @@
-"""Comparisons whose failure shows all of what was expected and all of what came."""
+"""Comparisons that show both sides in full when they fail."""
 
 import difflib
 
@@ -9,7 +9,7 @@ def same_text(actual, expected, what="text"):
         return
     difference = "\n".join(difflib.unified_diff(
         expected.splitlines(), actual.splitlines(), "expected", "actual", lineterm="", n=2))
-    raise AssertionError(f"\n{what} expected:\n{expected}\n{what} that came:\n{actual}\n"
+    raise AssertionError(f"\n{what} expected:\n{expected}\n{what} found:\n{actual}\n"
                          f"difference:\n{difference}\n")
 
 
@@ -23,21 +23,21 @@ def printed(outcome, expected, status=0, stderr=""):
     """Checks all that a run left behind in its streams, and its exit status."""
     same_text(outcome.stdout, expected, "standard output")
     same_text(outcome.stderr, stderr, "standard error")
-    assert outcome.status == status, f"exit status expected: {status}, came: {outcome.status}"
+    assert outcome.status == status, f"exit status expected: {status}, found: {outcome.status}"
 
 
 def printed_lines(outcome, *lines):
     """Checks that the output holds `lines`, one right after the other."""
     block = "".join(line + "\n" for line in lines)
     if "\n" + block not in "\n" + outcome.stdout:
-        raise AssertionError(f"\nlines expected somewhere:\n{block}\noutput that came:\n"
+        raise AssertionError(f"\nlines expected somewhere:\n{block}\noutput found:\n"
                              f"{outcome.stdout}")
 
 
 def not_printed(outcome, text):
     """Checks that `text` occurs nowhere in the output."""
     if text in outcome.stdout:
-        raise AssertionError(f"\ntext not expected:\n{text}\noutput that came:\n{outcome.stdout}")
+        raise AssertionError(f"\ntext not expected:\n{text}\noutput found:\n{outcome.stdout}")
 
 
 def same_tree(actual, expected):
@@ -48,7 +48,7 @@ def same_tree(actual, expected):
     for path in sorted(set(actual) | set(expected)):
         before, after = expected.get(path), actual.get(path)
         if before != after:
-            lines.append(f"{path}\n    expected: {describe(before)}\n    came:     "
+            lines.append(f"{path}\n    expected: {describe(before)}\n    found:    "
                          f"{describe(after)}\n")
     raise AssertionError("\ntrees differ:\n" + "".join(lines))
 

@@ -65,7 +65,7 @@ def probe_stays(case, path):
 
 
 @rule("a failed step of a commit",
-      "A commit ignores failures: the backup that cannot be deleted stays beside the new file.", 0)
+      "A commit ignores failures: the backup that cannot be deleted stays next to the new file.", 0)
 def backup_stays(case, path):
     return (path.endswith(BACKUP) and path == case.hit and case.kind in ("unlink", "walk")
             and case.new(path)
@@ -74,7 +74,7 @@ def backup_stays(case, path):
 
 @rule("a failed step of a rollback",
       "A rollback ignores failures and goes on: what it cannot delete, remove or rename stays, and "
-      "the old content of a file that was not renamed back lies in its backup.", 1)
+      "the old content of a file that was not renamed back is in its backup.", 1)
 def rollback_step_fails(case, path):
     original = case.hit.removesuffix(BACKUP)
     if not case.point.late or case.kind not in ("unlink", "rename", "rmdir", "walk"):
@@ -117,7 +117,7 @@ def upgrade_deletion_is_best_effort(case, path):
                               "walk"))
 
 
-# Records that are kept beside the journal.
+# Records that are kept outside of the journal.
 
 @rule("the index is not journalled",
       "The index of installed files stays after a rollback, as it then is, and is deleted after a "
@@ -143,7 +143,7 @@ def index_is_best_effort(case, path):
     return ours and all(line in known for line in lines_of(case.content(path))[1:])
 
 
-@rule("the index tells a removal what to delete",
+@rule("a removal deletes what the index lists",
       "A removal whose index cannot be read lists only the installer's own files and leaves the "
       "rest; one whose index is empty takes every file in the known places.", 0)
 def removal_goes_by_the_index(case, path):

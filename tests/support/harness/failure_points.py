@@ -20,7 +20,7 @@ TRACE = "/var/strace/trace"
 TIME_LIMIT = 30  # seconds
 
 # What each kind of call can give of the four errors. A write and a close can give what a network
-# file system tells late; on a local one a close never fails.
+# file system reports late; on a local one a close never fails.
 ERRORS = {
     "access": ("EIO", "EACCES"),
     "chmod": ("EIO", "EACCES"),
@@ -85,9 +85,9 @@ DESCRIPTOR = re.compile(r"^\d+<(.*?)>(?:\(deleted\))?(?:, |$)")
 class Point:
     """The `count`th call by the name `name`, on `path`: for a descriptor, the path behind it.
 
-    `late` tells that the procedure of an installation is over: its commit or rollback and the modes
-    of the tree follow. `result` is what the call gave in the traced run, `entry` the file that was
-    being extracted meanwhile, if one was. `target` is the new name that a renaming gives.
+    `late` is true once the procedure of an installation is over: its commit or rollback and the
+    modes of the tree follow. `result` is what the call gave in the traced run, `entry` the file
+    that was being extracted meanwhile, if one was. `target` is the new name that a renaming gives.
     """
 
     name: str

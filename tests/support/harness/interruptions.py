@@ -53,7 +53,7 @@ def lines_at(tree, path):
 
 
 @rule("the installation was registered already",
-      "A fresh installation that is killed behind the writing of zor.ini is found by the second "
+      "A fresh installation that is killed after the writing of zor.ini is found by the second "
       "run, which upgrades it: the settings have the keys that an upgrade adds, "
       "ZorTrace.properties is that of an upgrade, the cache is gone.", 0)
 def was_registered_already(case, path):
@@ -63,7 +63,7 @@ def was_registered_already(case, path):
 
 
 @rule("what only a fresh installation makes",
-      "Behind the registry come the install type and the common trace path. An upgrade makes "
+      "After the registry come the install type and the common trace path. An upgrade makes "
       "neither, so what the killed run had not made is missing.", 0)
 def only_fresh_installations_make_it(case, path):
     if not is_finished_installation(case):

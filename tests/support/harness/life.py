@@ -1,4 +1,4 @@
-"""A life at random: a seeded walk through actions, options, packages, planted files and failures.
+"""A random life: a seeded sequence of actions, options, packages, planted files and failures.
 
 After each action the model (life_model.py) says what must have happened. A failing life prints
 its seed and its steps; the same seed lives the same life again.
@@ -43,7 +43,7 @@ PLANTED = {
 VERSIONS = ((1, 0, 0, 0), (9, 2, 29, 9999), OWN_VERSION, (9, 2, 30, 1), (10, 0, 0, 0))
 DATES = ("21/06/30", "22/12/02", "23/01/01")
 
-# Directories that an installation leaves behind for good, beside the setting's own.
+# Directories that an installation leaves behind for good, besides those of the setting.
 COMMON_DIRECTORIES = ("/usr/kel", "/usr/kel/corvan", "/usr/kel/corvan/common")
 
 # Removed with the shared installation, but made by private ones of root as well.

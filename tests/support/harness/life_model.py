@@ -1,4 +1,4 @@
-"""The model behind the random lives: what an action must do, told from the history alone.
+"""The model behind the random lives: what an action must do, from the history alone.
 
 A life is lived on one machine with two places: the shared installation of root and the one of
 the user ann. For each place the model holds the `Record` that its registry must contain.
@@ -15,7 +15,7 @@ OWN_VERSION = (9, 2, 30, 0)
 OWN_DATE = "22/12/02"
 
 # The packages of the lives: what differs from the toolkit, what is left out, and whether its
-# extraction succeeds. None of the first three stands for a file that is no archive.
+# extraction succeeds. None for the first two means a file that is not an archive.
 EMPTY = b""
 PACKAGES = {
     "the toolkit": ({}, (), True),
@@ -32,7 +32,7 @@ PACKAGES = {
     "no archive": (None, None, False),
 }
 
-# What is copied as it stands and never edited afterwards.
+# Files that are copied unchanged and never edited afterwards.
 UNEDITED = re.compile(r"^(bin/|properties/|config/xss/|config/ZorHWConfig.xml)")
 
 OWN_FILES = ("bin/libzor.so", "config/Zor.tmp", "config/SingleUserMode", "zor.log", "zor.log.bak")

@@ -23,7 +23,7 @@ KEEPS_LITTLE = {"ASAN_OPTIONS": "quarantine_size_mb=1"}
 
 @dataclass(frozen=True)
 class Load:
-    """`small_files` beside the toolkit, or one of `huge_size` zeros.
+    """`small_files` besides the toolkit, or one of `huge_size` zeros.
 
     With `commented` the first central header carries a comment, so that the installer reads the
     local headers instead: the only way to more files than a central directory can count.

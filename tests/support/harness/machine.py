@@ -16,7 +16,7 @@ from harness import bubblewrap, toolkit
 BINARY = "/media/wzorinst"
 SPB = "/media/toolkit.spb"
 
-# What a tree or listing leaves out: the borrowed machine, the media and the scanners' logs.
+# What a tree or listing leaves out: the real machine, the media and the scanners' logs.
 UNLISTED = ("/dev", "/media", "/proc", "/usr/sbin", "/var", "/sbin", "/etc/alternatives",
             "/etc/ld.so.cache", "/etc/nsswitch.conf", "/etc/passwd", "/etc/group",
             *("/" + name for name in bubblewrap.MERGED_DIRECTORIES))
@@ -68,7 +68,7 @@ class Node:
 
 
 class Machine:
-    """One machine; `root` is where it lies on the host."""
+    """One machine; `root` is its path on the host."""
 
     def __init__(self, binary):
         self.root = bubblewrap.new_root()

@@ -48,7 +48,7 @@ GIVEN_AWAY = (REGISTRY, COMMON_SETTING, INDEX, SETTINGS, HOME + "/bin/trawlhw", 
 
 @dataclass(frozen=True)
 class Scenario:
-    """One way through the installer. `fails` tells how an undisturbed run ends."""
+    """One way through the installer. `fails` is true if an undisturbed run fails."""
 
     name: str
     title: str
@@ -125,7 +125,7 @@ def register_version(machine, version, build_date):
 
 
 def older_version(machine):
-    """An older version with other contents and modes, files of its own and an owner's changes."""
+    """An older version with other contents and modes, more files and an owner's changes."""
     two_exploiters(machine)
     register_version(machine, "9.1.7.0003", "21/03/04")
     for path, node in machine.tree(HOME).items():

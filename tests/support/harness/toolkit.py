@@ -1,9 +1,9 @@
 """The toolkit that the system tests install, and its package.
 
-Small, but with every file that the installer touches. The scanner programs write their command
-lines and their LD_LIBRARY_PATH to files outside of every installation, so that they survive a
-removal, and fail when the test says so in /var/scanners/fail: lines of a text and an exit
-status; the first text found in the program's path and arguments decides.
+Small, but with every file that the installer touches. The scanner programs log their command lines
+and their LD_LIBRARY_PATH to files outside of every installation, so that these survive a removal.
+They fail if a test says so in /var/scanners/fail: each line is a text and an exit status, and the
+first text found in the program's path and arguments decides.
 """
 
 from harness.zip_archive import DEFLATED, IMAGE_ROOT, STORED, Archive
@@ -83,7 +83,7 @@ def archive(changes=None, without=()):
     """The package as an archive still open to changes.
 
     `changes` maps names below the image root to other or further contents; `without` names what
-    is left out. Every second file is stored, so that both kinds of stream are met.
+    is left out. Every second file is stored, so that both kinds of stream are used.
     """
     files = dict(FILES)
     files.update(changes or {})

@@ -1,4 +1,4 @@
-"""Writes SPB archives, right and wrong ones, byte by byte.
+"""Writes SPB archives, valid and damaged ones, byte by byte.
 
 An SPB is a zip archive whose entry names begin with the image root. Local headers, data, central
 directory and end record are assembled here, so that each field of each record can be made wrong on
@@ -69,7 +69,7 @@ class Writer:
         self.central = bytearray()
 
     def add(self, entry, hole=0):
-        """Writes an entry; behind its data comes a hole of `hole` bytes."""
+        """Writes an entry, followed by a hole of `hole` bytes."""
         self.central += entry.central_header(self.file.tell())
         self.file.write(entry.local_header() + entry.packed)
         self.file.seek(hole, os.SEEK_CUR)
@@ -98,9 +98,9 @@ class Archive:
         self.comment = b""
 
     def add(self, name, data=b"", method=DEFLATED, **fields):
-        """Appends an entry with the full name `name`; `fields` override what would be right.
+        """Appends an entry with the full name `name`; `fields` override the correct values.
 
-        A method other than stored and deflated leaves the data as they are.
+        With a method other than stored and deflated, the data are written unchanged.
         """
         if isinstance(name, str):
             name = name.encode()
