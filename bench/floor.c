@@ -1,12 +1,14 @@
 // The floor of an unpacker: what any program must do, and nothing else.
 //
-//     floor ARCHIVE DIRECTORY [PIECE]
+//     floor ARCHIVE DIRECTORY libdeflate
+//     floor ARCHIVE DIRECTORY zlib [PIECE]
 //
 // Maps the archive, walks its local headers, and for each entry makes the directory, or opens,
-// writes, fchmods and closes the file. A deflated entry is inflated in one call, or in pieces of
-// PIECE bytes. No journal, no index, no check: the benchmark's packages are sound and carry their
-// sizes in their local headers. Exit status 0, or 1 at the first failure.
+// writes, fchmods and closes the file. A deflated entry is inflated in one call, or by zlib in
+// pieces of PIECE bytes. No journal, no index, no check: the benchmark's packages are sound and
+// carry their sizes in their local headers. Exit status 0, or 1 at the first failure.
 #include <fcntl.h>
+#include <libdeflate.h>
 #include <stdint.h>
 #include <stdio.h>
 #include <stdlib.h>
@@ -36,32 +38,61 @@ static uint32_t read32(const unsigned char* at)
     return read16(at) | read16(at + 2) << 16;
 }
 
-static void inflateTo(int file, z_stream* stream, size_t size, size_t piece)
+/// At least `size` bytes, which the next call takes back.
+static unsigned char* buffer(size_t size)
 {
-    static unsigned char* buffer;
-    static size_t bufferSize;
-    const size_t room = piece != 0 ? piece : size;
-    if (room > bufferSize) {
-        free(buffer);
-        buffer = malloc(bufferSize = room);
+    static unsigned char* bytes;
+    static size_t room;
+    if (size > room) {
+        free(bytes);
+        bytes = malloc(room = size);
+        check(bytes != NULL, "malloc");
     }
+    return bytes;
+}
 
-    int status = inflateReset(stream);
+static void writeTo(int file, const unsigned char* bytes, size_t count)
+{
+    check(write(file, bytes, count) == (ssize_t)count, "write");
+}
+
+static void inflateAtOnce(int file, const unsigned char* data, size_t packed, size_t size)
+{
+    static struct libdeflate_decompressor* decompressor;
+    if (decompressor == NULL)
+        decompressor = libdeflate_alloc_decompressor();
+    unsigned char* const content = buffer(size);
+    check(libdeflate_deflate_decompress(decompressor, data, packed, content, size, NULL) ==
+              LIBDEFLATE_SUCCESS,
+          "libdeflate");
+    writeTo(file, content, size);
+}
+
+/// In pieces of `piece` bytes; 0: in one.
+static void inflateByZlib(int file, const unsigned char* data, uint32_t packed, size_t size,
+                          size_t piece)
+{
+    static z_stream stream;
+    static int status = Z_STREAM_ERROR;
+    status = status == Z_STREAM_ERROR ? inflateInit2(&stream, -15) : inflateReset(&stream);
+    stream.next_in = (unsigned char*)data;
+    stream.avail_in = packed;
+    const size_t room = piece != 0 ? piece : size;
     while (status == Z_OK) {
-        stream->next_out = buffer;
-        stream->avail_out = (uInt)room;
-        status = inflate(stream, Z_NO_FLUSH);
-        const size_t count = room - stream->avail_out;
-        check(write(file, buffer, count) == (ssize_t)count, "write");
+        stream.next_out = buffer(room);
+        stream.avail_out = (uInt)room;
+        status = inflate(&stream, Z_NO_FLUSH);
+        writeTo(file, buffer(room), room - stream.avail_out);
     }
     check(status == Z_STREAM_END, "inflate");
 }
 
 int main(int argc, char** argv)
 {
-    if (argc < 3)
+    if (argc < 4)
         return 1;
-    const size_t piece = argc > 3 ? strtoul(argv[3], NULL, 10) : 0;
+    const int byZlib = strcmp(argv[3], "zlib") == 0;
+    const size_t piece = argc > 4 ? strtoul(argv[4], NULL, 10) : 0;
     const int archive = open(argv[1], O_RDONLY);
     struct stat status;
     check(archive >= 0 && fstat(archive, &status) == 0, argv[1]);
@@ -69,8 +100,6 @@ int main(int argc, char** argv)
         mmap(NULL, (size_t)status.st_size, PROT_READ, MAP_PRIVATE, archive, 0);
     check(at != MAP_FAILED, "mmap");
     umask(0);
-    z_stream stream = {0};
-    check(inflateInit2(&stream, -15) == Z_OK, "inflateInit2");
 
     while (memcmp(at, "PK\3\4", 4) == 0) {
         const uint32_t packed = read32(at + 18);
@@ -85,12 +114,12 @@ int main(int argc, char** argv)
         } else {
             const int file = open(path, O_WRONLY | O_CREAT | O_TRUNC, FileMode);
             check(file >= 0, path);
-            stream.next_in = (unsigned char*)data;
-            stream.avail_in = packed;
             if (read16(at + 8) == 0)
-                check(write(file, data, size) == (ssize_t)size, path);
+                writeTo(file, data, size);
+            else if (byZlib)
+                inflateByZlib(file, data, packed, size, piece);
             else
-                inflateTo(file, &stream, size, piece);
+                inflateAtOnce(file, data, packed, size);
             check(fchmod(file, FileMode) == 0 && close(file) == 0, path);
         }
         at = data + packed;

@@ -1,158 +1,253 @@
-"""Turns the results of a benchmark into tables: ratios and their goals.
+"""Turns the results of a benchmark into tables: ratios, compared with their goals.
 
-A ratio is the median of the installer over the median of its opponent in the same contest. A goal
-for times holds for wall and for CPU time. The pairs of goals are for the 64-bit and the 32-bit
-build.
+A ratio is the median of the installer over the median of another contestant of the same race. It
+comes twice, for wall and for CPU time, and a goal holds for both unless said otherwise. Where a
+goal is missed, the ratio is bold. The pairs of goals are for the 64-bit and the 32-bit build.
 """
 
-TIME_GOALS = {
-    ("install", "typical"): {"unzip": (0.60, 0.62), "7zz": (0.85, 0.85), "bsdtar": (1.00, 1.05),
-                             "floor": (1.10, 1.10)},
-    ("install", "large"): {"unzip": (0.52, 0.52), "7zz": (0.75, 0.75), "bsdtar": (1.00, 1.00),
-                           "floor in pieces": (1.12, 1.12)},
-    ("install", "stored"): {"unzip": (0.20, 0.20), "7zz": (0.85, 0.85), "bsdtar": (0.85, 0.85),
-                            "floor": (1.10, 1.10)},
-    ("install", "many"): {"unzip": (0.60, 0.60), "7zz": (0.62, 0.62), "bsdtar": (0.70, 0.70),
-                          "floor": (1.20, 1.20)},
-    ("install", "many100k"): {"unzip": (0.62, 0.62), "7zz": (0.60, 0.60), "bsdtar": (0.60, 0.60),
-                              "floor": (1.40, 1.40)},
-    ("upgrade", "typical"): {"unzip": (0.65, 0.65), "bsdtar": (1.08, 1.08)},
-    ("upgrade", "many"): {"unzip": (0.90, 0.90), "bsdtar": (1.00, 1.00)},
+GOALS = {
+    ("install", "typical"): {
+        "unzip": (0.30, 0.33),
+        "7zz": (0.38, 0.44),
+        "bsdtar": (0.47, 0.54),
+        "dpkg": (0.33, 0.33),
+        "libdeflate floor": (1.12, 1.18),
+    },
+    ("install", "large"): {
+        "unzip": (0.27, 0.31),
+        "7zz": (0.37, 0.41),
+        "bsdtar": (0.48, 0.53),
+        "dpkg": (0.35, 0.35),
+        "libdeflate floor": (1.05, 1.15),
+    },
+    ("install", "stored"): {
+        "unzip": (0.12, 0.12),
+        "7zz": (0.60, 0.60),
+        "bsdtar": (0.62, 0.62),
+        "dpkg": (0.35, 0.35),
+    },
+    ("install, no commands", "stored"): {"libdeflate floor": (1.10, 1.10)},
+    ("install", "many"): {
+        "unzip": (0.40, 0.43),
+        "7zz": (0.44, 0.47),
+        "bsdtar": (0.50, 0.54),
+        "dpkg": (0.36, 0.36),
+        "libdeflate floor": (1.12, 1.15),
+    },
+    ("install on disk", "many"): {"dpkg": (0.48, 0.48)},
+    ("install", "many100k"): {
+        "unzip": (0.43, 0.43),
+        "7zz": (0.44, 0.44),
+        "bsdtar": (0.46, 0.46),
+        "dpkg": (0.38, 0.38),
+        "libdeflate floor": (1.15, 1.15),
+    },
+    ("upgrade", "typical"): {
+        "unzip": (0.38, 0.38),
+        "bsdtar": (0.58, 0.58),
+        "dpkg": (0.45, 0.45),
+    },
+    ("upgrade", "many"): {"unzip": (0.72, 0.72), "bsdtar": (0.78, 0.78), "dpkg": (0.45, 0.45)},
     ("removal", "typical"): {"rm -rf": (2.50, 2.50)},
     ("removal", "many"): {"rm -rf": (1.25, 1.25)},
+    ("fixed cost, no commands", "tiny"): {"line": (1.75, 1.75)},
+    **{
+        ("install", package): {"zlib floor": (1.10, 1.10)}
+        for package in ("one-block", "tiny-blocks", "flushed-blocks", "stored-blocks")
+    },
 }
-# Peak memory: no more than this opponent's; many100k has its own limit, in KiB.
-MEMORY_GOALS = {"typical": "unzip", "large": "unzip", "stored": "unzip", "many": "bsdtar"}
-MEMORY_LIMITS = {"many100k": 36 * 1024}
-FIXED_COST_GOAL = 1.5
-INSTRUCTIONS_GOAL = 1.05
+WALL_ONLY = ("dpkg",)  # the time that it takes to synchronise is what counts
+PEAK_GOALS = {"typical": 8, "large": 16, "stored": 3, "many": 9, "many100k": 28, "one-entry": 8}
 FILE_GROWTH_GOAL = 1.15
 MEGABYTE_GROWTH_GOAL = 1.10
+MINOR_CALLS = 10
 
-BITS = {"release": 64, "release-i686": 32}
-
-
-def ratio(contest, measure):
-    return contest["ours"][measure]["median"] / contest["theirs"][measure]["median"]
-
-
-def verdict(ok):
-    return "met" if ok else "MISSED"
-
-
-def judge(contest):
-    """Adds ratios, and goals with their verdicts, to `contest`."""
-    contest["ratios"] = {measure: ratio(contest, measure) for measure in ("wall", "cpu", "memory")}
-    contest["goals"] = goals = {}
-    kind, package, opponent = contest["kind"], contest["package"], contest["opponent"]
-
-    times = TIME_GOALS.get((kind, package), {}).get(opponent)
-    if times:
-        goals["wall"] = goals["cpu"] = times[0 if BITS[contest["preset"]] == 64 else 1]
-    if kind == "fixed cost, commands aside":
-        goals["wall"] = FIXED_COST_GOAL
-    if kind == "install" and MEMORY_GOALS.get(package) == opponent:
-        goals["memory"] = 1.0
-    contest["verdicts"] = {measure: contest["ratios"][measure] <= goal
-                           for measure, goal in goals.items()}
-    if kind == "install" and package in MEMORY_LIMITS:
-        goals["memory_limit"] = MEMORY_LIMITS[package]
-        contest["verdicts"]["memory_limit"] = (contest["ours"]["memory"]["median"]
-                                               <= MEMORY_LIMITS[package])
-
-
-def table(head, rows):
-    """A Markdown table with aligned columns."""
-    texts = [head] + [[str(cell) for cell in row] for row in rows]
-    widths = [max(len(row[column]) for row in texts) for column in range(len(head))]
-    lines = ["| " + " | ".join(cell.ljust(width) for cell, width in zip(row, widths)) + " |"
-             for row in texts]
-    lines.insert(1, "|" + "|".join("-" * (width + 2) for width in widths) + "|")
-    return "\n".join(lines)
-
-
-def beside_goal(contest, measure):
-    """The ratio, followed by the goal and whether it is met."""
-    text = f"{contest['ratios'][measure]:.2f}"
-    if measure in contest["goals"]:
-        text += f" <= {contest['goals'][measure]:.2f} {verdict(contest['verdicts'][measure])}"
-    if measure == "memory" and "memory_limit" in contest["goals"]:
-        text += (f", {contest['ours']['memory']['median'] / 1024:.1f} MiB <= "
-                 f"{contest['goals']['memory_limit'] // 1024} MiB "
-                 f"{verdict(contest['verdicts']['memory_limit'])}")
-    return text
-
-
-def contest_table(contests):
-    rows = []
-    for contest in contests:
-        ours, theirs = contest["ours"], contest["theirs"]
-        rows.append((contest["package"], contest["kind"], BITS[contest["preset"]],
-                     contest["opponent"],
-                     f"{ours['wall']['median']:.2f} / {theirs['wall']['median']:.2f}",
-                     beside_goal(contest, "wall"), beside_goal(contest, "cpu"),
-                     f"{ours['memory']['median']:.0f} / {theirs['memory']['median']:.0f}",
-                     beside_goal(contest, "memory")))
-    return table(("package", "run", "bits", "beside", "wall, ms", "ratio wall", "ratio CPU",
-                  "peak, KiB", "ratio peak"), rows)
-
-
-def growth_table(results):
-    """Time a file, or a megabyte, above the fixed cost of a run."""
-    fixed = {measure: min((contest["ours"][measure]["median"] for contest in results["contests"]
-                           if contest["kind"] == "fixed cost, whole"
-                           and contest["preset"] == "release"), default=0)
-             for measure in ("wall", "cpu")}
-    rows = []
-    first = {}
-    for row in results["growth"]:
-        package = results["packages"][row["package"]]
-        by_size = "megabytes" in row["package"] or row["package"] == "large"
-        count = package["size"] / 1e6 if by_size else package["files"]
-        goal = MEGABYTE_GROWTH_GOAL if by_size else FILE_GROWTH_GOAL
-        each = {measure: (row[measure]["median"] - fixed[measure]) / count * 1000
-                for measure in ("wall", "cpu")}
-        base = first.setdefault((row["kind"], by_size), each)
-        row["growth"] = {measure: each[measure] / base[measure] for measure in each}
-        judged = [f"{row['growth'][measure]:.2f}" for measure in ("wall", "cpu")]
-        if base is not each:
-            judged = [f"{text} <= {goal:.2f} {verdict(row['growth'][measure] <= goal)}"
-                      for text, measure in zip(judged, ("wall", "cpu"))]
-        rows.append((row["package"], row["kind"], f"{count:.0f}", "MB" if by_size else "files",
-                     f"{each['wall']:.2f}", judged[0], f"{each['cpu']:.2f}", judged[1]))
-    return table(("package", "run", "size", "of", "wall each, us", "times the first",
-                  "CPU each, us", "times the first"), rows)
-
-
-def instruction_table(rows):
-    cells = []
-    for row in rows:
-        row["ratio"] = row["ours"] / row["floor"]
-        cells.append((row["package"], BITS[row["preset"]], f"{row['ours']:,}", f"{row['floor']:,}",
-                      f"{row['ratio']:.3f} <= {INSTRUCTIONS_GOAL} "
-                      f"{verdict(row['ratio'] <= INSTRUCTIONS_GOAL)}"))
-    return table(("package", "bits", "instructions", "floor's", "ratio"), cells)
-
-
-def call_table(rows):
-    cells = []
-    for row in rows:
-        names = sorted(set(row["ours"]) | set(row["floor"]),
-                       key=lambda name, row=row: -row["ours"].get(name, 0))
-        cells += [(row["package"], name, row["ours"].get(name, 0), row["floor"].get(name, 0))
-                  for name in names]
-    return table(("package", "system call", "wzorinst", "floor"), cells)
+COLUMNS = (
+    "unzip",
+    "7zz",
+    "bsdtar",
+    "dpkg",
+    "rpm",
+    "rpm, flushed",
+    "zlib floor",
+    "libdeflate floor",
+    "line",
+    "rm -rf",
+)
+OURS = {"wzorinst": "", "wzorinst, no commands": ", no commands"}
+FILE_GROWTH = ("files1k", "files10k", "many100k")
+MEGABYTE_GROWTH = ("megabytes10", "megabytes100", "large")
 
 
 def report(results):
-    """Judges `results` in place and returns them as Markdown."""
-    for contest in results["contests"]:
-        judge(contest)
-    parts = ["## Contests", contest_table(results["contests"])]
-    if results["growth"]:
-        parts += ["## Growth", growth_table(results)]
-    if results["instructions"]:
-        parts += ["## Instructions", instruction_table(results["instructions"])]
-    if results["system_calls"]:
-        parts += ["## System calls", call_table(results["system_calls"])]
-    return "\n\n".join(parts)
+    """The whole report as Markdown."""
+    tables = {
+        "Times, on tmpfs and on disk": time_table(results),
+        "Growth": growth_table(results),
+        "System calls": call_table(results["tmpfs"]["system_calls"]),
+    }
+    return "\n\n".join(f"## {head}\n\n{rows}" for head, rows in tables.items() if rows)
+
+
+def time_table(results):
+    rows = [
+        row
+        for place, suffix in (("tmpfs", ""), ("disk", " on disk"))
+        if place in results
+        for race in results[place]["races"]
+        if len(race["contestants"]) > 1
+        for row in race_rows(race, suffix)
+    ]
+    return table(("package", "run", "bits", "ms", *COLUMNS, "peak, MiB"), rows)
+
+
+def race_rows(race, suffix):
+    """A line for each build of the installer in the race, and one for its goals."""
+    contestants, package = race["contestants"], race["package"]
+    for program, aside in OURS.items():
+        job = race["job"] + aside + suffix
+        goals = GOALS.get((job, package), {})
+        widths = [bits for bits in (64, 32) if f"{program} {bits}" in contestants]
+        for bits in widths:
+            ours = contestants[f"{program} {bits}"]
+            yield [
+                package,
+                job,
+                bits,
+                f"{median(ours, 'wall'):.1f}",
+                *(
+                    cell(ours, opponent(contestants, column, bits), column, goals, bits)
+                    for column in COLUMNS
+                ),
+                peak_cell(ours, package, job),
+            ]
+        if widths and goals:
+            peak = f"<= {PEAK_GOALS[package]}" if judged_peak(package, job) else ""
+            yield [
+                package,
+                job,
+                "goal",
+                "",
+                *(goal_cell(goals.get(name)) for name in COLUMNS),
+                peak,
+            ]
+
+
+def opponent(contestants, column, bits):
+    """The contestant of a column, of the same width if it comes in both; None if it has not run."""
+    for name in (column, f"{column} {bits}", f"{column} in pieces {bits}"):
+        if name in contestants:
+            return contestants[name]
+    return None
+
+
+def cell(ours, theirs, column, goals, bits):
+    if theirs is None:
+        return ""
+    ratios = {
+        measure: median(ours, measure) / median(theirs, measure) for measure in ("wall", "cpu")
+    }
+    goal = goals[column][0 if bits == 64 else 1] if column in goals else None
+
+    def text(measure):
+        judged = goal is not None and (measure == "wall" or column not in WALL_ONLY)
+        return mark(f"{ratios[measure]:.2f}", judged and round(ratios[measure], 2) > goal)
+
+    return f"{text('wall')} / {text('cpu')}"
+
+
+def goal_cell(goal):
+    if goal is None:
+        return ""
+    return f"<= {goal[0]:.2f}" + (f" ({goal[1]:.2f})" if goal[0] != goal[1] else "")
+
+
+def judged_peak(package, job):
+    return job == "install" and package in PEAK_GOALS
+
+
+def peak_cell(ours, package, job):
+    mebibytes = median(ours, "memory") / 1024
+    return mark(f"{mebibytes:.1f}", judged_peak(package, job) and mebibytes > PEAK_GOALS[package])
+
+
+def mark(text, missed):
+    return f"**{text}**" if missed else text
+
+
+def median(contestant, measure):
+    return contestant[measure]["median"]
+
+
+def growth_table(results):
+    """The time of a file, or a megabyte, above the fixed cost of a run."""
+    found = {
+        (race["job"], race["package"]): race["contestants"]["wzorinst 64"]
+        for race in results["tmpfs"]["races"]
+        if "wzorinst 64" in race["contestants"]
+    }
+    fixed = found.get(("fixed cost", "tiny"))
+    rows = []
+    for job, packages, goal in (
+        ("install", FILE_GROWTH, FILE_GROWTH_GOAL),
+        ("upgrade", FILE_GROWTH, FILE_GROWTH_GOAL),
+        ("removal", FILE_GROWTH, FILE_GROWTH_GOAL),
+        ("install", MEGABYTE_GROWTH, MEGABYTE_GROWTH_GOAL),
+    ):
+        if fixed is None or any((job, package) not in found for package in packages):
+            continue
+        first = None
+        for package in packages:
+            facts = results["packages"][package]
+            by_size = packages is MEGABYTE_GROWTH
+            count = facts["size"] / 1e6 if by_size else facts["files"]
+            each = [
+                (median(found[job, package], measure) - median(fixed, measure)) / count * 1000
+                for measure in ("wall", "cpu")
+            ]
+            first = first or each
+            growth = [
+                mark(f"{now / then:.2f}", now / then > goal) for now, then in zip(each, first)
+            ]
+            rows.append(
+                [
+                    package,
+                    job,
+                    f"{count:.0f} {'MB' if by_size else 'files'}",
+                    *(f"{value:.1f}" for value in each),
+                    " / ".join(growth),
+                    f"<= {goal}",
+                ]
+            )
+    return table(
+        ("package", "run", "of", "wall each, us", "CPU each, us", "times the first", "goal"), rows
+    )
+
+
+def call_table(packages):
+    rows = []
+    for package in packages:
+        ours, floor = package["ours"], package["floor"]
+        names = sorted(set(ours) | set(floor), key=lambda name, ours=ours: -ours.get(name, 0))
+        rows += [
+            (package["package"], name, ours.get(name, 0), floor.get(name, 0))
+            for name in names
+            if max(ours.get(name, 0), floor.get(name, 0)) >= MINOR_CALLS
+        ]
+    return table(("package", "system call", "wzorinst", "libdeflate floor"), rows)
+
+
+def table(head, rows):
+    """A Markdown table with aligned columns; columns without a text are left out."""
+    if not rows:
+        return ""
+    texts = [[str(text) for text in row] for row in rows]
+    used = [column for column in range(len(head)) if any(row[column] for row in texts)]
+    lines = [[row[column] for column in used] for row in [list(head), *texts]]
+    widths = [max(len(line[column]) for line in lines) for column in range(len(used))]
+    out = [
+        "| " + " | ".join(text.ljust(width) for text, width in zip(line, widths)) + " |"
+        for line in lines
+    ]
+    out.insert(1, "|" + "|".join("-" * (width + 2) for width in widths) + "|")
+    return "\n".join(out)
