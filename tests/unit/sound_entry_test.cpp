@@ -63,12 +63,11 @@ std::string fixedBlock(std::uint32_t length)
     return bits.data();
 }
 
-/// A block of a code of its own: "a" 84 times. It lists `literals` code lengths of literals
+/// Appends a block of a code of its own: "a" 84 times. It lists `literals` code lengths of literals
 /// and lengths, where deflate allows 286, and `distances` of distances, where it allows 30.
-std::string dynamicBlock(std::uint32_t literals, std::uint32_t distances)
+void appendBlock(BitWriter& bits, bool last, std::uint32_t literals, std::uint32_t distances)
 {
-    BitWriter bits;
-    bits.number(1, 1); // the last block
+    bits.number(last ? 1 : 0, 1);
     bits.number(2, 2); // of its own code
     bits.number(literals - 257, 5);
     bits.number(distances - 1, 5);
@@ -94,6 +93,15 @@ std::string dynamicBlock(std::uint32_t literals, std::uint32_t distances)
     for (int i = 0; i < 84; ++i)
         bits.code(0, 1);
     bits.code(1, 1);
+}
+
+/// The block of appendBlock(), after `others` that are as deflate allows.
+std::string dynamicBlock(std::uint32_t literals, std::uint32_t distances, int others = 0)
+{
+    BitWriter bits;
+    for (int i = 0; i < others; ++i)
+        appendBlock(bits, false, 286, 30);
+    appendBlock(bits, true, literals, distances);
     return bits.data();
 }
 
@@ -240,6 +248,28 @@ TEST_F(SoundEntryTest, AnEntryThatOnlyTheStreamsZlibRefusesArrivesAsItWasPacked)
         EXPECT_EQ(content, readFile(destination));
         ASSERT_EQ(0, unlink(destination.c_str()));
     }
+}
+
+TEST_F(SoundEntryTest, AnEntryOfTinyBlocksArrivesWhole)
+{
+    const std::string data = dynamicBlock(286, 30, 999);
+    const std::string content(84000, 'a');
+
+    EXPECT_EQ(0, copy(data, confirmedEntry(data, content)));
+
+    EXPECT_TRUE(content == readFile(destination));
+}
+
+TEST_F(SoundEntryTest, AnEntryThatBeginsWithTinyBlocksIsLeftToZlib)
+{
+    // Only zlib refuses the last block, so the answer shows who was asked.
+    const std::string few = dynamicBlock(287, 1, 99);
+    const std::string many = dynamicBlock(287, 1, 999);
+    ASSERT_LT(few.size(), 16384U);
+    ASSERT_GT(many.size(), 16384U);
+
+    EXPECT_EQ(0, copy(few, confirmedEntry(few, std::string(8400, 'a'))));
+    EXPECT_EQ(EntryNotSound, copy(many, confirmedEntry(many, std::string(84000, 'a'))));
 }
 
 TEST_F(SoundEntryTest, TheHandmadeBlocksAreSoundWithinTheirLimits)

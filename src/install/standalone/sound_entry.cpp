@@ -49,6 +49,42 @@ bool isWorthInflatingWhole(const ZipEntry& entry)
     return entry.uncompressedSize <= MaxWholeSize && entry.compressedSize < entry.uncompressedSize;
 }
 
+/// Entries with less data are not probed: the probe would cost more than it can save.
+constexpr std::uint32_t MinProbedSize = std::uint32_t{16} * 1024;
+constexpr std::size_t ProbeSize = 256;
+constexpr std::size_t ProbeContentSize = std::size_t{16} * 1024;
+constexpr std::size_t TinyBlock = 64;
+constexpr std::size_t FewBlocks = 4;
+
+/// Whether the first bytes of deflated data are blocks of fewer than TinyBlock bytes each.
+///
+/// No compressor writes an entry of such blocks. They would take libdeflate a third longer than
+/// zlib, because it builds larger tables for each. Data that becomes like that later on is not
+/// recognised, and costs that third.
+bool beginsWithTinyBlocks(unsigned char* packed)
+{
+    static unsigned char content[ProbeContentSize];
+    z_stream stream = {};
+    if (inflateInit2(&stream, -15) != Z_OK)
+        return false;
+    stream.next_in = packed;
+    stream.avail_in = ProbeSize;
+    stream.next_out = content;
+    stream.avail_out = ProbeContentSize;
+
+    constexpr int AtBlockEnd = 128; // of data_type, see inflate()
+    std::size_t blocks = 0;
+    std::size_t used = 0;
+    while (inflate(&stream, Z_BLOCK) == Z_OK && stream.avail_out != 0) {
+        if ((stream.data_type & AtBlockEnd) != 0) {
+            ++blocks;
+            used = ProbeSize - stream.avail_in;
+        }
+    }
+    (void)inflateEnd(&stream);
+    return blocks >= FewBlocks && used < blocks * TinyBlock;
+}
+
 /// The content of `entry`, inflated in one call and confirmed by its size and its CRC-32; null when
 /// anything about it is unexpected. Valid until the next call.
 ///
@@ -72,6 +108,8 @@ const unsigned char* inflateWhole(int archive, const ZipEntry& entry)
 
     const ssize_t read = pread(archive, packed, entry.compressedSize, dataStart(entry));
     if (read != static_cast<ssize_t>(entry.compressedSize))
+        return nullptr;
+    if (entry.compressedSize >= MinProbedSize && beginsWithTinyBlocks(packed))
         return nullptr;
     std::size_t used = 0; // the deflate stream may end before the entry's data
     std::size_t size = 0;
