@@ -42,11 +42,10 @@ protected:
     TempDir dir;
     std::string path = dir / "package";
     std::string content = noiseBytes(FileSize, 1);
-    ScopedFd file = [this] {
+    PackageWindow window = [this] {
         writeFile(path, content);
-        return ScopedFd(open(path.c_str(), O_RDONLY));
+        return PackageWindow(ScopedFd(open(path.c_str(), O_RDONLY)));
     }();
-    PackageWindow window{file.get()};
 };
 
 TEST_F(PackageWindowTest, AnyBytesAreThoseOfTheFile)
@@ -86,16 +85,16 @@ TEST_F(PackageWindowTest, NoBytesAreThereAnywhere)
 
 TEST_F(PackageWindowTest, TheFileOffsetStaysAsItIs)
 {
-    ASSERT_EQ(7, lseek(file.get(), 7, SEEK_SET));
+    ASSERT_EQ(7, lseek(window.fd(), 7, SEEK_SET));
 
     EXPECT_EQ(expected(100, 5000), bytes(100, 5000));
 
-    EXPECT_EQ(7, lseek(file.get(), 0, SEEK_CUR));
+    EXPECT_EQ(7, lseek(window.fd(), 0, SEEK_CUR));
 }
 
 TEST_F(PackageWindowTest, AFileThatCannotBeReadHasNoBytes)
 {
-    PackageWindow closed(-1);
+    PackageWindow closed(ScopedFd(-1));
 
     EXPECT_EQ(nullptr, closed.bytes(0, 1));
 }
@@ -134,6 +133,17 @@ TEST_F(PackageWindowTest, AStepBackIsAJump)
 
     (void)bytes(499000, 30);
     EXPECT_EQ(4096U, heldFrom(499000));
+}
+
+TEST_F(PackageWindowTest, WhatIsForgottenIsReadAgain)
+{
+    EXPECT_EQ(expected(100, 10), bytes(100, 10));
+    writeFile(path, std::string(200, 'x'));
+
+    window.forget();
+
+    EXPECT_EQ("xxxxxxxxxx", bytes(100, 10));
+    EXPECT_EQ("(none)", bytes(200, 1));
 }
 
 TEST_F(PackageWindowTest, ALargeReadIsOfItsSize)

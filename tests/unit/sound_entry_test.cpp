@@ -1,3 +1,4 @@
+#include "package_window.h"
 #include "sample_bytes.h"
 #include "scoped.h"
 #include "sound_entry.h"
@@ -135,8 +136,8 @@ protected:
     int copyTo(int file, const std::string& archive, const ZipEntry& entry) const
     {
         writeFile(source, archive);
-        const ScopedFd data(open(source.c_str(), O_RDONLY));
-        return copySoundEntry(data.get(), entry, file);
+        PackageWindow package(ScopedFd(open(source.c_str(), O_RDONLY)));
+        return copySoundEntry(package, entry, file);
     }
 
     TempDir dir;
@@ -357,19 +358,27 @@ TEST_F(SoundEntryTest, AnOffsetThatCannotBeReachedIsTheStartOfTheArchive)
     }
 }
 
-TEST_F(SoundEntryTest, AnEntryIsReadFromItsPlaceWhereverTheArchiveStands)
+TEST_F(SoundEntryTest, EntriesAreReadFromTheirPlacesInAnyOrder)
 {
-    writeFile(source, "before and the entry behind");
-    const ScopedFd archive(open(source.c_str(), O_RDONLY));
-    ASSERT_EQ(3, lseek(archive.get(), 3, SEEK_SET));
-    ZipEntry entry = entryOf(0, 9, 9);
-    entry.dataOffset = 11;
-    const ScopedFd file(open(destination.c_str(), O_WRONLY | O_CREAT, 0600));
+    const std::string content = textBytes(1000, 12);
+    const std::string data = rawDeflate(content);
+    writeFile(source, "before" + data + "between" + data);
+    PackageWindow package(ScopedFd(open(source.c_str(), O_RDONLY)));
+    ZipEntry first = confirmedEntry(data, content);
+    first.dataOffset = 6;
+    ZipEntry second = first;
+    second.dataOffset = static_cast<std::uint32_t>(6 + data.size() + 7);
+    ZipEntry stored = entryOf(0, 7, 7);
+    stored.dataOffset = static_cast<std::uint32_t>(6 + data.size());
 
-    EXPECT_EQ(0, copySoundEntry(archive.get(), entry, file.get()));
+    for (const ZipEntry& entry : {second, first, stored, second}) {
+        const ScopedFd file(open(destination.c_str(), O_WRONLY | O_CREAT, 0600));
 
-    EXPECT_EQ("the entry", readFile(destination));
-    EXPECT_EQ(3, lseek(archive.get(), 0, SEEK_CUR));
+        EXPECT_EQ(0, copySoundEntry(package, entry, file.get()));
+
+        EXPECT_EQ(entry.method == 0 ? "between" : content, readFile(destination));
+        ASSERT_EQ(0, unlink(destination.c_str()));
+    }
 }
 
 TEST_F(SoundEntryTest, AFullDiskIsReportedForADeflatedEntry)

@@ -15,8 +15,8 @@
 
 namespace {
 
-constexpr mode_t NewFileMode = 0666;     // what a file gets that no mode is set for
-constexpr mode_t UnfinishedMode = 0600;  // nobody else can open the file while it is being written
+constexpr mode_t NewFileMode = 0666;    // what a file gets that no mode is set for
+constexpr mode_t UnfinishedMode = 0600; // nobody else can open the file while it is being written
 constexpr int ExtractBlockSize = 8192;
 
 /// True when the last file of the journal took the place of another.
@@ -46,6 +46,8 @@ int openDestination(FileTransaction& transaction, OpenPackage& package,
     const Existing existing = transaction.backup ? Existing::Refuse : Existing::Truncate;
     const int error = openForWriting(destination, existing, UnfinishedMode, file);
     package.fileWasReplaced();
+    if (existing == Existing::Truncate)
+        package.fileWasTruncated();
     return error == 0 ? FileOk : CannotOpenForWriting;
 }
 
@@ -65,7 +67,7 @@ int writeContent(InputStream& stream, int destination)
 }
 
 /// Writes `entry`, which is in the open package `source`, to the new file `destination`.
-int writeEntry(const ZipEntry& entry, int source, int destination)
+int writeEntry(const ZipEntry& entry, PackageWindow& source, int destination)
 {
     const int copied = copySoundEntry(source, entry, destination);
     if (copied != EntryNotSound)
@@ -76,7 +78,7 @@ int writeEntry(const ZipEntry& entry, int source, int destination)
     if (lseek(destination, 0, SEEK_SET) != 0 || (ftruncate(destination, 0) != 0 && errno != EINVAL))
         return writeErrorCode(errno);
     // From the package as it was opened: this very file may have taken its place.
-    ScopedFd own(fcntl(source, F_DUPFD_CLOEXEC, 0));
+    ScopedFd own(fcntl(source.fd(), F_DUPFD_CLOEXEC, 0));
     if (!own.isOpen())
         return CannotOpenForReading;
     return writeContent(*streamOver(std::move(own), entry), destination);
@@ -84,14 +86,14 @@ int writeEntry(const ZipEntry& entry, int source, int destination)
 
 } // namespace
 
-std::shared_ptr<const ScopedFd> OpenPackage::open(const ZipEntry* entry)
+std::shared_ptr<PackageWindow> OpenPackage::open(const ZipEntry* entry)
 {
     if (!hasStream(entry))
         return nullptr;
     if (!file_) {
         ScopedFd file = archive_.openArchive();
         if (file.isOpen())
-            file_ = std::make_shared<const ScopedFd>(std::move(file));
+            file_ = std::make_shared<PackageWindow>(std::move(file));
     }
     return file_;
 }
@@ -100,9 +102,15 @@ void OpenPackage::fileWasReplaced()
 {
     struct stat held = {};
     struct stat named = {};
-    if (!file_ || fstat(file_->get(), &held) != 0 || stat(archive_.path().c_str(), &named) != 0 ||
+    if (!file_ || fstat(file_->fd(), &held) != 0 || stat(archive_.path().c_str(), &named) != 0 ||
         held.st_ino != named.st_ino || held.st_dev != named.st_dev)
         file_.reset();
+}
+
+void OpenPackage::fileWasTruncated()
+{
+    if (file_)
+        file_->forget();
 }
 
 int extractOpenFile(FileTransaction& transaction, OpenPackage& package, const ZipEntry* entry,
@@ -118,7 +126,7 @@ int extractOpenFile(FileTransaction& transaction, OpenPackage& package, const Zi
         return opened;
     record(transaction, Created, destination); // before its first byte: a rollback finds it
 
-    const int code = writeEntry(*entry, source->get(), file.fd.get());
+    const int code = writeEntry(*entry, *source, file.fd.get());
     if (code == FileOk && mode != 0)
         (void)fchmod(file.fd.get(), mode); // the content is what counts
     else if (file.created)

@@ -2,7 +2,7 @@
 #pragma once
 
 #include "file_codes.h"
-#include "scoped.h"
+#include "package_window.h"
 #include "transaction.h"
 
 #include <memory>
@@ -22,17 +22,20 @@ public:
 
     [[nodiscard]] const ZipFile& archive() const { return archive_; }
 
-    /// The package, to read `entry` from dataStart() on without moving the descriptor, which all
+    /// The package, to read `entry` from dataStart() on, without moving the file offset that all
     /// callers share; null where ZipFile::getInputStream() returns null.
-    [[nodiscard]] std::shared_ptr<const ScopedFd> open(const ZipEntry* entry);
+    [[nodiscard]] std::shared_ptr<PackageWindow> open(const ZipEntry* entry);
 
     /// To be called when a file was replaced, which may be the package: lets the next open() use
     /// what is at the package's path then.
     void fileWasReplaced();
 
+    /// To be called when a file was truncated, which may be the package.
+    void fileWasTruncated();
+
 private:
     const ZipFile& archive_;
-    std::shared_ptr<const ScopedFd> file_;
+    std::shared_ptr<PackageWindow> file_;
 };
 
 /// Writes `entry` of `package` to `destination`, whose old content is backed up, and gives it

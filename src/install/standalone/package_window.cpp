@@ -47,7 +47,7 @@ bool PackageWindow::moveTo(std::int64_t at, std::size_t size)
         return false;
 
     while (held_ < size) {
-        const ssize_t count = pread(fd_, buffer_.get() + held_, wanted - held_,
+        const ssize_t count = pread(file_.get(), buffer_.get() + held_, wanted - held_,
                                     start_ + static_cast<std::int64_t>(held_));
         if (count <= 0)
             return false;

@@ -2,6 +2,7 @@
 
 #include "file_codes.h"
 #include "file_writing.h"
+#include "package_window.h"
 #include "zip_file.h"
 
 #include <algorithm>
@@ -61,13 +62,13 @@ constexpr std::size_t FewBlocks = 4;
 /// No compressor writes an entry of such blocks. They would take libdeflate a third longer than
 /// zlib, because it builds larger tables for each. Data that becomes like that later on is not
 /// recognised, and costs that third.
-bool beginsWithTinyBlocks(unsigned char* packed)
+bool beginsWithTinyBlocks(const unsigned char* packed)
 {
     static unsigned char content[ProbeContentSize];
     z_stream stream = {};
     if (inflateInit2(&stream, -15) != Z_OK)
         return false;
-    stream.next_in = packed;
+    stream.next_in = const_cast<unsigned char*>(packed); // only read
     stream.avail_in = ProbeSize;
     stream.next_out = content;
     stream.avail_out = ProbeContentSize;
@@ -95,20 +96,16 @@ bool beginsWithTinyBlocks(unsigned char* packed)
 /// deliver a shorter entry then. No compressor writes such data, and finding it would take a second
 /// decoder. Where the content has the recorded size and CRC-32 all the same, it is what was packed,
 /// and nobody is served by less: such an entry counts as sound.
-const unsigned char* inflateWhole(int archive, const ZipEntry& entry)
+const unsigned char* inflateWhole(PackageWindow& package, const ZipEntry& entry)
 {
     static const std::unique_ptr<libdeflate_decompressor, void (*)(libdeflate_decompressor*)>
         decompressor(libdeflate_alloc_decompressor(), libdeflate_free_decompressor);
-    static Buffer packedBuffer;
-    static Buffer contentBuffer;
-    unsigned char* const packed = packedBuffer.ofSize(entry.compressedSize);
-    unsigned char* const content = contentBuffer.ofSize(entry.uncompressedSize);
-    if (!decompressor || packed == nullptr || content == nullptr)
+    static Buffer buffer;
+    unsigned char* const content = buffer.ofSize(entry.uncompressedSize);
+    const unsigned char* const packed = package.bytes(dataStart(entry), entry.compressedSize);
+    if (!decompressor || content == nullptr || packed == nullptr)
         return nullptr;
 
-    const ssize_t read = pread(archive, packed, entry.compressedSize, dataStart(entry));
-    if (read != static_cast<ssize_t>(entry.compressedSize))
-        return nullptr;
     if (entry.compressedSize >= MinProbedSize && beginsWithTinyBlocks(packed))
         return nullptr;
     std::size_t used = 0; // the deflate stream may end before the entry's data
@@ -172,10 +169,10 @@ private:
     z_stream inflate_ = {};
 };
 
-int copyInPieces(int archive, const ZipEntry& entry, int destination)
+int copyInPieces(const PackageWindow& package, const ZipEntry& entry, int destination)
 {
     static unsigned char piece[PieceSize];
-    PieceReader reader(archive, entry);
+    PieceReader reader(package.fd(), entry);
     std::uint32_t room = entry.uncompressedSize;
     do {
         const std::size_t count = reader.next(piece);
@@ -189,25 +186,25 @@ int copyInPieces(int archive, const ZipEntry& entry, int destination)
     return FileOk;
 }
 
-int copyDeflated(int archive, const ZipEntry& entry, int destination)
+int copyDeflated(PackageWindow& package, const ZipEntry& entry, int destination)
 {
     if (isWorthInflatingWhole(entry)) {
-        const unsigned char* const content = inflateWhole(archive, entry);
+        const unsigned char* const content = inflateWhole(package, entry);
         if (content != nullptr)
             return writeAll(destination, content, entry.uncompressedSize);
     }
-    return copyInPieces(archive, entry, destination);
+    return copyInPieces(package, entry, destination);
 }
 
 /// The system copies by itself. Where it can't, or fails, the stream does it or tells what failed.
-int copyStored(int archive, const ZipEntry& entry, int destination)
+int copyStored(const PackageWindow& package, const ZipEntry& entry, int destination)
 {
     if (entry.uncompressedSize > std::numeric_limits<std::int32_t>::max())
         return EntryNotSound;
     off_t at = dataStart(entry);
     std::size_t left = entry.uncompressedSize;
     while (left != 0) {
-        const ssize_t count = sendfile(destination, archive, &at, left);
+        const ssize_t count = sendfile(destination, package.fd(), &at, left);
         if (count < 0)
             return EntryNotSound;
         if (count == 0) // a short archive reads as a shorter entry
@@ -219,8 +216,8 @@ int copyStored(int archive, const ZipEntry& entry, int destination)
 
 } // namespace
 
-int copySoundEntry(int archive, const ZipEntry& entry, int destination)
+int copySoundEntry(PackageWindow& package, const ZipEntry& entry, int destination)
 {
-    return entry.method == 0 ? copyStored(archive, entry, destination)
-                             : copyDeflated(archive, entry, destination);
+    return entry.method == 0 ? copyStored(package, entry, destination)
+                             : copyDeflated(package, entry, destination);
 }

@@ -6,17 +6,17 @@
 // sign of damage this gives up, and the caller starts again with the stream.
 #pragma once
 
+class PackageWindow;
 struct ZipEntry;
 
 /// What copySoundEntry() returns besides the codes of file_codes.h.
 inline constexpr int EntryNotSound = -1;
 
-/// Writes the content of `entry` of `archive` to the empty file `destination`. The file offset of
-/// `archive` is neither used nor changed.
+/// Writes the content of `entry` of `package` to the empty file `destination`.
 ///
 /// Returns 0; the code of a failed write (5, 6, 7); or EntryNotSound (-1): `destination` may then
 /// hold anything, and the entry's stream decides what belongs there.
 ///
-/// Keeps its buffers for the next entry: at most twice 16 MiB, and no more than the largest entry
-/// so far needed.
-[[nodiscard]] int copySoundEntry(int archive, const ZipEntry& entry, int destination);
+/// Keeps its buffer for the next entry: at most 16 MiB, and no more than the largest entry so far
+/// needed. The window of `package` holds the data of an entry, which is smaller.
+[[nodiscard]] int copySoundEntry(PackageWindow& package, const ZipEntry& entry, int destination);

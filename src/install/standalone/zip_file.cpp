@@ -58,7 +58,7 @@ ScopedFd openForReading(const char* path)
 /// Reads an archive's headers one after the other.
 class HeaderReader {
 public:
-    explicit HeaderReader(int fd) : window_(fd) {}
+    explicit HeaderReader(ScopedFd file) : window_(std::move(file)) {}
 
     [[nodiscard]] std::int64_t position() const { return position_; }
 
@@ -376,11 +376,11 @@ int ZipFile::readDirectory(const char* path, std::vector<ZipEntry>& entries)
     entries.clear();
     if (path == nullptr)
         return ZipCannotOpen;
-    const ScopedFd file = openForReading(path);
+    ScopedFd file = openForReading(path);
     if (!file.isOpen())
         return ZipCannotOpen;
 
-    HeaderReader reader(file.get());
+    HeaderReader reader(std::move(file));
     if (readCentralDirectory(reader, entries) && !entries.empty())
         return ZipOk;
 
