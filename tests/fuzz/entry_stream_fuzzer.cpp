@@ -2,8 +2,8 @@
 // compared with what zlib makes of the same bytes at once. Extracted, it must be what its stream
 // delivers, although the extraction takes a fast path where it can.
 //
-// Head: 1 byte (bit 0: deflated; bits 1 to 3: how it is read), 1 byte offset of the data, 4 bytes
-// compressed size, 4 bytes uncompressed size, little-endian.
+// Head: 1 byte (bit 0: deflated; bits 1 to 3: how it is read; bit 4: the CRC-32 is right), 1 byte
+// offset of the data, 4 bytes compressed size, 4 bytes uncompressed size, little-endian.
 #include "assertion_trap.h"
 #include "entry_extraction.h"
 #include "fuzz_support.h"
@@ -190,8 +190,13 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
     const Expected expected = inflateAtOnce(rest.substr(0, entry.compressedSize));
     if (expected.bytes.size() > MaxContent)
         return 0;
-    // Up to three inflate at a time, each with a window and a state of 40 KiB.
-    const ResourceBound bound(160 * KiB + 6 * expected.bytes.size(), 2000);
+    if ((data[0] & 0x10) != 0)
+        entry.crc32 = static_cast<std::uint32_t>(crc32_z(
+            0, reinterpret_cast<const Bytef*>(expected.bytes.data()), expected.bytes.size()));
+    // Up to three inflate at a time, each with a window and a state of 40 KiB. The fast path has a
+    // buffer for the content and a window on the data, of 256 KiB or the size of the data.
+    const std::size_t whole = 1033 * std::min<std::size_t>(entry.compressedSize, rest.size());
+    const ResourceBound bound(416 * KiB + 6 * expected.bytes.size() + whole, 2000);
     if (blockSize == 0)
         checkDeflatedBytes(*stream, entry.uncompressedSize, expected);
     else

@@ -94,7 +94,7 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
 
     // A name of 2048 bytes can stand for a thousand directories, each of which the journal names
     // with its whole path.
-    const ResourceBound bound(512 * KiB + KiB * size, 2000);
+    const ResourceBound bound(1024 * KiB + KiB * size, 2000);
     extractAndRollBack(file.path(), directory, size % 2 == 0);
     return 0;
 }

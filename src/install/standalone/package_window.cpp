@@ -5,6 +5,7 @@
 #include <new>
 #include <utility>
 
+#include <sys/stat.h>
 #include <unistd.h>
 
 namespace {
@@ -14,6 +15,13 @@ constexpr std::size_t LargestReadAhead = std::size_t{256} * 1024;
 
 /// A gap that costs less to read than another system call. Between two entries lies a header.
 constexpr std::int64_t SmallGap = 4096;
+
+/// Whether the file goes on to `end`.
+bool reaches(int fd, std::int64_t end)
+{
+    struct stat status = {};
+    return fstat(fd, &status) == 0 && status.st_size >= end;
+}
 
 } // namespace
 
@@ -33,6 +41,10 @@ bool PackageWindow::holds(std::int64_t at, std::size_t size) const
 /// Makes the window begin at `at`, with what it holds from there on, and reads the rest.
 bool PackageWindow::moveTo(std::int64_t at, std::size_t size)
 {
+    // A header may claim any size: memory is for data that is there.
+    if (size > LargestReadAhead && !reaches(file_.get(), at + static_cast<std::int64_t>(size)))
+        return false;
+
     const std::int64_t end = start_ + static_cast<std::int64_t>(held_);
     const bool goesOn = held_ != 0 && at >= start_ && at <= end + SmallGap;
     readAhead_ = goesOn ? std::min(2 * readAhead_, LargestReadAhead) : SmallestRead;

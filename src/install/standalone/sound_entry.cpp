@@ -43,11 +43,17 @@ private:
     std::size_t size_ = 0;
 };
 
+/// A match of 258 bytes takes at least two bits.
+constexpr std::uint32_t MostContentOfAByte = 1032;
+
 /// Whether to inflate `entry` whole. Data that is as long as its content is mostly stored blocks,
-/// which zlib copies just as fast, or tiny blocks, whose tables zlib builds faster.
+/// which zlib copies just as fast, or tiny blocks, whose tables zlib builds faster. And no memory
+/// is spent on a size that the data cannot have.
 bool isWorthInflatingWhole(const ZipEntry& entry)
 {
-    return entry.uncompressedSize <= MaxWholeSize && entry.compressedSize < entry.uncompressedSize;
+    return entry.uncompressedSize <= MaxWholeSize &&
+           entry.compressedSize < entry.uncompressedSize &&
+           entry.uncompressedSize / MostContentOfAByte <= entry.compressedSize;
 }
 
 /// Entries with less data are not probed: the probe would cost more than it can save.
@@ -101,12 +107,14 @@ const unsigned char* inflateWhole(PackageWindow& package, const ZipEntry& entry)
     static const std::unique_ptr<libdeflate_decompressor, void (*)(libdeflate_decompressor*)>
         decompressor(libdeflate_alloc_decompressor(), libdeflate_free_decompressor);
     static Buffer buffer;
-    unsigned char* const content = buffer.ofSize(entry.uncompressedSize);
     const unsigned char* const packed = package.bytes(dataStart(entry), entry.compressedSize);
-    if (!decompressor || content == nullptr || packed == nullptr)
+    if (!decompressor || packed == nullptr)
         return nullptr;
 
     if (entry.compressedSize >= MinProbedSize && beginsWithTinyBlocks(packed))
+        return nullptr;
+    unsigned char* const content = buffer.ofSize(entry.uncompressedSize);
+    if (content == nullptr)
         return nullptr;
     std::size_t used = 0; // the deflate stream may end before the entry's data
     std::size_t size = 0;
