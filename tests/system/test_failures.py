@@ -5,7 +5,20 @@ import pytest
 from harness import failure_points, sweep
 from harness.checks import same_tree
 from harness.machine import SPB
-from harness.scenarios import COMMAND_LOG, HOME, REGISTRY, SCENARIOS, SETTINGS, restore, tree_of
+from harness.scenarios import (
+    COMMAND_LOG,
+    COMMON_SETTING,
+    HOME,
+    INDEX,
+    INSTALL_TYPE,
+    REGISTRY,
+    SCENARIOS,
+    SCRIPTS,
+    SETTINGS,
+    TRACE_SETTINGS,
+    restore,
+    tree_of,
+)
 
 
 @pytest.fixture(scope="module")
@@ -90,3 +103,48 @@ def test_a_removal_killed_after_the_settings_went_is_finished_once_its_registry_
 
     left = [path for path in tree_of(bench.spare) if path not in bench.normal]
     assert left == []
+
+
+# New content that was not renamed when its run was killed.
+
+NEW_CONTENTS = [path + ".wzorinst-new" for path in (
+    REGISTRY, COMMON_SETTING, INDEX, SETTINGS, TRACE_SETTINGS, *SCRIPTS, INSTALL_TYPE)]
+
+
+def test_the_last_removal_deletes_what_killed_runs_had_not_renamed(machine):
+    assert machine.run("i", "SHOP", "-s", SPB).status == 0
+    assert machine.run("r", "SHOP").status == 0
+    removed = tree_of(machine)
+    assert machine.run("i", "SHOP", "-s", SPB).status == 0
+    for path in NEW_CONTENTS:
+        machine.plant(path, "cut sho", 0o600)
+
+    assert machine.run("r", "SHOP").status == 0
+
+    same_tree(tree_of(machine), removed)
+
+
+def test_the_next_run_replaces_what_a_killed_one_had_not_renamed(laboratory):
+    bench = sweep.Bench(laboratory, SCENARIOS["upgrade"])
+    restore(bench.spare, bench.before)
+    for path in (REGISTRY, INDEX, SETTINGS, TRACE_SETTINGS, *SCRIPTS):
+        bench.spare.plant(path + ".wzorinst-new", "cut sho", 0o600)
+
+    outcome = bench.scenario.run(bench.spare)
+
+    assert outcome.status == 0
+    same_tree(tree_of(bench.spare), bench.normal)
+
+
+@pytest.mark.parametrize("path", [REGISTRY, SETTINGS])
+def test_an_old_file_is_complete_until_the_new_one_replaces_it(laboratory, path):
+    bench = sweep.Bench(laboratory, SCENARIOS["upgrade"])
+    points = [point for point in bench.points if point.kind == "rename" and point.target == path]
+    restore(bench.spare, bench.before)
+
+    failure_points.run_killed(bench.scenario, bench.spare, points[-1])
+
+    between = tree_of(bench.spare)
+    assert between[path] == bench.before[path]
+    assert between[path + ".wzorinst-new"].content == bench.normal[path].content
+    assert between[path + ".wzorinst-new"].owner == bench.before[path].owner
