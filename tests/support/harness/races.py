@@ -38,6 +38,10 @@ NOT_LOOKED_AT = (GUESTS, "/tmp/moved", "/etc/zor", "/etc/kel")
 ROUNDS_PER_WIN = 7
 
 
+# Half a millisecond, so that the attacker finds time between two calls of the installer.
+DELAY = "strace -qq -o /dev/null -e trace={0} -e inject={0}:delay_enter=500"
+
+
 @dataclass(frozen=True)
 class Race:
     """One race.
@@ -54,6 +58,16 @@ class Race:
     command: tuple  # the installer's
     stolen: str = ""  # the file that must not hold what the attacker writes
     attackers: int = 1
+    delayed: str = ""  # a system call before which strace makes the installer wait
+
+    @property
+    def program(self):
+        """The installer's command line on the machine."""
+        return [
+            *(DELAY.format(self.delayed).split() if self.delayed else ()),
+            BINARY,
+            *self.command,
+        ]
 
     @property
     def rounds(self):
@@ -205,10 +219,11 @@ RACES = (
     Race(
         "swap-always",
         "the same, swapped from the start",
-        0.16,
+        0.20,  # of 10 rounds against a removal that enters directories through links
         upgrade_with_cache,
         ("exchange", CACHE + "/dir", GUESTS + "/link"),
         UPGRADE,
+        delayed="openat",
     ),
     Race(
         "move",
@@ -364,7 +379,7 @@ class Course:
             for _ in range(self.race.attackers):
                 attackers.enter_context(attack([self.attacker, mode, *paths]))
             try:
-                machine.execute([BINARY, *self.race.command], ROOT, 0o022, None, (), False)
+                machine.execute(self.race.program, ROOT, 0o022, None, (), False)
             except AssertionError as failure:
                 if HANGS not in str(failure):
                     raise
