@@ -14,7 +14,9 @@ DOCUMENTS = sorted([*REPOSITORY.glob("*.md"), *REPOSITORY.glob("docs/*.md")])
 IDS = [str(path.relative_to(REPOSITORY)) for path in DOCUMENTS]
 
 # Directories whose files the documents name as commands.
-COMMAND_PATH = re.compile(r"(?<![\w/.])(?:\./)?((?:scripts|tests|tools|bench|examples)/[\w./*-]*\w)")
+COMMAND_PATH = re.compile(
+    r"(?<![\w/.])(?:\./)?((?:scripts|tests|tools|bench|examples)/[\w./*-]*\w)"
+)
 PRESET = re.compile(r"--preset (\S+?)[\s`;&]")
 LINK = re.compile(r"\]\(([^)#]*)(?:#([^)]*))?\)")
 
@@ -82,7 +84,7 @@ def source_text():
 
 def documented_messages():
     text = (REPOSITORY / "docs/administrators.md").read_text()
-    table = text[text.index("| Message | Meaning |"):text.index("| Code | Text |")]
+    table = text[text.index("| Message | Meaning |") : text.index("| Code | Text |")]
     cells = [row.split(" | ")[0] for row in table.splitlines()[2:] if row.startswith("|")]
     return [message for cell in cells for message in re.findall(r"`([^`]+)`", cell)]
 
@@ -110,8 +112,9 @@ def test_every_error_line_of_the_sources_is_documented():
 def example_spb(tmp_path_factory):
     work = tmp_path_factory.mktemp("example")
     subprocess.run([REPOSITORY / "scripts/build_toolkit.sh", work / "toolkit"], check=True)
-    subprocess.run([REPOSITORY / "scripts/pack_toolkit.py", work / "toolkit", "-o", work / "spb"],
-                   check=True)
+    subprocess.run(
+        [REPOSITORY / "scripts/pack_toolkit.py", work / "toolkit", "-o", work / "spb"], check=True
+    )
     return (work / "spb").read_bytes()
 
 
@@ -128,9 +131,11 @@ def test_the_transcript_of_the_readme_is_what_the_example_toolkit_gives(machine,
 
 
 SHELL_EXAMPLE, POSTINST, PRERM = [
-    block for block in code_blocks("docs/exploiters.md", "sh") if block.startswith("#!")]
-[RPM_EXAMPLE] = [block for block in code_blocks("docs/exploiters.md", "sh")
-                 if block.startswith("%")]
+    block for block in code_blocks("docs/exploiters.md", "sh") if block.startswith("#!")
+]
+[RPM_EXAMPLE] = [
+    block for block in code_blocks("docs/exploiters.md", "sh") if block.startswith("%")
+]
 
 
 def rpm_script(section):
@@ -151,8 +156,14 @@ def with_media(machine):
 
 def run_script(machine, script, *arguments):
     machine.plant("/media/script.sh", script, 0o755)
-    return machine.execute(["/bin/sh", "/media/script.sh", *arguments], user=ROOT, umask=0o022,
-                           environment=None, options=(), everywhere=False)
+    return machine.execute(
+        ["/bin/sh", "/media/script.sh", *arguments],
+        user=ROOT,
+        umask=0o022,
+        environment=None,
+        options=(),
+        everywhere=False,
+    )
 
 
 def test_the_shell_example_installs(machine):
@@ -169,8 +180,9 @@ def test_the_shell_example_tells_a_failure(machine):
     outcome = run_script(with_media(machine), SHELL_EXAMPLE)
 
     assert outcome.status == 1
-    assert outcome.stderr == ("The inventory toolkit could not be installed; "
-                              "see /var/log/shop-zor.log\n")
+    assert outcome.stderr == (
+        "The inventory toolkit could not be installed; see /var/log/shop-zor.log\n"
+    )
 
 
 def test_the_rpm_example_installs_keeps_and_removes(machine):

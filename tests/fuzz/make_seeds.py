@@ -15,15 +15,18 @@ from harness.zip_archive import DEFLATED, STORED, Archive, deflate
 TEXT = b"One line like the next.\n" * 40
 NOISE = bytes(value * 73 & 0xFF for value in range(1000))
 
-REGISTRY = (b"ZOR_Version = 9.2.30.0000\nZOR_BuildDate = 22/12/02\n"
-            b"ZOR_HomeDirectory = /opt/corvan/zor\nZOR_Exploiters = ABC:XYZ:\n"
-            b"ZOR_ConfigRootDirectory = /opt/corvan/zor\n")
+REGISTRY = (
+    b"ZOR_Version = 9.2.30.0000\nZOR_BuildDate = 22/12/02\n"
+    b"ZOR_HomeDirectory = /opt/corvan/zor\nZOR_Exploiters = ABC:XYZ:\n"
+    b"ZOR_ConfigRootDirectory = /opt/corvan/zor\n"
+)
 
 
 def two_files():
     """A valid archive, still open to changes."""
-    return (Archive().add("/bin/").add("/bin/a", TEXT).add("/config/")
-            .add("/config/b", NOISE, STORED))
+    return (
+        Archive().add("/bin/").add("/bin/a", TEXT).add("/config/").add("/config/b", NOISE, STORED)
+    )
 
 
 def changed(**fields):
@@ -67,11 +70,28 @@ def zip_directory():
 
 
 def extraction():
-    collisions = (Archive().add("/bin/d/").add("/bin/d/x", TEXT).add("/bin/d", TEXT)
-                  .add("/bin/d", NOISE).add("/bin/d.bak", TEXT).add("/bin/d", TEXT, STORED))
+    collisions = (
+        Archive()
+        .add("/bin/d/")
+        .add("/bin/d/x", TEXT)
+        .add("/bin/d", TEXT)
+        .add("/bin/d", NOISE)
+        .add("/bin/d.bak", TEXT)
+        .add("/bin/d", TEXT, STORED)
+    )
     everywhere = Archive()
-    for name in ("/bin/", "/bin/a", "/properties/p", "/config//Zor.properties", "/config/xss/",
-                 "/config/xss/x", "/install/i.sh", "/elsewhere/e", "/bin//", "/bin/deep/er/"):
+    for name in (
+        "/bin/",
+        "/bin/a",
+        "/properties/p",
+        "/config//Zor.properties",
+        "/config/xss/",
+        "/config/xss/x",
+        "/install/i.sh",
+        "/elsewhere/e",
+        "/bin//",
+        "/bin/deep/er/",
+    ):
         everywhere.add(name, b"" if name.endswith("/") else TEXT)
     whole = Archive()
     for name, data in toolkit.FILES.items():
@@ -133,10 +153,16 @@ def property_file():
         return b"\n".join((key, value, old, new, content))
 
     return {
-        "replace": seed(b"trace_level", b"3", b"$(ZOR_DestinationDir)", b"/opt/corvan/zor",
-                        toolkit.ZOR_PROPERTIES),
-        "separator": seed(b"handlers", b"x=y", b"$(FileSeparator)", b"/",
-                          toolkit.ZOR_TRACE_PROPERTIES),
+        "replace": seed(
+            b"trace_level",
+            b"3",
+            b"$(ZOR_DestinationDir)",
+            b"/opt/corvan/zor",
+            toolkit.ZOR_PROPERTIES,
+        ),
+        "separator": seed(
+            b"handlers", b"x=y", b"$(FileSeparator)", b"/", toolkit.ZOR_TRACE_PROPERTIES
+        ),
         "whole_line": seed(b"key", b"", b"ab", b"", b"key\n key \nkey=1\n#key=1\naabb\n"),
         "blanks": seed(b" ", b" ", b"\t", b"", b" \n\t\n = \n"),
         "no_newline": seed(b"c", b"4", b"=", b":", b"a = 1\n#b=2\n\nc=3"),
@@ -147,7 +173,7 @@ def file_index():
     paths = b"".join(b"/opt/corvan/zor/bin/%d\n" % number for number in range(9))
     return {
         "written": b"# File created by ZOR: 22/12/02zor_9.2.30.0000 installed on "
-                   b"2022-12-02T10:00:00\n" + paths,
+        b"2022-12-02T10:00:00\n" + paths,
         "transient": b"# File created by ZOR: 22/12/02zor_9.2.30.0000\n" + paths + paths,
         "comments": b"/a/x\n#comment\n\n/a/b",
         "blanks": b"/a \n/a\n \n",
@@ -166,8 +192,15 @@ def journal():
 
 
 def main():
-    for target in (entry_stream, extraction, file_index, journal, property_file, registry,
-                   zip_directory):
+    for target in (
+        entry_stream,
+        extraction,
+        file_index,
+        journal,
+        property_file,
+        registry,
+        zip_directory,
+    ):
         directory = os.path.join(sys.argv[1], target.__name__)
         os.makedirs(directory, exist_ok=True)
         for name, content in target().items():

@@ -8,8 +8,9 @@ import pytest
 
 
 def check(tree, *arguments):
-    return subprocess.run([tree / "scripts/check_binary", *arguments], capture_output=True,
-                          text=True, check=False)
+    return subprocess.run(
+        [tree / "scripts/check_binary", *arguments], capture_output=True, text=True, check=False
+    )
 
 
 @pytest.fixture
@@ -35,7 +36,8 @@ def test_the_binary_needs_what_is_listed_and_has_every_protection(tree, binary):
 
     assert (outcome.returncode, outcome.stderr) == (0, "")
     assert "\n  libc.so.6: GLIBC_2.34\n" in outcome.stdout
-    assert outcome.stdout.endswith("""\
+    assert outcome.stdout.endswith(
+        """\
 Protections:
   position-independent
   read-only relocations
@@ -48,7 +50,8 @@ Protections:
   checked calls of the C library
   stripped
   names its debug symbols
-""")
+"""
+    )
 
 
 def test_a_newer_version_than_listed_fails_and_names_its_symbols(tree, binary, needs, tmp_path):
@@ -57,8 +60,9 @@ def test_a_newer_version_than_listed_fails_and_names_its_symbols(tree, binary, n
     outcome = check_against(tree, binary, lines, tmp_path)
 
     assert outcome.returncode == 1
-    assert re.fullmatch(r"new need: libc\.so\.6: GLIBC_2\.34, for .*\b__libc_start_main\b.*\n",
-                        outcome.stderr)
+    assert re.fullmatch(
+        r"new need: libc\.so\.6: GLIBC_2\.34, for .*\b__libc_start_main\b.*\n", outcome.stderr
+    )
 
 
 def test_a_library_that_is_not_listed_fails(tree, binary, needs, tmp_path):
@@ -93,24 +97,37 @@ def test_a_need_that_has_become_less_is_told_and_passes(tree, binary, needs, tmp
     outcome = check_against(tree, binary, lines, tmp_path)
 
     assert (outcome.returncode, outcome.stderr) == (0, "")
-    assert outcome.stdout.endswith("Listed, but not needed: libc.so.6: GLIBC_2.100\n"
-                                   "Listed, but not needed: libz.so.1: ZLIB_1.2\n")
+    assert outcome.stdout.endswith(
+        "Listed, but not needed: libc.so.6: GLIBC_2.100\n"
+        "Listed, but not needed: libz.so.1: ZLIB_1.2\n"
+    )
 
 
 def compile_and_check(tree, tmp_path, source, *options):
     (tmp_path / "program.c").write_text(source)
-    subprocess.run(["gcc", *options, "-o", tmp_path / "program", tmp_path / "program.c"],
-                   check=True, stderr=subprocess.DEVNULL)
+    subprocess.run(
+        ["gcc", *options, "-o", tmp_path / "program", tmp_path / "program.c"],
+        check=True,
+        stderr=subprocess.DEVNULL,
+    )
     return check(tree, tmp_path / "program")
 
 
 def test_every_protection_that_a_program_lacks_is_named(tree, tmp_path):
     outcome = compile_and_check(
-        tree, tmp_path, "int main(void) { return 0; }\n",
-        "-fno-stack-protector", "-no-pie", "-Wl,-z,norelro,-z,lazy,-z,execstack,-rpath,/opt", "-g")
+        tree,
+        tmp_path,
+        "int main(void) { return 0; }\n",
+        "-fno-stack-protector",
+        "-no-pie",
+        "-Wl,-z,norelro,-z,lazy,-z,execstack,-rpath,/opt",
+        "-g",
+    )
 
     assert outcome.returncode == 1
-    assert outcome.stderr == """\
+    assert (
+        outcome.stderr
+        == """\
 missing: position-independent
 missing: read-only relocations
 missing: all symbols bound at start
@@ -121,6 +138,7 @@ missing: checked calls of the C library
 missing: stripped
 missing: names its debug symbols
 """
+    )
 
 
 CHANGEABLE_CODE = r"""
@@ -132,8 +150,9 @@ int main(void) { return changeable() + *absolute_address(); }
 
 
 def test_code_that_can_be_written_to_is_named(tree, tmp_path):
-    outcome = compile_and_check(tree, tmp_path, CHANGEABLE_CODE,
-                                "-m32", "-fno-pic", "-pie", "-Wl,-z,notext")
+    outcome = compile_and_check(
+        tree, tmp_path, CHANGEABLE_CODE, "-m32", "-fno-pic", "-pie", "-Wl,-z,notext"
+    )
 
     assert outcome.returncode == 1
     assert "missing: nothing both writable and executable\n" in outcome.stderr
@@ -149,9 +168,20 @@ def test_what_is_no_program_cannot_be_judged(tree):
 
 def section(path, name):
     """The bytes of one section of a program."""
-    return subprocess.run(["objcopy", "--output-target=binary", "--only-section", name,
-                           "--set-section-flags", f"{name}=alloc", path, "/dev/stdout"],
-                          capture_output=True, check=True).stdout
+    return subprocess.run(
+        [
+            "objcopy",
+            "--output-target=binary",
+            "--only-section",
+            name,
+            "--set-section-flags",
+            f"{name}=alloc",
+            path,
+            "/dev/stdout",
+        ],
+        capture_output=True,
+        check=True,
+    ).stdout
 
 
 def test_the_binary_names_its_debug_file_and_its_checksum(binary, debug_file):
@@ -162,14 +192,17 @@ def test_the_binary_names_its_debug_file_and_its_checksum(binary, debug_file):
 
 
 def test_the_debug_file_has_the_names_and_lines_of_the_sources(debug_file):
-    names = subprocess.run(["nm", "--demangle", debug_file], capture_output=True, text=True,
-                           check=True).stdout
+    names = subprocess.run(
+        ["nm", "--demangle", debug_file], capture_output=True, text=True, check=True
+    ).stdout
     address = re.search(r"^(\w+) T main$", names, re.MULTILINE).group(1)
-    place = subprocess.run(["addr2line", "-e", debug_file, address], capture_output=True,
-                           text=True, check=True).stdout
+    place = subprocess.run(
+        ["addr2line", "-e", debug_file, address], capture_output=True, text=True, check=True
+    ).stdout
 
-    assert re.fullmatch(r"/usr/src/wzorinst-9\.2\.30/src/install/standalone/wzorinst\.cpp:\d+\n",
-                        place)
+    assert re.fullmatch(
+        r"/usr/src/wzorinst-9\.2\.30/src/install/standalone/wzorinst\.cpp:\d+\n", place
+    )
 
 
 def test_neither_file_tells_where_it_was_built(binary, debug_file, tree, build):

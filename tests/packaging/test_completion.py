@@ -47,11 +47,15 @@ class InteractiveBash:
     def __init__(self, machine):
         terminal, inside = pty.openpty()
         line = bubblewrap.command_line(
-            machine.root, ["/bin/bash", "--noprofile", "--rcfile", "/media/set-up", "-i"], uid=0,
+            machine.root,
+            ["/bin/bash", "--noprofile", "--rcfile", "/media/set-up", "-i"],
+            uid=0,
             environment={"TERM": "dumb", "LC_ALL": "C.UTF-8", "HOME": "/root", "COLUMNS": "1000"},
-            read_only={BINARY: machine.binary})
-        self.process = subprocess.Popen(line, stdin=inside, stdout=inside, stderr=inside,
-                                        start_new_session=True)
+            read_only={BINARY: machine.binary},
+        )
+        self.process = subprocess.Popen(
+            line, stdin=inside, stdout=inside, stderr=inside, start_new_session=True
+        )
         os.close(inside)
         self.terminal = terminal
         self.read_until(r"ready> $")
@@ -79,8 +83,10 @@ class InteractiveBash:
 def bash(binary, tree):
     machine = Machine(binary)
     machine.plant("/media/set-up", SET_UP)
-    machine.plant("/media/bash-completion/completions/wzorinst",
-                  (tree / "packaging/bash-completion/wzorinst").read_bytes())
+    machine.plant(
+        "/media/bash-completion/completions/wzorinst",
+        (tree / "packaging/bash-completion/wzorinst").read_bytes(),
+    )
     machine.plant("/etc/zor/zor.ini", REGISTRY)
     for name in ("toolkit.spb", "TOOLS.SPB", "notes.txt", "two words.spb"):
         machine.plant(f"/home/work/{name}", "x")
@@ -91,11 +97,15 @@ def bash(binary, tree):
     machine.delete()
 
 
-@pytest.mark.parametrize("typed, completed", [
-    ("wzorinst ", "wzorinst i r t "),
-    ("wzorinst x", "wzorinst x"),
-    ("/media/wzorinst ", "/media/wzorinst i r t "),
-], ids=["nothing", "no action", "a path to the program"])
+@pytest.mark.parametrize(
+    "typed, completed",
+    [
+        ("wzorinst ", "wzorinst i r t "),
+        ("wzorinst x", "wzorinst x"),
+        ("/media/wzorinst ", "/media/wzorinst i r t "),
+    ],
+    ids=["nothing", "no action", "a path to the program"],
+)
 def test_the_first_word_is_an_action(bash, typed, completed):
     assert bash.completed(typed) == completed
 
@@ -116,16 +126,23 @@ def test_options_follow_the_exploiter(bash):
     assert bash.completed("wzorinst i X -n -") == "wzorinst i X -n -c -d -f -n -o -p -r -s "
 
 
-@pytest.mark.parametrize("typed, completed", [
-    ("-e", "-eeo"), ("-no", "-norollback"), ("-v", "-v"),
-])
+@pytest.mark.parametrize(
+    "typed, completed",
+    [
+        ("-e", "-eeo"),
+        ("-no", "-norollback"),
+        ("-v", "-v"),
+    ],
+)
 def test_an_unlisted_option_is_completed_once_it_is_begun(bash, typed, completed):
     assert bash.completed(f"wzorinst r X {typed}") == f"wzorinst r X {completed} "
 
 
 def test_the_extended_options_follow_eeo(bash):
-    assert (bash.completed("wzorinst i X -eeo -")
-            == "wzorinst i X -eeo -c -d -f -g -l -n -o -p -r -s -z ")
+    assert (
+        bash.completed("wzorinst i X -eeo -")
+        == "wzorinst i X -eeo -c -d -f -g -l -n -o -p -r -s -z "
+    )
 
 
 def test_eeo_as_the_argument_of_an_option_unlocks_nothing(bash):
@@ -133,13 +150,17 @@ def test_eeo_as_the_argument_of_an_option_unlocks_nothing(bash):
 
 
 def test_the_package_is_a_file_that_ends_in_spb_or_lies_in_a_directory(bash):
-    assert (bash.completed("wzorinst i X -s ")
-            == r"wzorinst i X -s TOOLS.SPB media toolkit.spb two\ words.spb ")
+    assert (
+        bash.completed("wzorinst i X -s ")
+        == r"wzorinst i X -s TOOLS.SPB media toolkit.spb two\ words.spb "
+    )
 
 
 def test_the_log_is_any_file(bash):
-    assert (bash.completed("wzorinst i X -o ")
-            == r"wzorinst i X -o TOOLS.SPB media notes.txt toolkit.spb two\ words.spb ")
+    assert (
+        bash.completed("wzorinst i X -o ")
+        == r"wzorinst i X -o TOOLS.SPB media notes.txt toolkit.spb two\ words.spb "
+    )
 
 
 @pytest.mark.parametrize("option", ["-d", "-c"])
@@ -154,7 +175,8 @@ def test_the_tab_key_completes_a_directory(bash):
 def test_the_provider_is_one_of_six(bash):
     assert bash.completed("wzorinst i X -f ") == (
         "wzorinst i X -f provider_cache provider_cache2 provider_cache3 provider_remote_cache "
-        "provider_remote_cache2 provider_standard ")
+        "provider_remote_cache2 provider_standard "
+    )
 
 
 def test_an_argument_that_looks_like_an_option_has_no_argument(bash):

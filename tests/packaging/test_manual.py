@@ -17,8 +17,9 @@ def page(build):
 def sections(page):
     """The page as it is read: the name of each section and its text."""
     environment = {**os.environ, "MANWIDTH": "1000", "MANPAGER": "cat", "LC_ALL": "C.UTF-8"}
-    rendered = subprocess.run(["man", "-l", page], env=environment, capture_output=True, text=True,
-                              check=True).stdout
+    rendered = subprocess.run(
+        ["man", "-l", page], env=environment, capture_output=True, text=True, check=True
+    ).stdout
     parts = re.split(r"^([A-Z][A-Z ]+)$", rendered, flags=re.MULTILINE)
     return dict(zip(parts[1::2], parts[2::2]))
 
@@ -38,8 +39,10 @@ def entries(section):
 def documented_options(sections):
     """As `parser_options`, from the page."""
     options = {}
-    for heading, text in {**entries(sections["OPTIONS"]),
-                          **entries(sections["UNLISTED OPTIONS"])}.items():
+    for heading, text in {
+        **entries(sections["OPTIONS"]),
+        **entries(sections["UNLISTED OPTIONS"]),
+    }.items():
         before = "-eeo " if text.startswith("after -eeo: ") else ""
         options[before + heading.split()[0]] = "<" in heading
     return options
@@ -49,46 +52,70 @@ def test_rendering_gives_no_warning(page, tmp_path):
     source = tmp_path / "wzorinst.8"
     source.write_bytes(subprocess.run(["zcat", page], capture_output=True, check=True).stdout)
 
-    checked = subprocess.run(["groff", "-ww", "-man", "-Tutf8", "-z", source],
-                             capture_output=True, text=True, check=True)
+    checked = subprocess.run(
+        ["groff", "-ww", "-man", "-Tutf8", "-z", source], capture_output=True, text=True, check=True
+    )
 
     assert (checked.stdout, checked.stderr) == ("", "")
 
 
 def test_man_shows_the_page_without_a_warning(page):
-    shown = subprocess.run(["man", "--warnings", "-Tutf8", "-Z", "-l", page],
-                           capture_output=True, text=True, check=True)
+    shown = subprocess.run(
+        ["man", "--warnings", "-Tutf8", "-Z", "-l", page],
+        capture_output=True,
+        text=True,
+        check=True,
+    )
 
     assert shown.stderr == ""
 
 
 def test_the_page_has_the_sections_of_a_manual_page(sections):
     assert list(sections) == [
-        "NAME", "SYNOPSIS", "DESCRIPTION", "ACTIONS", "OPTIONS", "UNLISTED OPTIONS", "EXIT STATUS",
-        "ENVIRONMENT", "FILES", "MESSAGES", "EXAMPLES", "SEE ALSO"]
+        "NAME",
+        "SYNOPSIS",
+        "DESCRIPTION",
+        "ACTIONS",
+        "OPTIONS",
+        "UNLISTED OPTIONS",
+        "EXIT STATUS",
+        "ENVIRONMENT",
+        "FILES",
+        "MESSAGES",
+        "EXAMPLES",
+        "SEE ALSO",
+    ]
 
 
 def test_every_line_of_the_usage_text_is_explained_in_its_words(sections, usage):
     explained = {**entries(sections["ACTIONS"]), **entries(sections["OPTIONS"])}
 
     assert len(usage) == 12
-    assert [what for what, words in usage.items()
-            if not re.match(re.escape(words) + "[.:;]", explained.get(what, ""))] == []
+    assert [
+        what
+        for what, words in usage.items()
+        if not re.match(re.escape(words) + "[.:;]", explained.get(what, ""))
+    ] == []
 
 
 def test_the_options_of_the_usage_text_and_the_others_have_sections_of_their_own(sections, usage):
     listed = [what for what in usage if what.startswith("-")]
 
     assert list(entries(sections["OPTIONS"])) == listed
-    assert list(entries(sections["UNLISTED OPTIONS"])) == ["-v", "-norollback", "-eeo", "-l", "-g",
-                                                           "-z"]
+    assert list(entries(sections["UNLISTED OPTIONS"])) == [
+        "-v",
+        "-norollback",
+        "-eeo",
+        "-l",
+        "-g",
+        "-z",
+    ]
 
 
 def test_the_page_explains_the_options_that_the_program_takes_and_no_other(sections, machine):
     taken = parser_options(machine)
     documented = documented_options(sections)
-    words = {option: wants for option, wants in documented.items()
-             if len(option.split()[-1]) > 2}
+    words = {option: wants for option, wants in documented.items() if len(option.split()[-1]) > 2}
 
     assert {option: wants for option, wants in documented.items() if option not in words} == taken
     assert words == {"-norollback": False, "-eeo": False}
@@ -106,8 +133,9 @@ def test_the_program_takes_the_option_that_is_a_word(machine, word):
 
 
 def test_the_providers_are_those_that_the_program_takes(sections, machine):
-    paragraph = next(text for heading, text in entries(sections["OPTIONS"]).items()
-                     if heading.startswith("-f "))
+    paragraph = next(
+        text for heading, text in entries(sections["OPTIONS"]).items() if heading.startswith("-f ")
+    )
     providers = re.findall(r"provider_\w+", paragraph)
 
     assert len(set(providers)) == 6
@@ -121,14 +149,17 @@ def test_the_files_are_those_that_an_installation_leaves(sections, machine):
     named = [path for heading in entries(sections["FILES"]) for path in heading.split(", ")]
 
     assert len(named) == 12
-    there = [path if path.startswith("/") else f"{home}/{path}" for path in named
-             if path[0] not in "~*"]
+    there = [
+        path if path.startswith("/") else f"{home}/{path}" for path in named if path[0] not in "~*"
+    ]
     assert [path for path in there if not machine.exists(path)] == []
 
 
 def test_the_messages_stand_in_the_sources(sections, tree):
-    sources = "".join(re.sub(r'"\s*\n\s*"', "", path.read_text())
-                      for path in (tree / "src/install/standalone").glob("*.cpp"))
+    sources = "".join(
+        re.sub(r'"\s*\n\s*"', "", path.read_text())
+        for path in (tree / "src/install/standalone").glob("*.cpp")
+    )
     messages = list(entries(sections["MESSAGES"]))
 
     assert len(messages) == 10

@@ -60,8 +60,12 @@ def names(binary):
 def packages(build, tmp_path_factory):
     """The directory that holds the packages of this build."""
     directory = tmp_path_factory.mktemp("packages")
-    made = subprocess.run(["cpack", "--config", build / "CPackConfig.cmake", "-B", directory],
-                          capture_output=True, text=True, check=False)
+    made = subprocess.run(
+        ["cpack", "--config", build / "CPackConfig.cmake", "-B", directory],
+        capture_output=True,
+        text=True,
+        check=False,
+    )
     assert made.returncode == 0, made.stdout + made.stderr
     return directory
 
@@ -70,8 +74,17 @@ def packages(build, tmp_path_factory):
 def root(tmp_path):
     """The root directory of a machine on which nothing but the C library is installed."""
     directory = tmp_path / "root"
-    for path in ("etc", "var/lib/dpkg/info", "var/lib/dpkg/updates", "var/lib/rpm", "usr/lib",
-                 "usr/lib32", "usr/lib64", "proc", "dev"):
+    for path in (
+        "etc",
+        "var/lib/dpkg/info",
+        "var/lib/dpkg/updates",
+        "var/lib/rpm",
+        "usr/lib",
+        "usr/lib32",
+        "usr/lib64",
+        "proc",
+        "dev",
+    ):
         (directory / path).mkdir(parents=True)
     for name in ("lib", "lib32", "lib64"):
         (directory / name).symlink_to(f"usr/{name}")
@@ -82,21 +95,49 @@ def root(tmp_path):
 
 
 def sandbox(*options):
-    return ["bwrap", "--die-with-parent", "--unshare-user", "--unshare-pid", "--uid", "0",
-            "--gid", "0", "--cap-add", "ALL", *options, "--proc", "/proc", "--dev", "/dev", "--"]
+    return [
+        "bwrap",
+        "--die-with-parent",
+        "--unshare-user",
+        "--unshare-pid",
+        "--uid",
+        "0",
+        "--gid",
+        "0",
+        "--cap-add",
+        "ALL",
+        *options,
+        "--proc",
+        "/proc",
+        "--dev",
+        "/dev",
+        "--",
+    ]
 
 
 def manage(root, *command):
     """Runs a package manager, which can write to nothing but the root directory."""
-    done = subprocess.run([*sandbox("--ro-bind", "/", "/", "--bind", root, root), *command],
-                          capture_output=True, text=True, check=False)
+    done = subprocess.run(
+        [*sandbox("--ro-bind", "/", "/", "--bind", root, root), *command],
+        capture_output=True,
+        text=True,
+        check=False,
+    )
     assert done.returncode == 0, done.stdout + done.stderr
 
 
 def dpkg(root, *arguments):
     # The other architecture and the missing record of the C library are no hindrance here.
-    manage(root, "dpkg", f"--root={root}", "--log=/dev/null", "--force-architecture",
-           "--force-depends", "--force-not-root", *arguments)
+    manage(
+        root,
+        "dpkg",
+        f"--root={root}",
+        "--log=/dev/null",
+        "--force-architecture",
+        "--force-depends",
+        "--force-not-root",
+        *arguments,
+    )
 
 
 def rpm(root, *arguments):
@@ -104,18 +145,29 @@ def rpm(root, *arguments):
 
 
 def run_installed(root, *command):
-    libraries = [word for path in ("/usr/lib", "/usr/lib32", "/usr/lib64") if os.path.isdir(path)
-                 for word in ("--ro-bind", path, path)]
+    libraries = [
+        word
+        for path in ("/usr/lib", "/usr/lib32", "/usr/lib64")
+        if os.path.isdir(path)
+        for word in ("--ro-bind", path, path)
+    ]
     return subprocess.run(
-        [*sandbox("--bind", root, "/", *libraries, "--clearenv", "--setenv", "PATH", "/usr/bin"),
-         *command], capture_output=True, text=True, check=False)
+        [
+            *sandbox("--bind", root, "/", *libraries, "--clearenv", "--setenv", "PATH", "/usr/bin"),
+            *command,
+        ],
+        capture_output=True,
+        text=True,
+        check=False,
+    )
 
 
 def installed_files(root):
     """Mode and path of every file below the root directory's /usr."""
     found = [path for path in (root / "usr").rglob("*") if not path.is_dir()]
-    return "".join(f"{path.stat().st_mode & 0o7777:o} /{path.relative_to(root)}\n"
-                   for path in sorted(found))
+    return "".join(
+        f"{path.stat().st_mode & 0o7777:o} /{path.relative_to(root)}\n" for path in sorted(found)
+    )
 
 
 def whole_tree(root):
@@ -123,30 +175,34 @@ def whole_tree(root):
 
 
 def debian_fields(package):
-    lines = subprocess.run(["dpkg-deb", "--field", package], capture_output=True, text=True,
-                           check=True).stdout.splitlines()
+    lines = subprocess.run(
+        ["dpkg-deb", "--field", package], capture_output=True, text=True, check=True
+    ).stdout.splitlines()
     return dict(line.split(": ", 1) for line in lines if line and not line.startswith(" "))
 
 
 def rpm_query(package, *query):
-    return subprocess.run(["rpm", "--query", "--package", *query, package], capture_output=True,
-                          text=True, check=True).stdout
+    return subprocess.run(
+        ["rpm", "--query", "--package", *query, package], capture_output=True, text=True, check=True
+    ).stdout
 
 
 def test_the_packages_have_the_names_that_their_systems_expect(packages, names):
     processor, debian = names["processor"], names["debian"]
 
-    assert sorted(path.name for path in packages.iterdir() if path.is_file()) == sorted([
-        f"wzorinst-{VERSION}-linux-{processor}.tar.gz",
-        f"wzorinst-debug-{VERSION}-linux-{processor}.tar.gz",
-        f"wzorinst-spb-{VERSION}-linux-{processor}.tar.gz",
-        f"wzorinst_{VERSION}-1_{debian}.deb",
-        f"wzorinst-dbgsym_{VERSION}-1_{debian}.deb",
-        f"wzorinst-spb_{VERSION}-1_all.deb",
-        f"wzorinst-{VERSION}-1.{processor}.rpm",
-        f"wzorinst-debuginfo-{VERSION}-1.{processor}.rpm",
-        f"wzorinst-spb-{VERSION}-1.noarch.rpm",
-    ])
+    assert sorted(path.name for path in packages.iterdir() if path.is_file()) == sorted(
+        [
+            f"wzorinst-{VERSION}-linux-{processor}.tar.gz",
+            f"wzorinst-debug-{VERSION}-linux-{processor}.tar.gz",
+            f"wzorinst-spb-{VERSION}-linux-{processor}.tar.gz",
+            f"wzorinst_{VERSION}-1_{debian}.deb",
+            f"wzorinst-dbgsym_{VERSION}-1_{debian}.deb",
+            f"wzorinst-spb_{VERSION}-1_all.deb",
+            f"wzorinst-{VERSION}-1.{processor}.rpm",
+            f"wzorinst-debuginfo-{VERSION}-1.{processor}.rpm",
+            f"wzorinst-spb-{VERSION}-1.noarch.rpm",
+        ]
+    )
 
 
 @pytest.fixture
@@ -187,10 +243,12 @@ def test_the_rpm_needs_the_c_library_alone(rpm_package, names):
     needs = rpm_query(rpm_package, "--requires").splitlines()
 
     assert names["library"] in needs
-    assert [need for need in needs
-            if not need.startswith(("libc.so.6", "ld-linux", "rtld(", "rpmlib("))] == []
+    assert [
+        need for need in needs if not need.startswith(("libc.so.6", "ld-linux", "rtld(", "rpmlib("))
+    ] == []
     assert rpm_query(rpm_package, "--queryformat", "%{NAME} %{VERSION}-%{RELEASE} %{ARCH}") == (
-        f"wzorinst 9.2.30-1 {names['processor']}")
+        f"wzorinst 9.2.30-1 {names['processor']}"
+    )
 
 
 def test_an_installed_rpm_runs_and_its_removal_leaves_nothing(rpm_package, root, binary):
@@ -224,7 +282,8 @@ def test_the_archive_unpacks_into_a_directory_of_its_name(packages, names):
         files = sorted(f"{member.mode:o} {member.name}" for member in archive if member.isfile())
 
     assert "".join(line + "\n" for line in files) == "".join(
-        sorted(INSTALLED.replace("/usr/", f"{top}/").splitlines(keepends=True)))
+        sorted(INSTALLED.replace("/usr/", f"{top}/").splitlines(keepends=True))
+    )
 
 
 def test_the_tool_for_spbs_is_a_deb_of_any_architecture_that_needs_python(packages, root):
@@ -240,8 +299,9 @@ def test_the_tool_for_spbs_is_an_rpm_of_any_architecture_that_needs_python(packa
     package = packages / f"wzorinst-spb-{VERSION}-1.noarch.rpm"
 
     assert "/usr/bin/python3" in rpm_query(package, "--requires").split()
-    assert rpm_query(package, "--list").split() == [line.split()[1]
-                                                    for line in SPB_INSTALLED.splitlines()]
+    assert rpm_query(package, "--list").split() == [
+        line.split()[1] for line in SPB_INSTALLED.splitlines()
+    ]
 
 
 def test_the_debug_symbols_lie_where_a_debugger_looks_for_them(packages, names, root):
@@ -254,8 +314,13 @@ def test_the_debug_symbols_lie_where_a_debugger_looks_for_them(packages, names, 
 
 
 def test_everything_in_a_package_has_the_time_of_the_release(deb, rpm_package):
-    listing = subprocess.run(["dpkg-deb", "--contents", deb], env={**os.environ, "TZ": "UTC"},
-                             capture_output=True, text=True, check=True).stdout
+    listing = subprocess.run(
+        ["dpkg-deb", "--contents", deb],
+        env={**os.environ, "TZ": "UTC"},
+        capture_output=True,
+        text=True,
+        check=True,
+    ).stdout
 
     assert {" ".join(line.split()[3:5]) for line in listing.splitlines()} == {"2022-12-02 00:00"}
     times = rpm_query(rpm_package, "--queryformat", "%{BUILDTIME} [%{FILEMTIMES} ]")
@@ -263,10 +328,13 @@ def test_everything_in_a_package_has_the_time_of_the_release(deb, rpm_package):
 
 
 def test_install_goes_below_the_prefix_that_is_given(build, tmp_path):
-    subprocess.run(["cmake", "--install", build, "--prefix", tmp_path], check=True,
-                   capture_output=True)
+    subprocess.run(
+        ["cmake", "--install", build, "--prefix", tmp_path], check=True, capture_output=True
+    )
 
-    found = sorted(str(path.relative_to(tmp_path)) for path in tmp_path.rglob("*")
-                   if not path.is_dir())
-    assert found == sorted(line.split()[1].removeprefix("/usr/")
-                           for line in (INSTALLED + SPB_INSTALLED).splitlines())
+    found = sorted(
+        str(path.relative_to(tmp_path)) for path in tmp_path.rglob("*") if not path.is_dir()
+    )
+    assert found == sorted(
+        line.split()[1].removeprefix("/usr/") for line in (INSTALLED + SPB_INSTALLED).splitlines()
+    )

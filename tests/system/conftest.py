@@ -32,6 +32,20 @@ def pytest_runtest_makereport(item, call):
     report = (yield).get_result()
     if report.failed:
         name = str(item.path) + "::" + item.nodeid.split("::", 1)[1]
-        report.sections.append(("to run this test again", shlex.join(
-            ["WZORINST=" + os.path.realpath(os.environ.get("WZORINST", "")), "/usr/bin/python3",
-             "-m", "pytest", "-q", "-p", "no:cacheprovider", name])))
+        report.sections.append(
+            (
+                "to run this test again",
+                shlex.join(
+                    [
+                        "WZORINST=" + os.path.realpath(os.environ.get("WZORINST", "")),
+                        "/usr/bin/python3",
+                        "-m",
+                        "pytest",
+                        "-q",
+                        "-p",
+                        "no:cacheprovider",
+                        name,
+                    ]
+                ),
+            )
+        )

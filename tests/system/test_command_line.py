@@ -68,42 +68,75 @@ def test_an_invalid_command_is_found_before_a_colon_in_the_exploiter(machine):
 
 @pytest.mark.parametrize("exploiter", ["AB:C", ":", "ABC:", ":ABC"])
 def test_a_colon_in_the_exploiter_ends_the_run_without_usage(machine, exploiter):
-    printed(machine.run("i", exploiter, "-s", "x.spb"), "", status=1,
-            stderr="Exploiter name must not contain ':'\n")
+    printed(
+        machine.run("i", exploiter, "-s", "x.spb"),
+        "",
+        status=1,
+        stderr="Exploiter name must not contain ':'\n",
+    )
 
 
 def test_a_colon_in_the_exploiter_is_found_before_the_options_are_read(machine):
-    printed(machine.run("r", "A:B", "-q"), "", status=1,
-            stderr="Exploiter name must not contain ':'\n")
+    printed(
+        machine.run("r", "A:B", "-q"), "", status=1, stderr="Exploiter name must not contain ':'\n"
+    )
 
 
-@pytest.mark.parametrize("option", [
-    "-l", "-g", "-z", "-q", "-S", "-i", "--", "-e", "-", "", "s", "ss", "-sd", "ABC",
-    "norollback", "-norollbac", "-norollbackk", "-NOROLLBACK", "-EEO", "eeo", "-eeoo"])
+@pytest.mark.parametrize(
+    "option",
+    [
+        "-l",
+        "-g",
+        "-z",
+        "-q",
+        "-S",
+        "-i",
+        "--",
+        "-e",
+        "-",
+        "",
+        "s",
+        "ss",
+        "-sd",
+        "ABC",
+        "norollback",
+        "-norollbac",
+        "-norollbackk",
+        "-NOROLLBACK",
+        "-EEO",
+        "eeo",
+        "-eeoo",
+    ],
+)
 def test_an_unknown_option_is_invalid(machine, option):
-    printed(machine.run("r", "ABC", option), USAGE, status=1,
-            stderr=f"Invalid option: {option}\n")
+    printed(machine.run("r", "ABC", option), USAGE, status=1, stderr=f"Invalid option: {option}\n")
 
 
 def test_an_install_type_before_the_switch_is_invalid(machine):
-    printed(machine.run("r", "ABC", "-l", "-eeo"), USAGE, status=1,
-            stderr="Invalid option: -l\n")
+    printed(machine.run("r", "ABC", "-l", "-eeo"), USAGE, status=1, stderr="Invalid option: -l\n")
 
 
 def test_an_unknown_option_is_invalid_behind_the_switch_too(machine):
-    printed(machine.run("r", "ABC", "-eeo", "-q"), USAGE, status=1,
-            stderr="Invalid option: -q\n")
+    printed(machine.run("r", "ABC", "-eeo", "-q"), USAGE, status=1, stderr="Invalid option: -q\n")
 
 
 @pytest.mark.parametrize("option", ["-d", "-f", "-s", "-o", "-c"])
 def test_an_option_at_the_end_misses_its_argument(machine, option):
-    printed(machine.run("r", "ABC", option), USAGE, status=1,
-            stderr=f"Missing argument for option: {option}\n")
+    printed(
+        machine.run("r", "ABC", option),
+        USAGE,
+        status=1,
+        stderr=f"Missing argument for option: {option}\n",
+    )
 
 
 def test_the_lines_of_earlier_options_stay_printed_before_a_missing_argument(machine):
-    printed(machine.run("i", "ABC", "-s", "x.spb", "-d"), "SPB file: x.spb\n" + USAGE, status=1,
-            stderr="Missing argument for option: -d\n")
+    printed(
+        machine.run("i", "ABC", "-s", "x.spb", "-d"),
+        "SPB file: x.spb\n" + USAGE,
+        status=1,
+        stderr="Missing argument for option: -d\n",
+    )
 
 
 def test_an_option_takes_whatever_follows_as_its_argument(machine):
@@ -111,8 +144,12 @@ def test_an_option_takes_whatever_follows_as_its_argument(machine):
 
 
 def test_options_stop_at_the_first_wrong_one(machine):
-    printed(machine.run("r", "ABC", "-s", "a", "-q", "-s", "b"), "SPB file: a\n" + USAGE,
-            status=1, stderr="Invalid option: -q\n")
+    printed(
+        machine.run("r", "ABC", "-s", "a", "-q", "-s", "b"),
+        "SPB file: a\n" + USAGE,
+        status=1,
+        stderr="Invalid option: -q\n",
+    )
 
 
 def test_a_wrong_option_leaves_the_machine_as_it_was(machine):
@@ -123,31 +160,59 @@ def test_a_wrong_option_leaves_the_machine_as_it_was(machine):
     assert machine.tree() == before
 
 
-@pytest.mark.parametrize("provider", [
-    "provider_standard", "provider_cache", "provider_cache2", "provider_cache3",
-    "provider_remote_cache", "provider_remote_cache2"])
+@pytest.mark.parametrize(
+    "provider",
+    [
+        "provider_standard",
+        "provider_cache",
+        "provider_cache2",
+        "provider_cache3",
+        "provider_remote_cache",
+        "provider_remote_cache2",
+    ],
+)
 def test_each_provider_is_accepted(machine, provider):
-    printed(machine.run("r", "ABC", "-f", provider),
-            f"File scanner mode: {provider}\n" + NOTHING_TO_REMOVE, status=1)
+    printed(
+        machine.run("r", "ABC", "-f", provider),
+        f"File scanner mode: {provider}\n" + NOTHING_TO_REMOVE,
+        status=1,
+    )
 
 
-@pytest.mark.parametrize("provider", [
-    "provider_", "provider", "cache", "provider_cache4", "PROVIDER_CACHE", "provider_cache ",
-    "provider_cache|provider_cache2", "|", "provider_cache||provider_remote_cache"])
+@pytest.mark.parametrize(
+    "provider",
+    [
+        "provider_",
+        "provider",
+        "cache",
+        "provider_cache4",
+        "PROVIDER_CACHE",
+        "provider_cache ",
+        "provider_cache|provider_cache2",
+        "|",
+        "provider_cache||provider_remote_cache",
+    ],
+)
 def test_a_text_that_is_no_provider_is_refused(machine, provider):
-    printed(machine.run("r", "ABC", "-f", provider),
-            f"Invalid provider specified: {provider}\n" + USAGE, status=1)
+    printed(
+        machine.run("r", "ABC", "-f", provider),
+        f"Invalid provider specified: {provider}\n" + USAGE,
+        status=1,
+    )
 
 
 def test_two_neighbouring_providers_with_their_separators_are_accepted(machine):
-    printed(machine.run("r", "ABC", "-f", "provider_standard||provider_cache"),
-            "File scanner mode: provider_standard||provider_cache\n" + NOTHING_TO_REMOVE,
-            status=1)
+    printed(
+        machine.run("r", "ABC", "-f", "provider_standard||provider_cache"),
+        "File scanner mode: provider_standard||provider_cache\n" + NOTHING_TO_REMOVE,
+        status=1,
+    )
 
 
 def test_an_empty_provider_is_accepted_between_two_separators(machine):
-    printed(machine.run("r", "ABC", "-f", ""), "File scanner mode: \n" + NOTHING_TO_REMOVE,
-            status=1)
+    printed(
+        machine.run("r", "ABC", "-f", ""), "File scanner mode: \n" + NOTHING_TO_REMOVE, status=1
+    )
 
 
 def test_an_invalid_provider_is_told_to_the_log_file_and_the_usage_to_the_user(machine):
@@ -156,24 +221,37 @@ def test_an_invalid_provider_is_told_to_the_log_file_and_the_usage_to_the_user(m
 
 
 def test_private_mode_without_a_directory_ends_before_the_settings(machine):
-    printed(machine.run("r", "ABC", "-p"), "", status=1,
-            stderr="For privatePath -d parameter is mandatory\n")
+    printed(
+        machine.run("r", "ABC", "-p"),
+        "",
+        status=1,
+        stderr="For privatePath -d parameter is mandatory\n",
+    )
 
 
 def test_private_mode_without_a_directory_is_found_before_a_missing_package(machine):
-    printed(machine.run("i", "ABC", "-p", "-eeo", "-l", "-g"), "", status=1,
-            stderr="For privatePath -d parameter is mandatory\n")
+    printed(
+        machine.run("i", "ABC", "-p", "-eeo", "-l", "-g"),
+        "",
+        status=1,
+        stderr="For privatePath -d parameter is mandatory\n",
+    )
 
 
 def test_an_installation_needs_a_package(machine):
-    printed(machine.run("i", "ABC"),
-            "Error: an SPB file is required to install or upgrade\n" + USAGE, status=1)
+    printed(
+        machine.run("i", "ABC"),
+        "Error: an SPB file is required to install or upgrade\n" + USAGE,
+        status=1,
+    )
 
 
 def test_an_empty_package_path_counts_as_none(machine):
-    printed(machine.run("i", "ABC", "-s", ""),
-            "SPB file: \nError: an SPB file is required to install or upgrade\n" + USAGE,
-            status=1)
+    printed(
+        machine.run("i", "ABC", "-s", ""),
+        "SPB file: \nError: an SPB file is required to install or upgrade\n" + USAGE,
+        status=1,
+    )
 
 
 def test_a_missing_package_is_told_to_the_log_file_and_the_usage_to_the_user(machine):
@@ -186,10 +264,13 @@ def test_a_removal_needs_no_package(machine):
 
 
 def test_every_option_with_an_argument_tells_it_in_the_order_of_the_command_line(machine):
-    outcome = machine.run("r", "ABC", "-c", "/tmp/trace", "-f", "provider_cache2", "-s", "p.spb",
-                          "-d", "/opt/x")
+    outcome = machine.run(
+        "r", "ABC", "-c", "/tmp/trace", "-f", "provider_cache2", "-s", "p.spb", "-d", "/opt/x"
+    )
 
-    printed(outcome, """\
+    printed(
+        outcome,
+        """\
 ZOR custom trace path: /tmp/trace
 File scanner mode: provider_cache2
 SPB file: p.spb
@@ -205,29 +286,46 @@ Log file is: /opt/x/ZOR_files
 currentZorHome = '/opt/x' currentCfgHome = '/opt/x'
 *** Error: INI file not found: nothing to remove.
 Done.
-""", status=1)
+""",
+        status=1,
+    )
 
 
-@pytest.mark.parametrize("options", [
-    ("-r",), ("-v",), ("-norollback",), ("-eeo",), ("-eeo", "-z"), ("-eeo", "-g"),
-    ("-eeo", "-r", "-v", "-norollback", "-eeo")])
+@pytest.mark.parametrize(
+    "options",
+    [
+        ("-r",),
+        ("-v",),
+        ("-norollback",),
+        ("-eeo",),
+        ("-eeo", "-z"),
+        ("-eeo", "-g"),
+        ("-eeo", "-r", "-v", "-norollback", "-eeo"),
+    ],
+)
 def test_the_options_without_an_argument_say_nothing(machine, options):
     printed(machine.run("r", "ABC", *options), NOTHING_TO_REMOVE, status=1)
 
 
 def test_a_skipped_registration_shows_in_the_settings(machine):
-    printed_lines(machine.run("r", "ABC", "-n"), "Install type: global",
-                  "Register exploiter: no", "Default dest: /opt/corvan/zor")
+    printed_lines(
+        machine.run("r", "ABC", "-n"),
+        "Install type: global",
+        "Register exploiter: no",
+        "Default dest: /opt/corvan/zor",
+    )
 
 
 def test_root_can_choose_the_installation_of_its_own(machine):
-    printed_lines(machine.run("r", "ABC", "-eeo", "-l"),
-                  "ZOR version: 22/12/02zor_9.2.30.0000",
-                  "Install type: local",
-                  "Register exploiter: yes",
-                  "Default dest: /root/corvan/zor",
-                  "INI location: /root/.zor/zor.ini",
-                  "Looking for INI file: /root/.zor/zor.ini")
+    printed_lines(
+        machine.run("r", "ABC", "-eeo", "-l"),
+        "ZOR version: 22/12/02zor_9.2.30.0000",
+        "Install type: local",
+        "Register exploiter: yes",
+        "Default dest: /root/corvan/zor",
+        "INI location: /root/.zor/zor.ini",
+        "Looking for INI file: /root/.zor/zor.ini",
+    )
 
 
 def test_a_user_can_choose_the_shared_installation(machine):
@@ -235,22 +333,28 @@ def test_a_user_can_choose_the_shared_installation(machine):
 
 
 def test_of_two_install_types_the_last_one_wins_with_a_warning(machine):
-    printed(machine.run("r", "ABC", "-eeo", "-l", "-g"),
-            "Warning: install type has been specified multiple times\n" + NOTHING_TO_REMOVE,
-            status=1)
+    printed(
+        machine.run("r", "ABC", "-eeo", "-l", "-g"),
+        "Warning: install type has been specified multiple times\n" + NOTHING_TO_REMOVE,
+        status=1,
+    )
 
 
 def test_of_two_install_types_the_last_one_wins_the_other_way_too(machine):
-    printed_lines(machine.run("r", "ABC", "-eeo", "-g", "-l"),
-                  "Warning: install type has been specified multiple times",
-                  "ZOR version: 22/12/02zor_9.2.30.0000",
-                  "Install type: local")
+    printed_lines(
+        machine.run("r", "ABC", "-eeo", "-g", "-l"),
+        "Warning: install type has been specified multiple times",
+        "ZOR version: 22/12/02zor_9.2.30.0000",
+        "Install type: local",
+    )
 
 
 def test_the_same_install_type_twice_is_warned_about(machine):
-    printed(machine.run("r", "ABC", "-eeo", "-g", "-g"),
-            "Warning: install type has been specified multiple times\n" + NOTHING_TO_REMOVE,
-            status=1)
+    printed(
+        machine.run("r", "ABC", "-eeo", "-g", "-g"),
+        "Warning: install type has been specified multiple times\n" + NOTHING_TO_REMOVE,
+        status=1,
+    )
 
 
 def test_one_install_type_is_not_warned_about(machine):
@@ -258,54 +362,69 @@ def test_one_install_type_is_not_warned_about(machine):
 
 
 def test_the_warning_comes_before_the_missing_package(machine):
-    printed(machine.run("i", "ABC", "-eeo", "-l", "-g"),
-            "Warning: install type has been specified multiple times\n"
-            "Error: an SPB file is required to install or upgrade\n" + USAGE, status=1)
+    printed(
+        machine.run("i", "ABC", "-eeo", "-l", "-g"),
+        "Warning: install type has been specified multiple times\n"
+        "Error: an SPB file is required to install or upgrade\n" + USAGE,
+        status=1,
+    )
 
 
 def test_an_installation_with_two_install_types_is_made_in_the_last_one(machine):
     outcome = machine.run("i", "ABC", "-s", SPB, "-eeo", "-l", "-g")
 
     assert outcome.status == 0
-    printed_lines(outcome, "SPB file: /media/toolkit.spb",
-                  "Warning: install type has been specified multiple times",
-                  "ZOR version: 22/12/02zor_9.2.30.0000",
-                  "Install type: global")
+    printed_lines(
+        outcome,
+        "SPB file: /media/toolkit.spb",
+        "Warning: install type has been specified multiple times",
+        "ZOR version: 22/12/02zor_9.2.30.0000",
+        "Install type: global",
+    )
     assert machine.exists("/etc/zor/zor.ini")
     assert not machine.exists("/root/.zor")
 
 
 def test_the_last_directory_wins(machine):
-    printed_lines(machine.run("r", "ABC", "-d", "/opt/a", "-d", "/opt/b"),
-                  "Target directory: /opt/a",
-                  "Target directory: /opt/b")
-    printed_lines(machine.run("r", "ABC", "-d", "/opt/a", "-d", "/opt/b"),
-                  "Log file is: /opt/b/ZOR_files",
-                  "currentZorHome = '/opt/b' currentCfgHome = '/opt/b'")
+    printed_lines(
+        machine.run("r", "ABC", "-d", "/opt/a", "-d", "/opt/b"),
+        "Target directory: /opt/a",
+        "Target directory: /opt/b",
+    )
+    printed_lines(
+        machine.run("r", "ABC", "-d", "/opt/a", "-d", "/opt/b"),
+        "Log file is: /opt/b/ZOR_files",
+        "currentZorHome = '/opt/b' currentCfgHome = '/opt/b'",
+    )
 
 
 def test_one_slash_is_dropped_from_the_end_of_the_directory(machine):
     printed_lines(machine.run("r", "ABC", "-d", "/opt/x/"), "Target directory: /opt/x/")
-    printed_lines(machine.run("r", "ABC", "-d", "/opt/x/"),
-                  "Log file is: /opt/x/ZOR_files",
-                  "currentZorHome = '/opt/x' currentCfgHome = '/opt/x'")
+    printed_lines(
+        machine.run("r", "ABC", "-d", "/opt/x/"),
+        "Log file is: /opt/x/ZOR_files",
+        "currentZorHome = '/opt/x' currentCfgHome = '/opt/x'",
+    )
 
 
 def test_of_two_slashes_at_the_end_of_the_directory_one_stays(machine):
-    printed_lines(machine.run("r", "ABC", "-d", "/opt/x//"),
-                  "Log file is: /opt/x//ZOR_files",
-                  "currentZorHome = '/opt/x/' currentCfgHome = '/opt/x/'")
+    printed_lines(
+        machine.run("r", "ABC", "-d", "/opt/x//"),
+        "Log file is: /opt/x//ZOR_files",
+        "currentZorHome = '/opt/x/' currentCfgHome = '/opt/x/'",
+    )
 
 
 def test_the_root_directory_as_target_becomes_an_empty_path(machine):
-    printed_lines(machine.run("r", "ABC", "-d", "/"),
-                  "Log file is: /ZOR_files",
-                  "currentZorHome = '' currentCfgHome = ''")
+    printed_lines(
+        machine.run("r", "ABC", "-d", "/"),
+        "Log file is: /ZOR_files",
+        "currentZorHome = '' currentCfgHome = ''",
+    )
 
 
 def test_an_empty_directory_counts_as_none(machine):
-    printed(machine.run("r", "ABC", "-d", ""), "Target directory: \n" + NOTHING_TO_REMOVE,
-            status=1)
+    printed(machine.run("r", "ABC", "-d", ""), "Target directory: \n" + NOTHING_TO_REMOVE, status=1)
 
 
 def test_an_empty_directory_is_none_for_private_mode(machine):
@@ -317,8 +436,11 @@ def test_an_empty_directory_is_none_for_private_mode(machine):
 
 
 def test_the_log_file_takes_all_lines_from_its_option_on(machine):
-    printed(machine.run("r", "ABC", "-s", "before", "-o", "/tmp/log", "-c", "after"),
-            "SPB file: before\n", status=1)
+    printed(
+        machine.run("r", "ABC", "-s", "before", "-o", "/tmp/log", "-c", "after"),
+        "SPB file: before\n",
+        status=1,
+    )
     same_text(machine.read("/tmp/log"), "ZOR custom trace path: after\n" + NOTHING_TO_REMOVE)
 
 
@@ -337,8 +459,12 @@ def test_of_two_log_files_the_second_takes_over(machine):
 
 
 def test_command_line_errors_go_to_standard_error_in_spite_of_a_log_file(machine):
-    printed(machine.run("r", "ABC", "-o", "/tmp/log", "-q"), USAGE, status=1,
-            stderr="Invalid option: -q\n")
+    printed(
+        machine.run("r", "ABC", "-o", "/tmp/log", "-q"),
+        USAGE,
+        status=1,
+        stderr="Invalid option: -q\n",
+    )
     same_text(machine.read("/tmp/log"), "")
 
 
@@ -350,8 +476,7 @@ def test_a_log_file_that_cannot_be_opened_costs_the_output_and_nothing_else(mach
 
 
 def test_an_installation_writes_its_whole_progress_to_the_log_file(machine):
-    printed(machine.run("i", "ABC", "-s", SPB, "-o", "/tmp/log"),
-            "SPB file: /media/toolkit.spb\n")
+    printed(machine.run("i", "ABC", "-s", SPB, "-o", "/tmp/log"), "SPB file: /media/toolkit.spb\n")
     log = machine.read("/tmp/log")
     assert log.startswith("ZOR version: 22/12/02zor_9.2.30.0000\nInstall type: global\n")
     assert log.endswith("Installation successful, committing changes\nDone.\n")

@@ -15,10 +15,13 @@ def install(machine, *options, **how):
 
 
 def test_without_selinux_nothing_is_labelled(machine):
-    printed_lines(install(machine), "Extracting configs to '/opt/corvan/zor/config'",
-                  "Exec '/usr/sbin/selinuxenabled >/dev/null 2>&1' returned 32512",
-                  "SELinux not enabled or not supported",
-                  "Customizing property file: /opt/corvan/zor/config/Zor.properties")
+    printed_lines(
+        install(machine),
+        "Extracting configs to '/opt/corvan/zor/config'",
+        "Exec '/usr/sbin/selinuxenabled >/dev/null 2>&1' returned 32512",
+        "SELinux not enabled or not supported",
+        "Customizing property file: /opt/corvan/zor/config/Zor.properties",
+    )
 
 
 def test_with_selinux_the_binaries_are_labelled(machine):
@@ -26,17 +29,24 @@ def test_with_selinux_the_binaries_are_labelled(machine):
 
     outcome = install(machine)
 
-    printed_lines(outcome, "Extracting configs to '/opt/corvan/zor/config'",
-                  "Exec '/usr/sbin/selinuxenabled >/dev/null 2>&1' returned 0",
-                  "Exec '/usr/bin/chcon -R -t texrel_shlib_t /opt/corvan/zor/bin "
-                  ">/dev/null 2>&1' returned 0",
-                  "Customizing property file: /opt/corvan/zor/config/Zor.properties")
+    printed_lines(
+        outcome,
+        "Extracting configs to '/opt/corvan/zor/config'",
+        "Exec '/usr/sbin/selinuxenabled >/dev/null 2>&1' returned 0",
+        "Exec '/usr/bin/chcon -R -t texrel_shlib_t /opt/corvan/zor/bin "
+        ">/dev/null 2>&1' returned 0",
+        "Customizing property file: /opt/corvan/zor/config/Zor.properties",
+    )
     not_printed(outcome, "SELinux not enabled")
-    same_lines(outcome.commands, [
-        "/usr/sbin/selinuxenabled",
-        "/usr/bin/chcon [-R] [-t] [texrel_shlib_t] [/opt/corvan/zor/bin]",
-        "/opt/corvan/zor/bin/trawlcfg [-s] [common_trace_path] "
-        "[/usr/kel/corvan/common/ZOR/logs]"])
+    same_lines(
+        outcome.commands,
+        [
+            "/usr/sbin/selinuxenabled",
+            "/usr/bin/chcon [-R] [-t] [texrel_shlib_t] [/opt/corvan/zor/bin]",
+            "/opt/corvan/zor/bin/trawlcfg [-s] [common_trace_path] "
+            "[/usr/kel/corvan/common/ZOR/logs]",
+        ],
+    )
 
 
 def test_with_selinux_switched_off_nothing_is_labelled(machine):
@@ -44,8 +54,11 @@ def test_with_selinux_switched_off_nothing_is_labelled(machine):
 
     outcome = install(machine)
 
-    printed_lines(outcome, "Exec '/usr/sbin/selinuxenabled >/dev/null 2>&1' returned 256",
-                  "SELinux not enabled or not supported")
+    printed_lines(
+        outcome,
+        "Exec '/usr/sbin/selinuxenabled >/dev/null 2>&1' returned 256",
+        "SELinux not enabled or not supported",
+    )
     not_printed(outcome, "chcon")
 
 
@@ -54,18 +67,25 @@ def test_a_failing_label_costs_nothing(machine):
 
     outcome = install(machine)
 
-    printed_lines(outcome, "Exec '/usr/bin/chcon -R -t texrel_shlib_t /opt/corvan/zor/bin "
-                           ">/dev/null 2>&1' returned 1792",
-                  "Customizing property file: /opt/corvan/zor/config/Zor.properties")
+    printed_lines(
+        outcome,
+        "Exec '/usr/bin/chcon -R -t texrel_shlib_t /opt/corvan/zor/bin "
+        ">/dev/null 2>&1' returned 1792",
+        "Customizing property file: /opt/corvan/zor/config/Zor.properties",
+    )
     not_printed(outcome, "SELinux not enabled")
 
 
 def test_a_per_user_installation_is_labelled_too(machine):
     machine.add_selinux()
 
-    same_lines(install(machine, user=ANN).commands, [
-        "/usr/sbin/selinuxenabled",
-        "/usr/bin/chcon [-R] [-t] [texrel_shlib_t] [/home/ann/corvan/zor/bin]"])
+    same_lines(
+        install(machine, user=ANN).commands,
+        [
+            "/usr/sbin/selinuxenabled",
+            "/usr/bin/chcon [-R] [-t] [texrel_shlib_t] [/home/ann/corvan/zor/bin]",
+        ],
+    )
 
 
 def test_a_failed_extraction_is_labelled_too(machine):
@@ -74,11 +94,14 @@ def test_a_failed_extraction_is_labelled_too(machine):
 
     outcome = machine.run("i", "ABC", "-s", SPB)
 
-    printed_lines(outcome, "File extraction failed, error = 1 (Cannot open file for reading)",
-                  "Exec '/usr/sbin/selinuxenabled >/dev/null 2>&1' returned 0",
-                  "Exec '/usr/bin/chcon -R -t texrel_shlib_t /opt/corvan/zor/bin "
-                  ">/dev/null 2>&1' returned 0",
-                  "Installation failed, rolling back")
+    printed_lines(
+        outcome,
+        "File extraction failed, error = 1 (Cannot open file for reading)",
+        "Exec '/usr/sbin/selinuxenabled >/dev/null 2>&1' returned 0",
+        "Exec '/usr/bin/chcon -R -t texrel_shlib_t /opt/corvan/zor/bin "
+        ">/dev/null 2>&1' returned 0",
+        "Installation failed, rolling back",
+    )
 
 
 def test_debug_mode_shows_what_the_labelling_prints(machine):
@@ -86,20 +109,27 @@ def test_debug_mode_shows_what_the_labelling_prints(machine):
 
     outcome = install(machine, "-v")
 
-    printed_lines(outcome, "scanner control output: ",
-                  "Exec '/usr/sbin/selinuxenabled' returned 0",
-                  "scanner control output: -R -t texrel_shlib_t /opt/corvan/zor/bin",
-                  "Exec '/usr/bin/chcon -R -t texrel_shlib_t /opt/corvan/zor/bin' returned 0")
+    printed_lines(
+        outcome,
+        "scanner control output: ",
+        "Exec '/usr/sbin/selinuxenabled' returned 0",
+        "scanner control output: -R -t texrel_shlib_t /opt/corvan/zor/bin",
+        "Exec '/usr/bin/chcon -R -t texrel_shlib_t /opt/corvan/zor/bin' returned 0",
+    )
 
 
 def test_a_program_with_a_blank_in_its_path_is_quoted(machine):
     outcome = install(machine, "-d", "/opt/my zor")
 
-    printed_lines(outcome,
-                  "Exec '\"/opt/my zor/bin/trawlcfg\" -s common_trace_path "
-                  "/usr/kel/corvan/common/ZOR/logs >/dev/null 2>&1' returned 0")
-    same_lines(outcome.commands, ["/opt/my zor/bin/trawlcfg [-s] [common_trace_path] "
-                                  "[/usr/kel/corvan/common/ZOR/logs]"])
+    printed_lines(
+        outcome,
+        'Exec \'"/opt/my zor/bin/trawlcfg" -s common_trace_path '
+        "/usr/kel/corvan/common/ZOR/logs >/dev/null 2>&1' returned 0",
+    )
+    same_lines(
+        outcome.commands,
+        ["/opt/my zor/bin/trawlcfg [-s] [common_trace_path] [/usr/kel/corvan/common/ZOR/logs]"],
+    )
 
 
 def test_the_directory_to_label_is_not_quoted(machine):
@@ -107,26 +137,34 @@ def test_the_directory_to_label_is_not_quoted(machine):
 
     outcome = install(machine, "-d", "/opt/my zor")
 
-    printed_lines(outcome, "Exec '/usr/bin/chcon -R -t texrel_shlib_t /opt/my zor/bin "
-                           ">/dev/null 2>&1' returned 0")
+    printed_lines(
+        outcome,
+        "Exec '/usr/bin/chcon -R -t texrel_shlib_t /opt/my zor/bin >/dev/null 2>&1' returned 0",
+    )
     assert outcome.commands[1] == "/usr/bin/chcon [-R] [-t] [texrel_shlib_t] [/opt/my] [zor/bin]"
 
 
 def test_a_tab_in_a_path_is_not_quoted(machine):
     outcome = install(machine, "-c", "/var/my\ttrace")
 
-    printed_lines(outcome, "Exec '/opt/corvan/zor/bin/trawlcfg -s common_trace_path "
-                           "/var/my\ttrace >/dev/null 2>&1' returned 0")
-    same_lines(outcome.commands,
-               ["/opt/corvan/zor/bin/trawlcfg [-s] [common_trace_path] [/var/my] [trace]"])
+    printed_lines(
+        outcome,
+        "Exec '/opt/corvan/zor/bin/trawlcfg -s common_trace_path "
+        "/var/my\ttrace >/dev/null 2>&1' returned 0",
+    )
+    same_lines(
+        outcome.commands,
+        ["/opt/corvan/zor/bin/trawlcfg [-s] [common_trace_path] [/var/my] [trace]"],
+    )
 
 
 def test_an_installation_below_a_directory_with_a_blank_is_complete(machine):
     install(machine, "-d", "/opt/my zor")
 
     assert "\nZOR_HomeDirectory = /opt/my zor\n" in machine.read("/etc/zor/zor.ini")
-    assert "\nfscanner.cache_dir=/opt/my zor/cache_data\n" \
-        in machine.read("/opt/my zor/config/Zor.properties")
+    assert "\nfscanner.cache_dir=/opt/my zor/cache_data\n" in machine.read(
+        "/opt/my zor/config/Zor.properties"
+    )
     assert "\n/opt/my zor/bin/trawlcfg\n" in machine.index("/opt/my zor")
 
 
@@ -151,8 +189,11 @@ def test_an_empty_library_path_leaves_its_colon(machine):
 def test_debug_mode_tells_the_library_path(machine):
     outcome = install(machine, "-v", environment={"LD_LIBRARY_PATH": "/x"})
 
-    printed_lines(outcome, "Updating common trace path='/usr/kel/corvan/common' result=0",
-                  "Setting 'LD_LIBRARY_PATH' to 'LD_LIBRARY_PATH=/opt/corvan/zor/bin:/x'")
+    printed_lines(
+        outcome,
+        "Updating common trace path='/usr/kel/corvan/common' result=0",
+        "Setting 'LD_LIBRARY_PATH' to 'LD_LIBRARY_PATH=/opt/corvan/zor/bin:/x'",
+    )
 
 
 def test_without_debug_mode_the_library_path_is_not_told(machine):
@@ -199,9 +240,12 @@ def test_the_status_of_a_command_is_told_undecoded(machine, status):
 
     outcome = machine.run("i", "ABC", "-s", SPB)
 
-    printed_lines(outcome, "Exec '/opt/corvan/zor/bin/trawlcfg -s common_trace_path "
-                           "/usr/kel/corvan/common/ZOR/logs >/dev/null 2>&1' "
-                           f"returned {status * 256}")
+    printed_lines(
+        outcome,
+        "Exec '/opt/corvan/zor/bin/trawlcfg -s common_trace_path "
+        "/usr/kel/corvan/common/ZOR/logs >/dev/null 2>&1' "
+        f"returned {status * 256}",
+    )
 
 
 def test_a_scanner_control_that_cannot_be_executed_has_status_126(machine):
@@ -210,11 +254,15 @@ def test_a_scanner_control_that_cannot_be_executed_has_status_126(machine):
     outcome = machine.run("i", "ABC", "-s", SPB)
 
     assert outcome.status == 1
-    printed_lines(outcome, "Exec '/opt/corvan/zor/bin/trawlcfg -s common_trace_path "
-                           "/usr/kel/corvan/common/ZOR/logs >/dev/null 2>&1' returned 32256")
+    printed_lines(
+        outcome,
+        "Exec '/opt/corvan/zor/bin/trawlcfg -s common_trace_path "
+        "/usr/kel/corvan/common/ZOR/logs >/dev/null 2>&1' returned 32256",
+    )
 
 
 # What a command finds.
+
 
 def test_a_command_finds_the_lines_before_it_in_the_log_file(machine):
     machine.pack({"bin/trawlcfg": b"#!/bin/sh\ncp /tmp/log /var/scanners/log\n"})
@@ -224,7 +272,8 @@ def test_a_command_finds_the_lines_before_it_in_the_log_file(machine):
     assert outcome.status == 0
     found, whole = machine.read("/var/scanners/log"), machine.read("/tmp/log")
     assert found.splitlines()[-1] == (
-        "Updating common trace path='/usr/kel/corvan/common' result=0")
+        "Updating common trace path='/usr/kel/corvan/common' result=0"
+    )
     assert whole.startswith(found + "Exec '/opt/corvan/zor/bin/trawlcfg -s common_trace_path ")
 
 
@@ -232,13 +281,16 @@ def test_a_command_finds_the_lines_before_it_in_the_log_file(machine):
 PIPE_AND_XFSZ = 1 << 12 | 1 << 24
 
 
-@pytest.mark.parametrize("trap, ignored", [("", 0), ("trap '' PIPE XFSZ; ", PIPE_AND_XFSZ)],
-                         ids=["not ignored", "ignored"])
+@pytest.mark.parametrize(
+    "trap, ignored",
+    [("", 0), ("trap '' PIPE XFSZ; ", PIPE_AND_XFSZ)],
+    ids=["not ignored", "ignored"],
+)
 def test_a_command_ignores_the_signals_that_the_caller_ignores(machine, trap, ignored):
     script = b"#!/bin/sh\ngrep SigIgn: /proc/self/status >/var/scanners/mask\n"
     machine.pack({"bin/trawlcfg": script})
 
-    outcome = machine.run_in_shell(trap + "exec \"$0\" \"$@\"", "i", "ABC", "-s", SPB)
+    outcome = machine.run_in_shell(trap + 'exec "$0" "$@"', "i", "ABC", "-s", SPB)
 
     assert outcome.status == 0
     assert int(machine.read("/var/scanners/mask").split()[1], 16) & PIPE_AND_XFSZ == ignored

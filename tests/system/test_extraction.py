@@ -35,12 +35,15 @@ def refused(machine, package):
     outcome = run(machine, package)
 
     assert outcome.status == 1
-    printed_lines(outcome, "Starting file extraction...",
-                  "*** Error: package not found or not valid.",
-                  "Exec '/usr/sbin/selinuxenabled >/dev/null 2>&1' returned 32512",
-                  "SELinux not enabled or not supported",
-                  "Installation failed, rolling back",
-                  "Done.")
+    printed_lines(
+        outcome,
+        "Starting file extraction...",
+        "*** Error: package not found or not valid.",
+        "Exec '/usr/sbin/selinuxenabled >/dev/null 2>&1' returned 32512",
+        "SELinux not enabled or not supported",
+        "Installation failed, rolling back",
+        "Done.",
+    )
     same_tree(machine.tree(), before)
 
 
@@ -51,8 +54,9 @@ SIZES = (1, 2, 4095, 4096, 4097, 8191, 8192, 8193, 16384, 16385, 100_000)
 @pytest.mark.parametrize("kind", ["noise", "text"])
 def test_a_file_of_every_size_arrives_to_its_last_byte(machine, method, kind):
     package = archive()
-    contents = {size: NOISE[:size] if kind == "noise" else (b"abc\n" * 25_000)[:size]
-                for size in SIZES}
+    contents = {
+        size: NOISE[:size] if kind == "noise" else (b"abc\n" * 25_000)[:size] for size in SIZES
+    }
     for size, content in contents.items():
         package.add(f"{IMAGE_ROOT}bin/{size}", content, method)
 
@@ -129,9 +133,17 @@ def test_the_methods_of_the_local_headers_count_when_the_directory_disagrees(mac
     assert machine.read(HOME + "/bin/a") == "stored in truth"
 
 
-@pytest.mark.parametrize("content", [
-    b"", b"PK", b"not an archive at all, but long enough to hold an end record", b"\0" * 100,
-    b"PK\5\6" + b"\0" * 18], ids=["empty", "short", "text", "zeros", "no entry"])
+@pytest.mark.parametrize(
+    "content",
+    [
+        b"",
+        b"PK",
+        b"not an archive at all, but long enough to hold an end record",
+        b"\0" * 100,
+        b"PK\5\6" + b"\0" * 18,
+    ],
+    ids=["empty", "short", "text", "zeros", "no entry"],
+)
 def test_a_file_that_is_no_archive_is_refused(machine, content):
     refused(machine, content)
 
@@ -145,7 +157,7 @@ def test_a_truncated_archive_is_refused(machine):
 def test_an_archive_cut_in_the_middle_of_a_header_is_refused(machine):
     local, offsets = archive().local_part()
 
-    refused(machine, local[:offsets[5] + 20])
+    refused(machine, local[: offsets[5] + 20])
 
 
 def test_a_directory_is_no_package(machine):
@@ -160,8 +172,9 @@ def test_a_package_that_cannot_be_read_is_refused(machine):
 
     outcome = machine.run("i", "ABC", "-s", "/home/ann/toolkit.spb", user=ANN)
 
-    printed_lines(outcome, "Starting file extraction...",
-                  "*** Error: package not found or not valid.")
+    printed_lines(
+        outcome, "Starting file extraction...", "*** Error: package not found or not valid."
+    )
 
 
 def test_a_name_of_2048_bytes_is_accepted(machine):
@@ -201,8 +214,11 @@ def test_an_entry_of_another_method_cannot_be_extracted(machine, method):
     outcome = run(machine, package)
 
     assert outcome.status == 1
-    printed_lines(outcome, "Bin dir file extraction failed",
-                  "File extraction failed, error = 1 (Cannot open file for reading)")
+    printed_lines(
+        outcome,
+        "Bin dir file extraction failed",
+        "File extraction failed, error = 1 (Cannot open file for reading)",
+    )
 
 
 def test_an_entry_of_another_method_outside_of_the_package_directories_does_no_harm(machine):
@@ -216,8 +232,11 @@ def test_an_entry_with_one_size_of_0_cannot_be_extracted(machine, field):
     outcome = run(machine, package)
 
     assert outcome.status == 1
-    printed_lines(outcome, "Starting file extraction...",
-                  "File extraction failed, error = 1 (Cannot open file for reading)")
+    printed_lines(
+        outcome,
+        "Starting file extraction...",
+        "File extraction failed, error = 1 (Cannot open file for reading)",
+    )
 
 
 def test_a_stored_entry_with_too_large_a_size_reads_on_into_the_archive(machine):
@@ -233,8 +252,14 @@ def test_a_stored_entry_with_too_large_a_size_reads_on_into_the_archive(machine)
 def test_damaged_deflated_data_lose_the_block_in_which_the_damage_is(machine):
     # An intact stored block of five bytes, then a block of a kind that does not exist.
     damaged = b"\x00\x05\x00\xfa\xffhello" + b"\x07" + b"junk"
-    package = archive().add(IMAGE_ROOT + "bin/damaged", b"", DEFLATED, packed=damaged,
-                            packed_size=len(damaged), size=100)
+    package = archive().add(
+        IMAGE_ROOT + "bin/damaged",
+        b"",
+        DEFLATED,
+        packed=damaged,
+        packed_size=len(damaged),
+        size=100,
+    )
 
     install(machine, package)
 
@@ -242,10 +267,16 @@ def test_damaged_deflated_data_lose_the_block_in_which_the_damage_is(machine):
 
 
 def test_deflated_data_damaged_behind_a_whole_block_keep_that_block(machine):
-    header = b"\x00" + (12000).to_bytes(2, "little") + (12000 ^ 0xffff).to_bytes(2, "little")
+    header = b"\x00" + (12000).to_bytes(2, "little") + (12000 ^ 0xFFFF).to_bytes(2, "little")
     damaged = header + NOISE[:12000] + b"\x07" + b"junk"
-    package = archive().add(IMAGE_ROOT + "bin/damaged", b"", DEFLATED, packed=damaged,
-                            packed_size=len(damaged), size=13000)
+    package = archive().add(
+        IMAGE_ROOT + "bin/damaged",
+        b"",
+        DEFLATED,
+        packed=damaged,
+        packed_size=len(damaged),
+        size=13000,
+    )
 
     install(machine, package)
 
@@ -267,9 +298,12 @@ def test_deflated_data_longer_than_recorded_abort_the_installer(machine):
     outcome = run(machine, package)
 
     assert outcome.status == 134
-    same_text(outcome.stderr, "wzorinst: zip_file:432: "
-              "virtual int X__DeflatedInputStream::read(char*, int): "
-              "Assertion `available_ >= (unsigned) result' failed.\n")
+    same_text(
+        outcome.stderr,
+        "wzorinst: zip_file:432: "
+        "virtual int X__DeflatedInputStream::read(char*, int): "
+        "Assertion `available_ >= (unsigned) result' failed.\n",
+    )
 
 
 def test_an_aborted_installation_leaves_what_it_had_done(machine):
@@ -291,9 +325,13 @@ def test_an_abort_loses_no_trace_line(machine):
     assert outcome.stdout.endswith("\nextractFile: /opt/corvan/zor/bin/zz\n")
 
 
-@pytest.mark.parametrize("entry, last_line", [
-    ("bin/zz", "Starting file extraction..."),
-    ("config/zz", "Extracting configs to '/opt/corvan/zor/config'")])
+@pytest.mark.parametrize(
+    "entry, last_line",
+    [
+        ("bin/zz", "Starting file extraction..."),
+        ("config/zz", "Extracting configs to '/opt/corvan/zor/config'"),
+    ],
+)
 def test_an_abort_loses_no_line_of_the_log_file(machine, entry, last_line):
     package = archive().add(IMAGE_ROOT + entry, b"0123456789", DEFLATED, size=9)
 
@@ -302,9 +340,17 @@ def test_an_abort_loses_no_line_of_the_log_file(machine, entry, last_line):
     assert machine.read("/tmp/log").splitlines()[-1] == last_line
 
 
-@pytest.mark.parametrize("root", [
-    "", "images/linux-ix86/", IMAGE_ROOT.replace("linux-ix86", "aix4-r1"),
-    IMAGE_ROOT[1:], "/x" + IMAGE_ROOT, IMAGE_ROOT.upper()])
+@pytest.mark.parametrize(
+    "root",
+    [
+        "",
+        "images/linux-ix86/",
+        IMAGE_ROOT.replace("linux-ix86", "aix4-r1"),
+        IMAGE_ROOT[1:],
+        "/x" + IMAGE_ROOT,
+        IMAGE_ROOT.upper(),
+    ],
+)
 def test_names_without_the_image_root_of_this_platform_are_ignored(machine, root):
     package = archive()
     for entry in package.entries:
@@ -315,13 +361,17 @@ def test_names_without_the_image_root_of_this_platform_are_ignored(machine, root
     # The extraction succeeds; what fails is the property file that it did not bring.
     assert outcome.status == 1
     not_printed(outcome, "File extraction failed")
-    printed_lines(outcome, "Customizing property file: /opt/corvan/zor/config/Zor.properties",
-                  "Loading file /opt/corvan/zor/config/Zor.properties error: 2 "
-                  "(No such file or directory)")
+    printed_lines(
+        outcome,
+        "Customizing property file: /opt/corvan/zor/config/Zor.properties",
+        "Loading file /opt/corvan/zor/config/Zor.properties error: 2 "
+        "(No such file or directory)",
+    )
 
 
-@pytest.mark.parametrize("name", ["doc/readme", "readme", "bin", "binary/x", "Bin/x",
-                                  "uninstall/x", "config"])
+@pytest.mark.parametrize(
+    "name", ["doc/readme", "readme", "bin", "binary/x", "Bin/x", "uninstall/x", "config"]
+)
 def test_entries_outside_of_the_package_directories_are_ignored(machine, name):
     install(machine)
     expected = sorted(machine.tree(HOME))
@@ -367,8 +417,17 @@ def test_names_with_blanks_and_odd_bytes_arrive(machine):
 
 
 def test_subdirectories_are_extracted_by_the_step_of_their_parent(machine):
-    install(machine, archive({"bin/plugins/": b"", "bin/plugins/a.so": b"1",
-                              "install/linux/": b"", "install/linux/b": b"2"}))
+    install(
+        machine,
+        archive(
+            {
+                "bin/plugins/": b"",
+                "bin/plugins/a.so": b"1",
+                "install/linux/": b"",
+                "install/linux/b": b"2",
+            }
+        ),
+    )
 
     assert machine.read(HOME + "/bin/plugins/a.so") == "1"
     assert machine.mode(HOME + "/bin/plugins/a.so") == 0o755
@@ -380,17 +439,30 @@ def test_a_file_ahead_of_its_directory_cannot_be_written(machine):
     outcome = run(machine, archive({"bin/sub/file": b"x", "bin/sub/": b""}))
 
     assert outcome.status == 1
-    printed_lines(outcome, "Bin dir file extraction failed",
-                  "File extraction failed, error = 2 (Cannot open file for writing)")
+    printed_lines(
+        outcome,
+        "Bin dir file extraction failed",
+        "File extraction failed, error = 2 (Cannot open file for writing)",
+    )
 
 
-@pytest.mark.parametrize("failing, extracted", [
-    ("bin", []), ("properties", ["bin"]), ("config", ["bin", "properties"]),
-    ("install", ["bin", "config", "properties"])])
+@pytest.mark.parametrize(
+    "failing, extracted",
+    [
+        ("bin", []),
+        ("properties", ["bin"]),
+        ("config", ["bin", "properties"]),
+        ("install", ["bin", "config", "properties"]),
+    ],
+)
 def test_the_package_directories_are_extracted_in_a_fixed_order(machine, failing, extracted):
     package = archive()
-    package.entries.sort(key=lambda entry: (
-        "/" + failing + "/" not in entry.name.decode(), b"/install/" not in entry.name))
+    package.entries.sort(
+        key=lambda entry: (
+            "/" + failing + "/" not in entry.name.decode(),
+            b"/install/" not in entry.name,
+        )
+    )
     package.entries.insert(0, archive({failing + "/empty": b""}).entries[-1])
 
     run(machine, package, "-norollback")
@@ -424,8 +496,11 @@ def test_a_link_to_itself_in_the_way_of_a_file_cannot_be_replaced(machine):
     outcome = run(machine)
 
     assert outcome.status == 1
-    printed_lines(outcome, "Bin dir file extraction failed",
-                  "File extraction failed, error = 2 (Cannot open file for writing)")
+    printed_lines(
+        outcome,
+        "Bin dir file extraction failed",
+        "File extraction failed, error = 2 (Cannot open file for writing)",
+    )
     assert machine.tree(HOME + "/bin/trawlhw")[HOME + "/bin/trawlhw"].content == b"trawlhw"
 
 
@@ -433,8 +508,11 @@ def test_a_name_that_the_file_system_does_not_take_cannot_be_written(machine):
     outcome = run(machine, archive({"bin/" + "n" * 300: b"content"}))
 
     assert outcome.status == 1
-    printed_lines(outcome, "Bin dir file extraction failed",
-                  "File extraction failed, error = 2 (Cannot open file for writing)")
+    printed_lines(
+        outcome,
+        "Bin dir file extraction failed",
+        "File extraction failed, error = 2 (Cannot open file for writing)",
+    )
     assert not machine.exists(HOME)
 
 
@@ -443,9 +521,12 @@ def test_without_an_index_the_installation_goes_on(machine):
 
     outcome = install(machine)
 
-    printed_lines(outcome, "Starting file extraction...",
-                  "Warning! Failed to create install log file: /opt/corvan/zor/ZOR_files",
-                  "Extracting configs to '/opt/corvan/zor/config'")
+    printed_lines(
+        outcome,
+        "Starting file extraction...",
+        "Warning! Failed to create install log file: /opt/corvan/zor/ZOR_files",
+        "Extracting configs to '/opt/corvan/zor/config'",
+    )
     assert machine.tree(HOME)[HOME + "/ZOR_files"].kind == "d"
     assert machine.exists("/etc/zor/zor.ini")
 
@@ -473,11 +554,28 @@ def test_the_paths_of_the_index_are_ordered_as_unsigned_bytes(machine):
 
     install(machine, package)
 
-    lines = [line for line in machine.read_bytes(HOME + "/ZOR_files").splitlines()
-             if line.startswith(b"/opt/corvan/zor/bin/")]
-    assert lines == [b"/opt/corvan/zor/bin/" + name for name in (
-        b"\x01", b"A", b"a", b"a b", b"a-b", b"libzor.so", b"libzorcore.so", b"trawlcfg",
-        b"trawlfs", b"trawlhw", b"z", b"\xff")]
+    lines = [
+        line
+        for line in machine.read_bytes(HOME + "/ZOR_files").splitlines()
+        if line.startswith(b"/opt/corvan/zor/bin/")
+    ]
+    assert lines == [
+        b"/opt/corvan/zor/bin/" + name
+        for name in (
+            b"\x01",
+            b"A",
+            b"a",
+            b"a b",
+            b"a-b",
+            b"libzor.so",
+            b"libzorcore.so",
+            b"trawlcfg",
+            b"trawlfs",
+            b"trawlhw",
+            b"z",
+            b"\xff",
+        )
+    ]
 
 
 def test_the_index_of_a_home_with_a_final_slash_has_the_plain_join(machine):
@@ -485,6 +583,11 @@ def test_the_index_of_a_home_with_a_final_slash_has_the_plain_join(machine):
 
     assert outcome.status == 0
     index = machine.index("/opt/x")
-    for line in ("/opt/x/bin/libzor.so", "/opt/x/config/Zor.tmp", "/opt/x/zor.log",
-                 "/opt/x/zor.log.bak", "/opt/x/bin/trawlcfg"):
+    for line in (
+        "/opt/x/bin/libzor.so",
+        "/opt/x/config/Zor.tmp",
+        "/opt/x/zor.log",
+        "/opt/x/zor.log.bak",
+        "/opt/x/bin/trawlcfg",
+    ):
         assert f"\n{line}\n" in index

@@ -30,8 +30,11 @@ def laboratory(binary):
 def point_on(bench, kind, path, number=-1):
     """The point of `kind` on `path` with this number, the last by default, before the modes of the
     tree are set."""
-    return [point for point in bench.points
-            if point.kind == kind and point.path == path and not point.late][number]
+    return [
+        point
+        for point in bench.points
+        if point.kind == kind and point.path == path and not point.late
+    ][number]
 
 
 def fail(bench, kind, path, error, number=-1):
@@ -67,6 +70,7 @@ def test_a_registry_that_cannot_be_looked_at_is_not_overwritten_without_a_backup
 
 # A removal that was killed. The second run refuses, because the scanner control is gone.
 
+
 def kill_removal_before(bench, path):
     restore(bench.spare, bench.before)
     failure_points.run_killed(bench.scenario, bench.spare, point_on(bench, "unlink", path))
@@ -80,7 +84,8 @@ def run(machine, *arguments):
 
 
 def test_a_removal_killed_before_the_settings_went_is_finished_by_a_repair_and_a_removal(
-        laboratory):
+    laboratory,
+):
     bench = sweep.Bench(laboratory, SCENARIOS["remove"])
     kill_removal_before(bench, SETTINGS)
 
@@ -92,7 +97,8 @@ def test_a_removal_killed_before_the_settings_went_is_finished_by_a_repair_and_a
 
 
 def test_a_removal_killed_after_the_settings_went_is_finished_once_its_registry_is_deleted(
-        laboratory):
+    laboratory,
+):
     bench = sweep.Bench(laboratory, SCENARIOS["remove"])
     kill_removal_before(bench, HOME + "/config/ZorHWConfig.xml")
 
@@ -107,8 +113,10 @@ def test_a_removal_killed_after_the_settings_went_is_finished_once_its_registry_
 
 # New content that was not renamed when its run was killed.
 
-NEW_CONTENTS = [path + ".wzorinst-new" for path in (
-    REGISTRY, COMMON_SETTING, INDEX, SETTINGS, TRACE_SETTINGS, *SCRIPTS, INSTALL_TYPE)]
+NEW_CONTENTS = [
+    path + ".wzorinst-new"
+    for path in (REGISTRY, COMMON_SETTING, INDEX, SETTINGS, TRACE_SETTINGS, *SCRIPTS, INSTALL_TYPE)
+]
 
 
 def test_the_last_removal_deletes_what_killed_runs_had_not_renamed(machine):

@@ -67,33 +67,41 @@ def test_the_index_lists_the_packages_files_and_the_installers_own(machine):
 def test_the_registry_holds_the_installation(machine):
     install(machine)
 
-    same_text(machine.read("/etc/zor/zor.ini"), """\
+    same_text(
+        machine.read("/etc/zor/zor.ini"),
+        """\
 ZOR_Version = 9.2.30.0000
 ZOR_BuildDate = 22/12/02
 ZOR_HomeDirectory = /opt/corvan/zor
 ZOR_Exploiters = ABC:
 ZOR_ConfigRootDirectory = /opt/corvan/zor
-""")
+""",
+    )
 
 
 def test_the_setting_of_the_common_directory_is_written(machine):
     install(machine)
 
-    same_text(machine.read("/etc/kel/corvan/common/cfg/log.properties"),
-              "corvan_common_dir=/usr/kel/corvan/common\n")
+    same_text(
+        machine.read("/etc/kel/corvan/common/cfg/log.properties"),
+        "corvan_common_dir=/usr/kel/corvan/common\n",
+    )
 
 
 def test_the_install_type_of_a_shared_installation_is_recorded(machine):
     install(machine)
 
-    same_text(machine.read("/opt/corvan/zor/install/zor_install.properties"),
-              "ZOR_InstallType=global\n")
+    same_text(
+        machine.read("/opt/corvan/zor/install/zor_install.properties"), "ZOR_InstallType=global\n"
+    )
 
 
 def test_the_main_property_file_is_filled_in(machine):
     install(machine)
 
-    same_text(machine.read("/opt/corvan/zor/config/Zor.properties"), """\
+    same_text(
+        machine.read("/opt/corvan/zor/config/Zor.properties"),
+        """\
 # Settings of the toolkit
 version=9.2.30.0000
 build_date=22/12/02
@@ -105,46 +113,62 @@ fscanner.default_provider=provider_cache
 fscanner.cache_dir=/opt/corvan/zor/cache_data
 common_dir=$(CorvanCommonDir)
 two=/opt/corvan/zor:/opt/corvan/zor
-""")
+""",
+    )
 
 
 def test_the_trace_property_file_is_filled_in(machine):
     install(machine)
 
-    same_text(machine.read("/opt/corvan/zor/config/ZorTrace.properties"), """\
+    same_text(
+        machine.read("/opt/corvan/zor/config/ZorTrace.properties"),
+        """\
 handlers.traceFile.fileName=/opt/corvan/zor/logs/default.log
 zor.loggers.trcLogger.level=DEBUG_MIN
 config.root=/opt/corvan/zor
 unknown=$(NoSuchPlaceholder)
 separator=$(FileSeparator)
-""")
+""",
+    )
 
 
 def test_the_scripts_are_filled_in(machine):
     install(machine)
 
-    same_text(machine.read("/opt/corvan/zor/install/trawlcfg.sh"), """\
+    same_text(
+        machine.read("/opt/corvan/zor/install/trawlcfg.sh"),
+        """\
 #!/bin/sh
 ZOR_HOME=/opt/corvan/zor
 PAIR=/opt/corvan/zor:/opt/corvan/zor
 ZOR_CONFIG=/opt/corvan/zor
 COMMON=/usr/kel/corvan/common
 OTHER=$(NoSuchPlaceholder)
-""")
-    same_text(machine.read("/opt/corvan/zor/install/rmdirs.sh"), """\
+""",
+    )
+    same_text(
+        machine.read("/opt/corvan/zor/install/rmdirs.sh"),
+        """\
 #!/bin/sh
 rmdir "/opt/corvan/zor/cache_data" "/usr/kel/corvan/common/ZOR"
-""")
+""",
+    )
 
 
 def test_the_toolkit_is_told_its_trace_directory_once(machine):
-    same_lines(install(machine).commands, [
-        "/opt/corvan/zor/bin/trawlcfg [-s] [common_trace_path] "
-        "[/usr/kel/corvan/common/ZOR/logs]"])
+    same_lines(
+        install(machine).commands,
+        [
+            "/opt/corvan/zor/bin/trawlcfg [-s] [common_trace_path] "
+            "[/usr/kel/corvan/common/ZOR/logs]"
+        ],
+    )
 
 
 def test_a_per_user_installation_prints_its_progress(machine):
-    printed(machine.run("i", "ABC", "-s", SPB, user=ANN), """\
+    printed(
+        machine.run("i", "ABC", "-s", SPB, user=ANN),
+        """\
 SPB file: /media/toolkit.spb
 ZOR version: 22/12/02zor_9.2.30.0000
 Install type: local
@@ -171,7 +195,8 @@ Updating: /home/ann/corvan/zor/install/rmdirs.sh
 Saving INI file to /home/ann/.zor/zor.ini
 Installation successful, committing changes
 Done.
-""")
+""",
+    )
 
 
 def test_a_per_user_installation_makes_its_tree(machine):
@@ -183,20 +208,25 @@ def test_a_per_user_installation_makes_its_tree(machine):
 def test_a_per_user_installation_is_registered_in_the_home_directory(machine):
     install(machine, user=ANN)
 
-    same_text(machine.read("/home/ann/.zor/zor.ini"), """\
+    same_text(
+        machine.read("/home/ann/.zor/zor.ini"),
+        """\
 ZOR_Version = 9.2.30.0000
 ZOR_BuildDate = 22/12/02
 ZOR_HomeDirectory = /home/ann/corvan/zor
 ZOR_Exploiters = ABC:
 ZOR_ConfigRootDirectory = /home/ann/corvan/zor
-""")
+""",
+    )
 
 
 def test_the_install_type_of_a_per_user_installation_is_recorded(machine):
     install(machine, user=ANN)
 
-    same_text(machine.read("/home/ann/corvan/zor/install/zor_install.properties"),
-              "ZOR_InstallType=local\n")
+    same_text(
+        machine.read("/home/ann/corvan/zor/install/zor_install.properties"),
+        "ZOR_InstallType=local\n",
+    )
 
 
 def test_a_per_user_installation_never_runs_the_scanner_control(machine):
@@ -215,7 +245,9 @@ def test_a_per_user_installation_needs_nothing_of_the_shared_places(machine):
 def test_a_per_user_installation_of_root_writes_the_setting_of_the_common_directory(machine):
     install(machine, "-eeo", "-l")
 
-    same_text(machine.listing("/etc", "/opt"), """\
+    same_text(
+        machine.listing("/etc", "/opt"),
+        """\
 d 0755 /etc
 d 0775 /etc/kel
 d 0775 /etc/kel/corvan
@@ -223,7 +255,8 @@ d 0775 /etc/kel/corvan/common
 d 0775 /etc/kel/corvan/common/cfg
 f 0664 /etc/kel/corvan/common/cfg/log.properties
 d 0755 /opt
-""")
+""",
+    )
     assert not machine.exists("/usr/kel")
 
 
@@ -231,18 +264,23 @@ def test_a_per_user_installation_of_root_ends_with_a_closed_cache_directory(mach
     install(machine, "-eeo", "-l")
 
     assert machine.mode("/root/corvan/zor/cache_data") == 0o770
-    assert machine.read("/root/corvan/zor/install/zor_install.properties") \
-        == "ZOR_InstallType=local\n"
+    assert (
+        machine.read("/root/corvan/zor/install/zor_install.properties") == "ZOR_InstallType=local\n"
+    )
 
 
 def test_a_user_without_a_home_directory_installs_into_the_shared_places_if_allowed(machine):
     outcome = install(machine, user=STRANGER, everywhere=True)
 
-    printed_lines(outcome, "Saving INI file to /etc/zor/zor.ini",
-                  "Installation successful, committing changes")
+    printed_lines(
+        outcome,
+        "Saving INI file to /etc/zor/zor.ini",
+        "Installation successful, committing changes",
+    )
     assert machine.mode("/opt/corvan/zor/cache_data") == 0o770
-    assert machine.read("/opt/corvan/zor/install/zor_install.properties") \
-        == "ZOR_InstallType=local\n"
+    assert (
+        machine.read("/opt/corvan/zor/install/zor_install.properties") == "ZOR_InstallType=local\n"
+    )
 
 
 def test_a_user_without_rights_to_the_shared_places_fails_and_leaves_nothing(machine):
@@ -251,10 +289,13 @@ def test_a_user_without_rights_to_the_shared_places_fails_and_leaves_nothing(mac
     outcome = machine.run("i", "ABC", "-s", SPB, "-eeo", "-g", user=ANN)
 
     assert outcome.status == 1
-    printed_lines(outcome, "Starting file extraction...",
-                  "Warning! Failed to create install log file: /opt/corvan/zor/ZOR_files",
-                  "Bin dir file extraction failed",
-                  "File extraction failed, error = 11 (Cannot create directory)")
+    printed_lines(
+        outcome,
+        "Starting file extraction...",
+        "Warning! Failed to create install log file: /opt/corvan/zor/ZOR_files",
+        "Bin dir file extraction failed",
+        "File extraction failed, error = 11 (Cannot create directory)",
+    )
     printed_lines(outcome, "Installation failed, rolling back", "Done.")
     assert machine.tree() == before
 
@@ -274,8 +315,9 @@ def test_a_given_directory_is_made_with_its_parents(machine):
     assert machine.mode("/opt/a/b/c") == 0o755
     assert "\nZOR_HomeDirectory = /opt/a/b/c\n" in machine.read("/etc/zor/zor.ini")
     assert "\nZOR_ConfigRootDirectory = /opt/a/b/c\n" in machine.read("/etc/zor/zor.ini")
-    assert "\nfscanner.cache_dir=/opt/a/b/c/cache_data\n" \
-        in machine.read("/opt/a/b/c/config/Zor.properties")
+    assert "\nfscanner.cache_dir=/opt/a/b/c/cache_data\n" in machine.read(
+        "/opt/a/b/c/config/Zor.properties"
+    )
 
 
 def test_the_mode_of_a_home_directory_that_was_there_is_kept(machine):
@@ -324,21 +366,29 @@ def test_a_backup_of_a_file_that_is_not_replaced_stays(machine):
 
 
 def test_an_unsound_registry_is_replaced_and_nothing_of_it_stays(machine):
-    machine.plant("/etc/zor/zor.ini", "ZOR_Exploiters = OLD:\nZOR_ConfigRootDirectory = /old\n"
-                                      "ZOR_BuildDate = 99/01/01\nZOR_HomeDirectory = /old\n"
-                                      "ZOR_Version = 7.x\n", 0o600)
+    machine.plant(
+        "/etc/zor/zor.ini",
+        "ZOR_Exploiters = OLD:\nZOR_ConfigRootDirectory = /old\n"
+        "ZOR_BuildDate = 99/01/01\nZOR_HomeDirectory = /old\n"
+        "ZOR_Version = 7.x\n",
+        0o600,
+    )
 
     outcome = install(machine)
 
-    printed_lines(outcome, "INI file not found or outdated (code=3)",
-                  "Log file is: /opt/corvan/zor/ZOR_files")
-    same_text(machine.read("/etc/zor/zor.ini"), """\
+    printed_lines(
+        outcome, "INI file not found or outdated (code=3)", "Log file is: /opt/corvan/zor/ZOR_files"
+    )
+    same_text(
+        machine.read("/etc/zor/zor.ini"),
+        """\
 ZOR_Version = 9.2.30.0000
 ZOR_BuildDate = 22/12/02
 ZOR_HomeDirectory = /opt/corvan/zor
 ZOR_Exploiters = ABC:
 ZOR_ConfigRootDirectory = /opt/corvan/zor
-""")
+""",
+    )
     assert machine.mode("/etc/zor/zor.ini") == 0o644
     assert not machine.exists("/etc/zor/zor.ini.bak")
 
@@ -355,11 +405,14 @@ def test_missing_scripts_are_told_and_cost_nothing(machine):
 
     outcome = install(machine)
 
-    printed_lines(outcome, "Updating file with variables /opt/corvan/zor/install/trawlcfg.sh",
-                  "Script does not exist /opt/corvan/zor/install/trawlcfg.sh",
-                  "Updating file with variables /opt/corvan/zor/install/rmdirs.sh",
-                  "Script does not exist /opt/corvan/zor/install/rmdirs.sh",
-                  "Saving INI file to /etc/zor/zor.ini")
+    printed_lines(
+        outcome,
+        "Updating file with variables /opt/corvan/zor/install/trawlcfg.sh",
+        "Script does not exist /opt/corvan/zor/install/trawlcfg.sh",
+        "Updating file with variables /opt/corvan/zor/install/rmdirs.sh",
+        "Script does not exist /opt/corvan/zor/install/rmdirs.sh",
+        "Saving INI file to /etc/zor/zor.ini",
+    )
 
 
 def test_an_install_type_file_that_cannot_be_written_costs_nothing(machine):
@@ -367,9 +420,12 @@ def test_an_install_type_file_that_cannot_be_written_costs_nothing(machine):
 
     outcome = install(machine)
 
-    printed_lines(outcome, "Saving INI file to /etc/zor/zor.ini",
-                  "Could not create file /opt/corvan/zor/install/zor_install.properties",
-                  "Created Corvan Common Dir='/usr/kel/corvan/common' result=0")
+    printed_lines(
+        outcome,
+        "Saving INI file to /etc/zor/zor.ini",
+        "Could not create file /opt/corvan/zor/install/zor_install.properties",
+        "Created Corvan Common Dir='/usr/kel/corvan/common' result=0",
+    )
     assert "zor_install.properties\n" not in machine.index("/opt/corvan/zor")
 
 
@@ -379,8 +435,10 @@ def test_the_install_directory_is_made_when_the_package_has_none(machine):
     install(machine, user=ANN)
 
     assert machine.mode("/home/ann/corvan/zor/install") == 0o750
-    assert machine.read("/home/ann/corvan/zor/install/zor_install.properties") \
+    assert (
+        machine.read("/home/ann/corvan/zor/install/zor_install.properties")
         == "ZOR_InstallType=local\n"
+    )
 
 
 def test_an_existing_common_directory_and_log_directory_are_used_as_they_are(machine):
@@ -388,29 +446,39 @@ def test_an_existing_common_directory_and_log_directory_are_used_as_they_are(mac
 
     outcome = install(machine)
 
-    printed_lines(outcome, "Created Corvan Common Dir='/usr/kel/corvan/common' result=0",
-                  "Updating common trace path='/usr/kel/corvan/common' result=0")
+    printed_lines(
+        outcome,
+        "Created Corvan Common Dir='/usr/kel/corvan/common' result=0",
+        "Updating common trace path='/usr/kel/corvan/common' result=0",
+    )
     not_printed(outcome, "Setting logs dir=")
     assert machine.mode("/usr/kel/corvan/common/ZOR/logs") == 0o700
 
 
 def test_a_common_directory_of_the_administrators_choice_is_used(machine):
-    machine.plant("/etc/kel/corvan/common/cfg/log.properties", "corvan_common_dir = /opt/c d \n",
-                  0o600)
+    machine.plant(
+        "/etc/kel/corvan/common/cfg/log.properties", "corvan_common_dir = /opt/c d \n", 0o600
+    )
 
     outcome = install(machine)
 
     printed_lines(
-        outcome, "Created Corvan Common Dir='/opt/c d' result=0",
+        outcome,
+        "Created Corvan Common Dir='/opt/c d' result=0",
         "Setting logs dir='/opt/c d/ZOR/logs'",
         "Updating common trace path='/opt/c d' result=0",
-        "Exec '/opt/corvan/zor/bin/trawlcfg -s common_trace_path \"/opt/c d/ZOR/logs\" "
+        'Exec \'/opt/corvan/zor/bin/trawlcfg -s common_trace_path "/opt/c d/ZOR/logs" '
         ">/dev/null 2>&1' returned 0",
-        "Setting common trace path='/opt/c d/ZOR/logs' result=0")
-    same_lines(outcome.commands,
-               ["/opt/corvan/zor/bin/trawlcfg [-s] [common_trace_path] [/opt/c d/ZOR/logs]"])
-    assert machine.read("/etc/kel/corvan/common/cfg/log.properties") \
+        "Setting common trace path='/opt/c d/ZOR/logs' result=0",
+    )
+    same_lines(
+        outcome.commands,
+        ["/opt/corvan/zor/bin/trawlcfg [-s] [common_trace_path] [/opt/c d/ZOR/logs]"],
+    )
+    assert (
+        machine.read("/etc/kel/corvan/common/cfg/log.properties")
         == "corvan_common_dir = /opt/c d \n"
+    )
     assert machine.mode("/etc/kel/corvan/common/cfg/log.properties") == 0o600
     assert "\nCOMMON=/opt/c d\n" in machine.read("/opt/corvan/zor/install/trawlcfg.sh")
     assert not machine.exists("/usr/kel")
@@ -421,9 +489,12 @@ def test_a_common_directory_that_cannot_be_made_costs_nothing(machine):
 
     outcome = install(machine)
 
-    printed_lines(outcome, "Created Corvan Common Dir='/usr/kel/corvan/common' result=11",
-                  "Setting logs dir='/usr/kel/corvan/common/ZOR/logs'",
-                  "Updating common trace path='/usr/kel/corvan/common' result=0")
+    printed_lines(
+        outcome,
+        "Created Corvan Common Dir='/usr/kel/corvan/common' result=11",
+        "Setting logs dir='/usr/kel/corvan/common/ZOR/logs'",
+        "Updating common trace path='/usr/kel/corvan/common' result=0",
+    )
     printed_lines(outcome, "Installation successful, committing changes")
 
 
@@ -436,12 +507,26 @@ def test_a_setting_file_that_cannot_be_written_costs_nothing(machine):
     assert machine.read("/etc/kel") == "a file"
 
 
-@pytest.mark.parametrize("path, mode", [
-    ("bin/customscanners", 0o777), ("bin/etc", 0o777), ("bin/etc/trawlfs", 0o777),
-    ("bin/etc/trawlhw", 0o777), ("bin/etc/trawlvpd", 0o777), ("bin/etc/trawlsw", 0o777),
-    ("bin/etc/trawlcfg", 0o777), ("bin/plugins", 0o755), ("logs", 0o777), ("_uninst", 0o750),
-    ("cache_data", 0o777), ("config", 0o755), ("config/xss", 0o755), ("bin", 0o755),
-    ("install", 0o750)])
+@pytest.mark.parametrize(
+    "path, mode",
+    [
+        ("bin/customscanners", 0o777),
+        ("bin/etc", 0o777),
+        ("bin/etc/trawlfs", 0o777),
+        ("bin/etc/trawlhw", 0o777),
+        ("bin/etc/trawlvpd", 0o777),
+        ("bin/etc/trawlsw", 0o777),
+        ("bin/etc/trawlcfg", 0o777),
+        ("bin/plugins", 0o755),
+        ("logs", 0o777),
+        ("_uninst", 0o750),
+        ("cache_data", 0o777),
+        ("config", 0o755),
+        ("config/xss", 0o755),
+        ("bin", 0o755),
+        ("install", 0o750),
+    ],
+)
 def test_the_permission_pass_sets_the_mode_of_a_directory_that_was_there(machine, path, mode):
     machine.make_directory("/opt/corvan/zor/" + path, 0o711)
 
@@ -450,11 +535,18 @@ def test_the_permission_pass_sets_the_mode_of_a_directory_that_was_there(machine
     assert machine.mode("/opt/corvan/zor/" + path) == mode
 
 
-@pytest.mark.parametrize("path, mode", [
-    ("install/trawlcfg.sh", 0o750), ("config/ZorHWConfig.xml", 0o644),
-    ("config/Zor.properties", 0o644), ("config/ZorTrace.properties", 0o644)])
+@pytest.mark.parametrize(
+    "path, mode",
+    [
+        ("install/trawlcfg.sh", 0o750),
+        ("config/ZorHWConfig.xml", 0o644),
+        ("config/Zor.properties", 0o644),
+        ("config/ZorTrace.properties", 0o644),
+    ],
+)
 def test_the_permission_pass_sets_the_mode_of_a_file_that_the_package_does_not_carry(
-        machine, path, mode):
+    machine, path, mode
+):
     machine.pack(without=(path,))
     machine.plant("/opt/corvan/zor/" + path, "text\n", 0o604)
 
@@ -463,8 +555,10 @@ def test_the_permission_pass_sets_the_mode_of_a_file_that_the_package_does_not_c
     assert machine.mode("/opt/corvan/zor/" + path) == mode
 
 
-@pytest.mark.parametrize("path, mode", [
-    ("logs", 0o777), ("_uninst", 0o750), ("bin/plugins", 0o755), ("bin/customscanners", 0o777)])
+@pytest.mark.parametrize(
+    "path, mode",
+    [("logs", 0o777), ("_uninst", 0o750), ("bin/plugins", 0o755), ("bin/customscanners", 0o777)],
+)
 def test_the_permission_pass_takes_files_as_well(machine, path, mode):
     machine.plant("/opt/corvan/zor/" + path, "text", 0o600)
 
@@ -494,12 +588,16 @@ def test_a_mode_that_cannot_be_changed_is_told_and_costs_nothing(machine):
     machine.make_directory("/media/logs")
     machine.make_directory("/opt/corvan/zor/logs")
 
-    outcome = install(machine, options=(
-        "--ro-bind", machine.at("/media/logs"), "/opt/corvan/zor/logs"))
+    outcome = install(
+        machine, options=("--ro-bind", machine.at("/media/logs"), "/opt/corvan/zor/logs")
+    )
 
-    printed_lines(outcome, "Installation successful, committing changes",
-                  "Unable to change permissions to '/opt/corvan/zor/logs' file/directory",
-                  "Done.")
+    printed_lines(
+        outcome,
+        "Installation successful, committing changes",
+        "Unable to change permissions to '/opt/corvan/zor/logs' file/directory",
+        "Done.",
+    )
 
 
 def test_the_permission_pass_goes_on_behind_a_mode_that_cannot_be_changed(machine):
@@ -527,30 +625,38 @@ def test_shared_and_per_user_installations_stand_side_by_side(machine):
     install(machine, user=ANN)
 
     assert machine.tree("/opt", "/etc") == shared
-    printed_lines(machine.run("t", user=ANN),
-                  "INI file = /etc/zor/zor.ini",
-                  "Install dir = /opt/corvan/zor",
-                  "Install version = 9.2.30.0000",
-                  "Exploiter list = ABC:",
-                  "",
-                  "Status of installation for current user:",
-                  "INI file = /home/ann/.zor/zor.ini",
-                  "Install dir = /home/ann/corvan/zor",
-                  "Install version = 9.2.30.0000",
-                  "Exploiter list = ABC:")
+    printed_lines(
+        machine.run("t", user=ANN),
+        "INI file = /etc/zor/zor.ini",
+        "Install dir = /opt/corvan/zor",
+        "Install version = 9.2.30.0000",
+        "Exploiter list = ABC:",
+        "",
+        "Status of installation for current user:",
+        "INI file = /home/ann/.zor/zor.ini",
+        "Install dir = /home/ann/corvan/zor",
+        "Install version = 9.2.30.0000",
+        "Exploiter list = ABC:",
+    )
 
 
 def test_an_installed_index_of_an_earlier_installation_is_merged(machine):
-    machine.plant("/opt/corvan/zor/ZOR_files",
-                  "# old header\n/opt/corvan/zor/zz\n\n/opt/corvan/zor/bin/trawlcfg\n/a/x \n"
-                  "#/opt/commented\n/a/x")
+    machine.plant(
+        "/opt/corvan/zor/ZOR_files",
+        "# old header\n/opt/corvan/zor/zz\n\n/opt/corvan/zor/bin/trawlcfg\n/a/x \n"
+        "#/opt/commented\n/a/x",
+    )
 
     install(machine)
 
-    same_text(machine.index("/opt/corvan/zor"), SHARED_INDEX.replace(
-        "/opt/corvan/zor/bin/libzor.so\n", "/a/x\n/a/x \n/opt/corvan/zor/bin/libzor.so\n", 1
-    ).replace("/opt/corvan/zor/zor.log.bak\n",
-              "/opt/corvan/zor/zor.log.bak\n/opt/corvan/zor/zz\n"))
+    same_text(
+        machine.index("/opt/corvan/zor"),
+        SHARED_INDEX.replace(
+            "/opt/corvan/zor/bin/libzor.so\n", "/a/x\n/a/x \n/opt/corvan/zor/bin/libzor.so\n", 1
+        ).replace(
+            "/opt/corvan/zor/zor.log.bak\n", "/opt/corvan/zor/zor.log.bak\n/opt/corvan/zor/zz\n"
+        ),
+    )
 
 
 @pytest.mark.parametrize("user, place", [(ROOT, "/opt/corvan/zor"), (ANN, "/home/ann/corvan/zor")])

@@ -175,7 +175,7 @@ def test_no_further_private_directory_is_a_link(machine, parent, name, target):
 
     printed_lines(
         outcome,
-        f"Error creating dir {name} in {TARGET}{parent} result=11 " "(Cannot create directory)",
+        f"Error creating dir {name} in {TARGET}{parent} result=11 (Cannot create directory)",
         f"Cannot create subdir: {name}",
     )
     ends(outcome, 1)

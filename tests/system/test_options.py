@@ -30,26 +30,33 @@ def test_the_last_package_wins(machine):
 def test_the_provider_goes_into_the_property_file(machine):
     install(machine, "-f", "provider_remote_cache2")
 
-    assert "\nfscanner.default_provider=provider_remote_cache2\n" \
-        in machine.read("/opt/corvan/zor/config/Zor.properties")
+    assert "\nfscanner.default_provider=provider_remote_cache2\n" in machine.read(
+        "/opt/corvan/zor/config/Zor.properties"
+    )
 
 
 def test_a_custom_trace_directory_takes_the_place_of_the_common_one(machine):
     outcome = install(machine, "-c", "/var/trace/zor")
 
-    printed_lines(outcome, "SPB file: /media/toolkit.spb",
-                  "ZOR custom trace path: /var/trace/zor",
-                  "ZOR version: 22/12/02zor_9.2.30.0000")
     printed_lines(
-        outcome, "Saving INI file to /etc/zor/zor.ini",
+        outcome,
+        "SPB file: /media/toolkit.spb",
+        "ZOR custom trace path: /var/trace/zor",
+        "ZOR version: 22/12/02zor_9.2.30.0000",
+    )
+    printed_lines(
+        outcome,
+        "Saving INI file to /etc/zor/zor.ini",
         "Setting logs dir='/var/trace/zor'",
         "Updating common trace path='/var/trace/zor' result=0",
         "Exec '/opt/corvan/zor/bin/trawlcfg -s common_trace_path /var/trace/zor "
         ">/dev/null 2>&1' returned 0",
         "Setting common trace path='/var/trace/zor' result=0",
-        "Installation successful, committing changes")
-    same_lines(outcome.commands,
-               ["/opt/corvan/zor/bin/trawlcfg [-s] [common_trace_path] [/var/trace/zor]"])
+        "Installation successful, committing changes",
+    )
+    same_lines(
+        outcome.commands, ["/opt/corvan/zor/bin/trawlcfg [-s] [common_trace_path] [/var/trace/zor]"]
+    )
 
 
 def test_a_custom_trace_directory_is_made_with_its_parents_for_everybody(machine):
@@ -78,8 +85,9 @@ def test_with_a_custom_trace_directory_nothing_of_the_common_directory_is_made(m
 def test_with_a_custom_trace_directory_the_scripts_still_name_the_common_one(machine):
     install(machine, "-c", "/var/trace")
 
-    assert "\nCOMMON=/usr/kel/corvan/common\n" \
-        in machine.read("/opt/corvan/zor/install/trawlcfg.sh")
+    assert "\nCOMMON=/usr/kel/corvan/common\n" in machine.read(
+        "/opt/corvan/zor/install/trawlcfg.sh"
+    )
 
 
 def test_with_a_custom_trace_directory_the_scripts_name_the_administrators_common_one(machine):
@@ -94,63 +102,79 @@ def test_with_a_custom_trace_directory_the_scripts_name_the_administrators_commo
 def test_a_custom_trace_directory_with_a_blank_is_quoted(machine):
     outcome = install(machine, "-c", "/var/my trace")
 
-    printed_lines(outcome, "Exec '/opt/corvan/zor/bin/trawlcfg -s common_trace_path "
-                           "\"/var/my trace\" >/dev/null 2>&1' returned 0")
-    same_lines(outcome.commands,
-               ["/opt/corvan/zor/bin/trawlcfg [-s] [common_trace_path] [/var/my trace]"])
+    printed_lines(
+        outcome,
+        "Exec '/opt/corvan/zor/bin/trawlcfg -s common_trace_path "
+        '"/var/my trace" >/dev/null 2>&1\' returned 0',
+    )
+    same_lines(
+        outcome.commands, ["/opt/corvan/zor/bin/trawlcfg [-s] [common_trace_path] [/var/my trace]"]
+    )
 
 
 def test_an_empty_custom_trace_directory_makes_none(machine):
     outcome = install(machine, "-c", "")
 
     printed_lines(
-        outcome, "Saving INI file to /etc/zor/zor.ini",
+        outcome,
+        "Saving INI file to /etc/zor/zor.ini",
         "Updating common trace path='' result=0",
         "Exec '/opt/corvan/zor/bin/trawlcfg -s common_trace_path  >/dev/null 2>&1' returned 0",
-        "Setting common trace path='' result=0")
+        "Setting common trace path='' result=0",
+    )
 
 
 def test_a_per_user_installation_with_a_custom_trace_directory_tells_it_to_the_toolkit(machine):
     outcome = install(machine, "-c", "/home/ann/trace", user=ANN)
 
     printed_lines(
-        outcome, "Saving INI file to /home/ann/.zor/zor.ini",
+        outcome,
+        "Saving INI file to /home/ann/.zor/zor.ini",
         "Setting logs dir='/home/ann/trace'",
         "Updating common trace path='/home/ann/trace' result=0",
         "Exec '/home/ann/corvan/zor/bin/trawlcfg -s common_trace_path /home/ann/trace "
         ">/dev/null 2>&1' returned 0",
-        "Setting common trace path='/home/ann/trace' result=0")
-    same_lines(outcome.commands, [
-        "/home/ann/corvan/zor/bin/trawlcfg [-s] [common_trace_path] [/home/ann/trace]"])
+        "Setting common trace path='/home/ann/trace' result=0",
+    )
+    same_lines(
+        outcome.commands,
+        ["/home/ann/corvan/zor/bin/trawlcfg [-s] [common_trace_path] [/home/ann/trace]"],
+    )
 
 
 def test_a_skipped_registration_leaves_a_list_of_one_colon(machine):
     outcome = install(machine, "-n")
 
     printed_lines(outcome, "Register exploiter: no")
-    same_text(machine.read("/etc/zor/zor.ini"), """\
+    same_text(
+        machine.read("/etc/zor/zor.ini"),
+        """\
 ZOR_Version = 9.2.30.0000
 ZOR_BuildDate = 22/12/02
 ZOR_HomeDirectory = /opt/corvan/zor
 ZOR_Exploiters = :
 ZOR_ConfigRootDirectory = /opt/corvan/zor
-""")
+""",
+    )
 
 
-SINGLE_USER_TREE = tree_with(SHARED_TREE, {
-    "/etc/kel": "d 0755",
-    "/etc/kel/corvan": "d 0755",
-    "/etc/kel/corvan/common": "d 0755",
-    "/etc/kel/corvan/common/cfg": "d 0755",
-    "/opt/corvan/zor/bin/etc": "d 0755",
-    "/opt/corvan/zor/cache_data": "d 0755",
-    "/opt/corvan/zor/config/SingleUserMode": "f 0644",
-    "/usr/kel": "d 0755",
-    "/usr/kel/corvan": "d 0755",
-    "/usr/kel/corvan/common": "d 0755",
-    "/usr/kel/corvan/common/ZOR": "d 0755",
-    "/usr/kel/corvan/common/ZOR/logs": "d 0755",
-})
+SINGLE_USER_TREE = tree_with(
+    SHARED_TREE,
+    {
+        "/etc/kel": "d 0755",
+        "/etc/kel/corvan": "d 0755",
+        "/etc/kel/corvan/common": "d 0755",
+        "/etc/kel/corvan/common/cfg": "d 0755",
+        "/opt/corvan/zor/bin/etc": "d 0755",
+        "/opt/corvan/zor/cache_data": "d 0755",
+        "/opt/corvan/zor/config/SingleUserMode": "f 0644",
+        "/usr/kel": "d 0755",
+        "/usr/kel/corvan": "d 0755",
+        "/usr/kel/corvan/common": "d 0755",
+        "/usr/kel/corvan/common/ZOR": "d 0755",
+        "/usr/kel/corvan/common/ZOR/logs": "d 0755",
+    },
+)
 
 
 @pytest.mark.parametrize("umask", [0o000, 0o022, 0o077])
@@ -164,17 +188,20 @@ def test_single_user_mode_leaves_an_empty_flag_file(machine):
     outcome = install(machine, "-r")
 
     printed_lines(
-        outcome, "Saving INI file to /etc/zor/zor.ini",
+        outcome,
+        "Saving INI file to /etc/zor/zor.ini",
         "Creating single user mode flag file: /opt/corvan/zor/config/SingleUserMode",
-        "Created Corvan Common Dir='/usr/kel/corvan/common' result=0")
+        "Created Corvan Common Dir='/usr/kel/corvan/common' result=0",
+    )
     assert machine.read("/opt/corvan/zor/config/SingleUserMode") == ""
 
 
 def test_the_flag_file_is_appended_to_the_index(machine):
     install(machine, "-r")
 
-    same_text(machine.index("/opt/corvan/zor"),
-              SHARED_INDEX + "/opt/corvan/zor/config/SingleUserMode\n")
+    same_text(
+        machine.index("/opt/corvan/zor"), SHARED_INDEX + "/opt/corvan/zor/config/SingleUserMode\n"
+    )
 
 
 def test_without_single_user_mode_there_is_no_flag_file(machine):
@@ -188,8 +215,11 @@ def test_a_flag_file_in_the_target_switches_single_user_mode_on(machine):
 
     outcome = install(machine, umask=0)
 
-    printed_lines(outcome, "Single user mode file found",
-                  "Performing fresh install on /opt/corvan/zor (config=/opt/corvan/zor/config)")
+    printed_lines(
+        outcome,
+        "Single user mode file found",
+        "Performing fresh install on /opt/corvan/zor (config=/opt/corvan/zor/config)",
+    )
     not_printed(outcome, "Creating single user mode flag file")
     same_text(machine.listing("/etc", "/opt", "/usr/kel"), SINGLE_USER_TREE)
     same_text(machine.index("/opt/corvan/zor"), SHARED_INDEX)
@@ -218,9 +248,11 @@ def test_a_flag_file_that_cannot_be_made_costs_nothing(machine):
     outcome = install(machine, "-r")
 
     printed_lines(
-        outcome, "Creating single user mode flag file: /opt/corvan/zor/config/SingleUserMode",
+        outcome,
+        "Creating single user mode flag file: /opt/corvan/zor/config/SingleUserMode",
         "Unable to create single user mode flag file",
-        "Created Corvan Common Dir='/usr/kel/corvan/common' result=0")
+        "Created Corvan Common Dir='/usr/kel/corvan/common' result=0",
+    )
     same_text(machine.index("/opt/corvan/zor"), SHARED_INDEX)
 
 
@@ -341,8 +373,14 @@ extractFile: /opt/corvan/zor/install/rmdirs.sh
 """
 
 LEFT_OUT_OF_THE_TRACED_PACKAGE = (
-    "bin/trawlfs", "bin/trawlhw", "bin/libzorcore.so", "properties/",
-    "properties/scan.properties", "config/ZorHWConfig.xml", "install/trawlcfg.sh")
+    "bin/trawlfs",
+    "bin/trawlhw",
+    "bin/libzorcore.so",
+    "properties/",
+    "properties/scan.properties",
+    "config/ZorHWConfig.xml",
+    "install/trawlcfg.sh",
+)
 
 
 def test_debug_mode_traces_the_extraction_and_shows_what_commands_print(machine):
@@ -350,7 +388,9 @@ def test_debug_mode_traces_the_extraction_and_shows_what_commands_print(machine)
 
     outcome = machine.run("i", "ABC", "-s", SPB, "-v")
 
-    printed(outcome, f"""\
+    printed(
+        outcome,
+        f"""\
 SPB file: /media/toolkit.spb
 ZOR version: 22/12/02zor_9.2.30.0000
 Install type: global
@@ -383,10 +423,12 @@ Exec '/opt/corvan/zor/bin/trawlcfg -s common_trace_path /usr/kel/corvan/common/Z
 Setting common trace path='/usr/kel/corvan/common/ZOR/logs' result=0
 Installation successful, committing changes
 Done.
-""", stderr="""\
+""",
+        stderr="""\
 sh: 1: /usr/sbin/selinuxenabled: not found
 scanner control error: -s common_trace_path /usr/kel/corvan/common/ZOR/logs
-""")
+""",
+    )
 
 
 def test_debug_traces_of_the_extraction_go_to_standard_output_in_spite_of_a_log_file(machine):
@@ -394,10 +436,15 @@ def test_debug_traces_of_the_extraction_go_to_standard_output_in_spite_of_a_log_
 
     outcome = machine.run("i", "ABC", "-o", "/tmp/log", "-s", SPB, "-v")
 
-    same_text(outcome.stdout, TRACED + TRACED_LATER +
-              "scanner control output: -s common_trace_path /usr/kel/corvan/common/ZOR/logs\n")
-    assert "\nSetting 'LD_LIBRARY_PATH' to 'LD_LIBRARY_PATH=/opt/corvan/zor/bin'\n" \
-        in machine.read("/tmp/log")
+    same_text(
+        outcome.stdout,
+        TRACED
+        + TRACED_LATER
+        + "scanner control output: -s common_trace_path /usr/kel/corvan/common/ZOR/logs\n",
+    )
+    assert "\nSetting 'LD_LIBRARY_PATH' to 'LD_LIBRARY_PATH=/opt/corvan/zor/bin'\n" in machine.read(
+        "/tmp/log"
+    )
 
 
 def test_debug_mode_installs_the_same(machine):
@@ -419,8 +466,13 @@ def test_root_can_install_for_itself_alone(machine):
 
     outcome = install(machine, "-eeo", "-l")
 
-    printed_lines(outcome, "Install type: local", "Register exploiter: yes",
-                  "Default dest: /root/corvan/zor", "INI location: /root/.zor/zor.ini")
+    printed_lines(
+        outcome,
+        "Install type: local",
+        "Register exploiter: yes",
+        "Default dest: /root/corvan/zor",
+        "INI location: /root/.zor/zor.ini",
+    )
     same_lines(outcome.commands, [])
     same_tree(machine.tree("/opt"), before)
     assert "\nZOR_HomeDirectory = /root/corvan/zor\n" in machine.read("/root/.zor/zor.ini")

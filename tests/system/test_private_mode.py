@@ -79,17 +79,27 @@ def install_shared(machine, exploiters="ABC:"):
 
 
 def test_a_private_installation_prints_its_progress(machine):
-    printed(install(machine), "SPB file: /media/toolkit.spb\n" + SETTINGS + """\
+    printed(
+        install(machine),
+        "SPB file: /media/toolkit.spb\n"
+        + SETTINGS
+        + """\
 INI file not found or outdated (code=1)
 Private mode enabled
 Changing Global install to remove
-""" + NOT_FOUND + PRIVATE_START + PRIVATE_REST)
+"""
+        + NOT_FOUND
+        + PRIVATE_START
+        + PRIVATE_REST,
+    )
 
 
 def test_a_private_installation_makes_its_tree_without_a_permission_pass(machine):
     install(machine)
 
-    same_text(machine.listing("/etc", "/opt", "/usr/kel"), """\
+    same_text(
+        machine.listing("/etc", "/opt", "/usr/kel"),
+        """\
 d 0755 /etc
 d 0775 /etc/kel
 d 0775 /etc/kel/corvan
@@ -123,7 +133,8 @@ d 0777 /usr/kel/corvan
 d 0777 /usr/kel/corvan/common
 d 0777 /usr/kel/corvan/common/ZOR
 d 0777 /usr/kel/corvan/common/ZOR/logs
-""")
+""",
+    )
 
 
 def test_a_private_installation_is_in_no_registry(machine):
@@ -136,7 +147,9 @@ def test_a_private_installation_is_in_no_registry(machine):
 def test_a_private_installation_has_an_index_of_its_own(machine):
     install(machine)
 
-    same_text(machine.index(PRIVATE), """\
+    same_text(
+        machine.index(PRIVATE),
+        """\
 # File created by ZOR: 22/12/02zor_9.2.30.0000 installed on TIME
 /opt/private/bin/libzor.so
 /opt/private/bin/libzorcore.so
@@ -155,14 +168,16 @@ def test_a_private_installation_has_an_index_of_its_own(machine):
 /opt/private/zor.log
 /opt/private/zor.log.bak
 /opt/private/install/zor_install.properties
-""")
+""",
+    )
 
 
 def test_a_private_installation_fills_in_its_directory(machine):
     install(machine)
 
-    assert "\nfscanner.cache_dir=/opt/private/cache_data\n" \
-        in machine.read(PRIVATE + "/config/Zor.properties")
+    assert "\nfscanner.cache_dir=/opt/private/cache_data\n" in machine.read(
+        PRIVATE + "/config/Zor.properties"
+    )
     assert "\nZOR_HOME=/opt/private\n" in machine.read(PRIVATE + "/install/trawlcfg.sh")
 
 
@@ -176,10 +191,16 @@ def test_the_given_directory_is_taken_with_its_final_slash(machine):
     outcome = machine.run("i", "ABC", "-s", SPB, "-d", "/opt/private/", "-p")
 
     assert outcome.status == 0
-    printed_lines(outcome, "Log file is: /opt/private/ZOR_files",
-                  "currentZorHome = '/opt/private' currentCfgHome = '/opt/private'")
-    printed_lines(outcome, "Performing private installation to /opt/private/",
-                  "Performing fresh install on /opt/private/ (config=/opt/private/config)")
+    printed_lines(
+        outcome,
+        "Log file is: /opt/private/ZOR_files",
+        "currentZorHome = '/opt/private' currentCfgHome = '/opt/private'",
+    )
+    printed_lines(
+        outcome,
+        "Performing private installation to /opt/private/",
+        "Performing fresh install on /opt/private/ (config=/opt/private/config)",
+    )
     assert "\n/opt/private/bin/trawlcfg\n" in machine.index(PRIVATE)
 
 
@@ -194,7 +215,11 @@ def test_the_last_directory_is_the_private_one(machine):
 def test_a_private_installation_unregisters_the_exploiter_of_the_shared_one(machine):
     install_shared(machine, "ABC:XYZ:")
 
-    printed(install(machine), "SPB file: /media/toolkit.spb\n" + SETTINGS + """\
+    printed(
+        install(machine),
+        "SPB file: /media/toolkit.spb\n"
+        + SETTINGS
+        + """\
 INI file found, verifying...
 ZOR directory verified ok
 Private mode enabled
@@ -204,8 +229,10 @@ currentZorHome = '/opt/corvan/zor' currentCfgHome = '/opt/corvan/zor'
 Exploiter list not empty, updating INI file only
 Saving INI file to /etc/zor/zor.ini
 Uninstallation successful, removing temporary files
-""" + PRIVATE_START + PRIVATE_REST.replace(
-        "Setting logs dir='/usr/kel/corvan/common/ZOR/logs'\n", ""))
+"""
+        + PRIVATE_START
+        + PRIVATE_REST.replace("Setting logs dir='/usr/kel/corvan/common/ZOR/logs'\n", ""),
+    )
 
     assert "\nZOR_Exploiters = XYZ:\n" in machine.read("/etc/zor/zor.ini")
     assert not machine.exists("/etc/zor/zor.ini.bak")
@@ -217,15 +244,22 @@ def test_a_private_installation_of_the_last_exploiter_removes_the_shared_one(mac
 
     outcome = install(machine)
 
-    same_lines(outcome.commands, [
-        "/opt/corvan/zor/bin/trawlfs [-shutdown]",
-        "/opt/corvan/zor/bin/trawlcfg [-disable] [all]",
-        "/opt/corvan/zor/bin/trawlcfg [-shutdown] [all] [-timeout] [60] [-force]",
-        "/opt/corvan/zor/bin/trawlcfg [-shutdown] [all] [-timeout] [120]",
-        "/opt/private/bin/trawlcfg [-s] [common_trace_path] [/usr/kel/corvan/common/ZOR/logs]"])
-    printed_lines(outcome, "RMDIR: /etc/zor",
-                  "Uninstallation successful, removing temporary files",
-                  "Now perform privateMode")
+    same_lines(
+        outcome.commands,
+        [
+            "/opt/corvan/zor/bin/trawlfs [-shutdown]",
+            "/opt/corvan/zor/bin/trawlcfg [-disable] [all]",
+            "/opt/corvan/zor/bin/trawlcfg [-shutdown] [all] [-timeout] [60] [-force]",
+            "/opt/corvan/zor/bin/trawlcfg [-shutdown] [all] [-timeout] [120]",
+            "/opt/private/bin/trawlcfg [-s] [common_trace_path] [/usr/kel/corvan/common/ZOR/logs]",
+        ],
+    )
+    printed_lines(
+        outcome,
+        "RMDIR: /etc/zor",
+        "Uninstallation successful, removing temporary files",
+        "Now perform privateMode",
+    )
     assert not machine.exists("/opt/corvan/zor")
     assert machine.exists(PRIVATE + "/bin/trawlcfg")
 
@@ -234,9 +268,12 @@ def test_a_private_installation_leaves_a_shared_one_of_others_alone(machine):
     install_shared(machine, "XYZ:")
     before = machine.tree("/opt/corvan", "/etc")
 
-    printed_lines(install(machine), "ZOR not installed for exploiter ABC, nothing to do",
-                  "Uninstallation successful, removing temporary files",
-                  "Now perform privateMode")
+    printed_lines(
+        install(machine),
+        "ZOR not installed for exploiter ABC, nothing to do",
+        "Uninstallation successful, removing temporary files",
+        "Now perform privateMode",
+    )
 
     same_tree(machine.tree("/opt/corvan", "/etc"), before)
 
@@ -248,14 +285,16 @@ def test_a_broken_shared_installation_is_not_repaired_in_private_mode(machine):
 
     outcome = install(machine)
 
-    printed_lines(outcome,
-                  "*** Error: cannot find /opt/corvan/zor/bin/trawlcfg in INI home dir.",
-                  "Private mode enabled",
-                  "Changing Global install to remove",
-                  "Log file is: /opt/private/ZOR_files",
-                  "currentZorHome = '/opt/private' currentCfgHome = '/opt/private'",
-                  "*** Error: INI file not found: nothing to remove.",
-                  "Now perform privateMode")
+    printed_lines(
+        outcome,
+        "*** Error: cannot find /opt/corvan/zor/bin/trawlcfg in INI home dir.",
+        "Private mode enabled",
+        "Changing Global install to remove",
+        "Log file is: /opt/private/ZOR_files",
+        "currentZorHome = '/opt/private' currentCfgHome = '/opt/private'",
+        "*** Error: INI file not found: nothing to remove.",
+        "Now perform privateMode",
+    )
     same_tree(machine.tree("/opt/corvan"), before)
 
 
@@ -270,8 +309,10 @@ def test_a_per_user_private_installation_runs_no_command(machine):
 
     assert outcome.status == 0
     same_lines(outcome.commands, [])
-    assert machine.read("/home/ann/private/install/zor_install.properties") \
+    assert (
+        machine.read("/home/ann/private/install/zor_install.properties")
         == "ZOR_InstallType=local\n"
+    )
     assert machine.mode("/home/ann/private/cache_data") == 0o770
     assert not machine.exists("/home/ann/.zor")
 
@@ -279,18 +320,21 @@ def test_a_per_user_private_installation_runs_no_command(machine):
 def test_a_private_installation_takes_a_custom_trace_directory(machine):
     outcome = install(machine, "-c", "/var/trace")
 
-    printed_lines(outcome, "Setting logs dir='/var/trace'",
-                  "Updating common trace path='/var/trace' result=0")
-    same_lines(outcome.commands,
-               ["/opt/private/bin/trawlcfg [-s] [common_trace_path] [/var/trace]"])
+    printed_lines(
+        outcome, "Setting logs dir='/var/trace'", "Updating common trace path='/var/trace' result=0"
+    )
+    same_lines(
+        outcome.commands, ["/opt/private/bin/trawlcfg [-s] [common_trace_path] [/var/trace]"]
+    )
     assert not machine.exists("/usr/kel")
 
 
 def test_a_private_installation_takes_single_user_mode(machine):
     outcome = install(machine, "-r")
 
-    printed_lines(outcome, "Creating single user mode flag file: "
-                           "/opt/private/config/SingleUserMode")
+    printed_lines(
+        outcome, "Creating single user mode flag file: /opt/private/config/SingleUserMode"
+    )
     assert machine.mode(PRIVATE + "/cache_data") == 0o755
     assert machine.mode(PRIVATE + "/bin/etc") == 0o755
     assert machine.index(PRIVATE).endswith("\n/opt/private/config/SingleUserMode\n")
@@ -310,8 +354,10 @@ def test_a_private_installation_can_be_made_twice_without_stopping_anything(mach
     install(machine)
     first = machine.tree(PRIVATE)
 
-    same_lines(install(machine).commands, [
-        "/opt/private/bin/trawlcfg [-s] [common_trace_path] [/usr/kel/corvan/common/ZOR/logs]"])
+    same_lines(
+        install(machine).commands,
+        ["/opt/private/bin/trawlcfg [-s] [common_trace_path] [/usr/kel/corvan/common/ZOR/logs]"],
+    )
 
     second = machine.tree(PRIVATE)
     assert machine.index(PRIVATE).count("zor_install.properties\n") == 2
@@ -327,21 +373,25 @@ def test_a_failing_private_installation_ends_with_its_code_and_stays_as_it_is(ma
     outcome = machine.run("i", "ABC", "-s", SPB, "-d", PRIVATE, "-p")
 
     assert outcome.status == 1
-    assert outcome.stdout.endswith(PRIVATE_START + """\
+    assert outcome.stdout.endswith(
+        PRIVATE_START
+        + """\
 File extraction failed, error = 1 (Cannot open file for reading)
 Exec '/usr/sbin/selinuxenabled >/dev/null 2>&1' returned 32512
 SELinux not enabled or not supported
 PrivMode Action finished with RC: 1
 Done.
-""")
+"""
+    )
     assert machine.read_bytes(PRIVATE + "/bin/trawlhw") == b"\x7fELF hardware scanner\x00\xff"
     assert machine.exists(PRIVATE + "/properties/scan.properties")
     assert not machine.exists(PRIVATE + "/ZOR_files")
     not_printed(outcome, "rolling back")
 
 
-@pytest.mark.parametrize("without, code", [(("config/Zor.properties",), 2),
-                                           (("bin/trawlcfg",), 32512)])
+@pytest.mark.parametrize(
+    "without, code", [(("config/Zor.properties",), 2), (("bin/trawlcfg",), 32512)]
+)
 def test_the_code_of_a_failing_private_installation_is_told(machine, without, code):
     machine.pack(without=without)
 
@@ -381,17 +431,27 @@ def test_a_private_removal_prints_its_progress(machine):
     outcome = remove(machine)
 
     head, _, deleted = outcome.stdout.partition(PRIVATE_STOPPED)
-    same_text(head, SETTINGS + """\
+    same_text(
+        head,
+        SETTINGS
+        + """\
 INI file not found or outdated (code=1)
 Private mode enabled
-""" + NOT_FOUND + "Now perform privateMode\n")
-    same_lines(sorted(deleted.splitlines()[:2]) + deleted.splitlines()[2:], [
-        "DEL: /opt/private/bin/trawlcfg",
-        "DEL: /opt/private/bin/trawlfs",
-        "RMDIR: /opt/private/bin",
-        "RMDIR: /opt/private",
-        "Performing private remove",
-        "Done."])
+"""
+        + NOT_FOUND
+        + "Now perform privateMode\n",
+    )
+    same_lines(
+        sorted(deleted.splitlines()[:2]) + deleted.splitlines()[2:],
+        [
+            "DEL: /opt/private/bin/trawlcfg",
+            "DEL: /opt/private/bin/trawlfs",
+            "RMDIR: /opt/private/bin",
+            "RMDIR: /opt/private",
+            "Performing private remove",
+            "Done.",
+        ],
+    )
 
 
 def test_a_private_removal_leaves_nothing_but_the_common_directories(machine):
@@ -407,11 +467,15 @@ def test_a_private_removal_leaves_nothing_but_the_common_directories(machine):
 def test_a_private_removal_stops_the_private_scanners(machine):
     install(machine)
 
-    same_lines(remove(machine).commands, [
-        "/opt/private/bin/trawlfs [-shutdown]",
-        "/opt/private/bin/trawlcfg [-disable] [all]",
-        "/opt/private/bin/trawlcfg [-shutdown] [all] [-timeout] [60] [-force]",
-        "/opt/private/bin/trawlcfg [-shutdown] [all] [-timeout] [120]"])
+    same_lines(
+        remove(machine).commands,
+        [
+            "/opt/private/bin/trawlfs [-shutdown]",
+            "/opt/private/bin/trawlcfg [-disable] [all]",
+            "/opt/private/bin/trawlcfg [-shutdown] [all] [-timeout] [60] [-force]",
+            "/opt/private/bin/trawlcfg [-shutdown] [all] [-timeout] [120]",
+        ],
+    )
 
 
 def test_the_private_scanners_see_the_callers_library_path(machine):
@@ -428,11 +492,18 @@ def test_a_private_removal_of_nothing_succeeds(machine):
 
     outcome = remove(machine)
 
-    printed(outcome, SETTINGS + """\
+    printed(
+        outcome,
+        SETTINGS
+        + """\
 INI file not found or outdated (code=1)
 Private mode enabled
-""" + NOT_FOUND + "Now perform privateMode\n" + PRIVATE_STOPPED.replace(
-        "returned 0", "returned 32512") + "Performing private remove\nDone.\n")
+"""
+        + NOT_FOUND
+        + "Now perform privateMode\n"
+        + PRIVATE_STOPPED.replace("returned 0", "returned 32512")
+        + "Performing private remove\nDone.\n",
+    )
     same_tree(machine.tree(), before)
 
 
@@ -449,11 +520,14 @@ def test_a_private_removal_unregisters_the_exploiter_of_the_shared_one(machine):
     install(machine)
     install_shared(machine, "ABC:XYZ:")
 
-    printed_lines(remove(machine), "Exploiter list not empty, updating INI file only",
-                  "Saving INI file to /etc/zor/zor.ini",
-                  "Uninstallation successful, removing temporary files",
-                  "Now perform privateMode",
-                  "Exec '/opt/private/bin/trawlfs -shutdown >/dev/null 2>&1' returned 0")
+    printed_lines(
+        remove(machine),
+        "Exploiter list not empty, updating INI file only",
+        "Saving INI file to /etc/zor/zor.ini",
+        "Uninstallation successful, removing temporary files",
+        "Now perform privateMode",
+        "Exec '/opt/private/bin/trawlfs -shutdown >/dev/null 2>&1' returned 0",
+    )
 
     assert "\nZOR_Exploiters = XYZ:\n" in machine.read("/etc/zor/zor.ini")
     assert not machine.exists(PRIVATE)
@@ -464,8 +538,11 @@ def test_a_private_removal_succeeds_although_the_registry_could_not_be_saved(mac
     install_shared(machine, "ABC:XYZ:")
     machine.make_directory("/etc/zor/zor.ini.bak")
 
-    printed_lines(remove(machine), "*** Error: could not open or write to INI file. Error = 2",
-                  "Now perform privateMode")
+    printed_lines(
+        remove(machine),
+        "*** Error: could not open or write to INI file. Error = 2",
+        "Now perform privateMode",
+    )
 
     assert not machine.exists(PRIVATE)
 
@@ -489,12 +566,15 @@ def test_private_directories_that_a_user_may_not_empty_stay_and_the_removal_succ
     outcome = machine.run("r", "ABC", "-d", "/home/ann/private", "-p", user=ANN)
 
     assert outcome.status == 0
-    same_text(machine.listing("/home/ann"), """\
+    same_text(
+        machine.listing("/home/ann"),
+        """\
 d 0755 /home/ann
 d 0755 /home/ann/private
 d 0555 /home/ann/private/closed
 f 0644 /home/ann/private/closed/file
-""")
+""",
+    )
 
 
 def test_in_debug_mode_a_private_installation_traces_its_extraction(machine):

@@ -117,27 +117,35 @@ def with_sorted_deletions(text):
 
 # The exploiter list.
 
+
 def test_the_first_of_two_exploiters_only_leaves_the_registry(machine):
     install(machine, "ABC:XYZ:")
     before = machine.tree()
 
     outcome = remove(machine)
 
-    printed(outcome, FOUND + """\
+    printed(
+        outcome,
+        FOUND
+        + """\
 Exploiter list not empty, updating INI file only
 Saving INI file to /etc/zor/zor.ini
 Uninstallation successful, removing temporary files
 Done.
-""")
+""",
+    )
     same_lines(outcome.commands, [])
     after = machine.tree()
-    same_text(after.pop("/etc/zor/zor.ini").content.decode(), """\
+    same_text(
+        after.pop("/etc/zor/zor.ini").content.decode(),
+        """\
 ZOR_Version = 9.2.30.0000
 ZOR_BuildDate = 22/12/02
 ZOR_HomeDirectory = /opt/corvan/zor
 ZOR_Exploiters = XYZ:
 ZOR_ConfigRootDirectory = /opt/corvan/zor
-""")
+""",
+    )
     before.pop("/etc/zor/zor.ini")
     same_tree(after, before)
 
@@ -159,11 +167,15 @@ def test_an_exploiter_that_is_not_registered_changes_nothing(machine):
     install(machine)
     before = machine.tree()
 
-    printed(remove(machine, "XYZ"), FOUND + """\
+    printed(
+        remove(machine, "XYZ"),
+        FOUND
+        + """\
 ZOR not installed for exploiter XYZ, nothing to do
 Uninstallation successful, removing temporary files
 Done.
-""")
+""",
+    )
 
     same_tree(machine.tree(), before)
 
@@ -173,8 +185,11 @@ def test_an_exploiter_is_compared_whole(machine, exploiters):
     install(machine, exploiters)
     before = machine.tree()
 
-    printed_lines(remove(machine), "ZOR not installed for exploiter ABC, nothing to do",
-                  "Uninstallation successful, removing temporary files")
+    printed_lines(
+        remove(machine),
+        "ZOR not installed for exploiter ABC, nothing to do",
+        "Uninstallation successful, removing temporary files",
+    )
 
     same_tree(machine.tree(), before)
 
@@ -182,10 +197,18 @@ def test_an_exploiter_is_compared_whole(machine, exploiters):
 def test_a_list_of_one_colon_lets_anybody_remove_the_toolkit(machine):
     install(machine, ":")
 
-    printed(remove(machine, "ANYBODY"), FOUND + """\
+    printed(
+        remove(machine, "ANYBODY"),
+        FOUND
+        + """\
 ZOR not installed for exploiter ANYBODY, nothing to do
 Exploiter list empty, ok to remove anyway
-""" + STOPPED + LISTED_FILES + DIRECTORIES + SHARED_END)
+"""
+        + STOPPED
+        + LISTED_FILES
+        + DIRECTORIES
+        + SHARED_END,
+    )
 
 
 def test_an_unregistered_installation_is_removed_by_anybody(machine):
@@ -196,9 +219,16 @@ def test_an_unregistered_installation_is_removed_by_anybody(machine):
     same_text(machine.listing("/etc", "/opt", "/usr/kel"), LEFT)
 
 
-@pytest.mark.parametrize("before, after", [
-    ("XABC:ABC:", "XABC:"), ("XABC:Q:ABC:", "XQ:ABC:"), ("ABC:ABC:", "ABC:"),
-    ("A::ABC:", "A::"), (":ABC:", ":")])
+@pytest.mark.parametrize(
+    "before, after",
+    [
+        ("XABC:ABC:", "XABC:"),
+        ("XABC:Q:ABC:", "XQ:ABC:"),
+        ("ABC:ABC:", "ABC:"),
+        ("A::ABC:", "A::"),
+        (":ABC:", ":"),
+    ],
+)
 def test_the_identifier_is_cut_out_where_its_text_first_occurs(machine, before, after):
     install(machine, before)
 
@@ -218,9 +248,11 @@ def test_an_identifier_without_its_colon_cannot_be_cut_out_and_the_toolkit_goes(
 def test_a_list_without_a_colon_behind_the_cut_counts_as_empty(machine):
     install(machine, "ABC:XYZ")
 
-    printed_lines(remove(machine), "currentZorHome = '/opt/corvan/zor' "
-                                   "currentCfgHome = '/opt/corvan/zor'",
-                  "Exec '/opt/corvan/zor/bin/trawlfs -shutdown >/dev/null 2>&1' returned 0")
+    printed_lines(
+        remove(machine),
+        "currentZorHome = '/opt/corvan/zor' currentCfgHome = '/opt/corvan/zor'",
+        "Exec '/opt/corvan/zor/bin/trawlfs -shutdown >/dev/null 2>&1' returned 0",
+    )
 
     assert not machine.exists(HOME)
 
@@ -232,12 +264,17 @@ def test_a_registry_that_cannot_be_saved_fails_the_removal_and_stays(machine):
 
     outcome = machine.run("r", "ABC")
 
-    printed(outcome, FOUND + """\
+    printed(
+        outcome,
+        FOUND
+        + """\
 Exploiter list not empty, updating INI file only
 Saving INI file to /etc/zor/zor.ini
 *** Error: could not open or write to INI file. Error = 2
 Done.
-""", status=1)
+""",
+        status=1,
+    )
     same_tree(machine.tree(), before)
 
 
@@ -251,6 +288,7 @@ def test_the_rewritten_registry_keeps_its_mode(machine):
 
 
 # The full removal.
+
 
 def test_a_removal_prints_its_progress(machine):
     install(machine)
@@ -269,11 +307,15 @@ def test_a_removal_leaves_only_the_common_directory_and_its_setting(machine):
 def test_a_removal_stops_the_scanners(machine):
     install(machine)
 
-    same_lines(remove(machine).commands, [
-        "/opt/corvan/zor/bin/trawlfs [-shutdown]",
-        "/opt/corvan/zor/bin/trawlcfg [-disable] [all]",
-        "/opt/corvan/zor/bin/trawlcfg [-shutdown] [all] [-timeout] [60] [-force]",
-        "/opt/corvan/zor/bin/trawlcfg [-shutdown] [all] [-timeout] [120]"])
+    same_lines(
+        remove(machine).commands,
+        [
+            "/opt/corvan/zor/bin/trawlfs [-shutdown]",
+            "/opt/corvan/zor/bin/trawlcfg [-disable] [all]",
+            "/opt/corvan/zor/bin/trawlcfg [-shutdown] [all] [-timeout] [60] [-force]",
+            "/opt/corvan/zor/bin/trawlcfg [-shutdown] [all] [-timeout] [120]",
+        ],
+    )
 
 
 def test_failing_stop_commands_do_not_keep_the_toolkit(machine):
@@ -290,18 +332,21 @@ def test_failing_stop_commands_do_not_keep_the_toolkit(machine):
         "returned 256",
         "Exec '/opt/corvan/zor/bin/trawlcfg -shutdown all -timeout 120 >/dev/null 2>&1' "
         "returned 256",
-        "RM FILE: /opt/corvan/zor/bin/libzor.so")
+        "RM FILE: /opt/corvan/zor/bin/libzor.so",
+    )
     assert not machine.exists(HOME)
 
 
 def test_debug_mode_shows_what_the_scanner_control_prints(machine):
     install(machine)
 
-    printed_lines(remove(machine, "ABC", "-v"),
-                  "Setting 'LD_LIBRARY_PATH' to 'LD_LIBRARY_PATH=/opt/corvan/zor/bin'",
-                  "scanner control output: -shutdown",
-                  "Exec '/opt/corvan/zor/bin/trawlfs -shutdown' returned 0",
-                  "scanner control output: -disable all")
+    printed_lines(
+        remove(machine, "ABC", "-v"),
+        "Setting 'LD_LIBRARY_PATH' to 'LD_LIBRARY_PATH=/opt/corvan/zor/bin'",
+        "scanner control output: -shutdown",
+        "Exec '/opt/corvan/zor/bin/trawlfs -shutdown' returned 0",
+        "scanner control output: -disable all",
+    )
 
 
 def test_a_per_user_removal_prints_its_progress_and_leaves_nothing(machine):
@@ -312,13 +357,18 @@ def test_a_per_user_removal_prints_its_progress_and_leaves_nothing(machine):
 
     home = "/home/ann/corvan/zor"
     shared = FOUND + STOPPED + LISTED_FILES + DIRECTORIES
-    printed(outcome, shared.replace(HOME, home).replace("/etc/zor", "/home/ann/.zor").replace(
-        "Install type: global", "Install type: local") + """\
+    printed(
+        outcome,
+        shared.replace(HOME, home)
+        .replace("/etc/zor", "/home/ann/.zor")
+        .replace("Install type: global", "Install type: local")
+        + """\
 DEL: /home/ann/.zor/zor.ini
 RMDIR: /home/ann/.zor
 Uninstallation successful, removing temporary files
 Done.
-""")
+""",
+    )
     machine.remove("/home/ann/corvan")
     same_tree(machine.tree(), before)
 
@@ -371,8 +421,13 @@ def test_an_index_file_is_deleted_without_a_word(machine):
 
 def test_the_installers_own_files_are_deleted(machine):
     install(machine)
-    for path in ("bin/libzor.so", "config/Zor.tmp", "config/SingleUserMode", "zor.log",
-                 "zor.log.bak"):
+    for path in (
+        "bin/libzor.so",
+        "config/Zor.tmp",
+        "config/SingleUserMode",
+        "zor.log",
+        "zor.log.bak",
+    ):
         machine.plant(f"{HOME}/{path}", "x")
 
     remove(machine)
@@ -384,8 +439,7 @@ def test_every_path_of_the_index_is_deleted_wherever_it_lies(machine):
     install(machine)
     machine.plant("/opt/elsewhere/file ", "x")
     machine.plant("/opt/elsewhere/file", "kept")
-    machine.plant(HOME + "/ZOR_files",
-                  machine.read(HOME + "/ZOR_files") + "/opt/elsewhere/file ")
+    machine.plant(HOME + "/ZOR_files", machine.read(HOME + "/ZOR_files") + "/opt/elsewhere/file ")
 
     remove(machine)
 
@@ -440,9 +494,14 @@ def test_without_an_index_the_files_of_the_binaries_are_not_known(machine):
 
     # The refreshed index lists the installer's own five files, so it counts as one.
     before, rest = with_sorted_deletions(outcome.stdout).split(
-        "RMDIR: /opt/corvan/zor/properties\n")
+        "RMDIR: /opt/corvan/zor/properties\n"
+    )
     config, after = rest.split("RMDIR: /opt/corvan/zor/config\n")
-    same_text(before, FOUND + STOPPED + """\
+    same_text(
+        before,
+        FOUND
+        + STOPPED
+        + """\
 RM FILE: /opt/corvan/zor/bin/libzor.so
 RM FILE: /opt/corvan/zor/config/SingleUserMode
 RM FILE: /opt/corvan/zor/config/Zor.tmp
@@ -454,15 +513,22 @@ DEL: /opt/corvan/zor/install/zor_install.properties
 RMDIR: /opt/corvan/zor/install
 RMDIR: /opt/corvan/zor/bin/etc
 DEL: /opt/corvan/zor/properties/scan.properties
-""")
-    same_lines(sorted(config.splitlines()), [
-        "DEL: /opt/corvan/zor/config/Zor.properties",
-        "DEL: /opt/corvan/zor/config/ZorHWConfig.xml",
-        "DEL: /opt/corvan/zor/config/ZorTrace.properties",
-        "DEL: /opt/corvan/zor/config/xss/schema.xss",
-        "RMDIR: /opt/corvan/zor/config/xss"])
+""",
+    )
+    same_lines(
+        sorted(config.splitlines()),
+        [
+            "DEL: /opt/corvan/zor/config/Zor.properties",
+            "DEL: /opt/corvan/zor/config/ZorHWConfig.xml",
+            "DEL: /opt/corvan/zor/config/ZorTrace.properties",
+            "DEL: /opt/corvan/zor/config/xss/schema.xss",
+            "RMDIR: /opt/corvan/zor/config/xss",
+        ],
+    )
     same_text(after, "RMDIR: /opt/corvan/zor/cache_data\n" + SHARED_END)
-    same_text(machine.listing("/opt"), """\
+    same_text(
+        machine.listing("/opt"),
+        """\
 d 0755 /opt
 d 0755 /opt/corvan
 d 0755 /opt/corvan/zor
@@ -471,7 +537,8 @@ f 0755 /opt/corvan/zor/bin/libzorcore.so
 f 0755 /opt/corvan/zor/bin/trawlcfg
 f 0755 /opt/corvan/zor/bin/trawlfs
 f 0755 /opt/corvan/zor/bin/trawlhw
-""")
+""",
+    )
 
 
 def test_with_an_index_that_cannot_be_written_the_known_places_are_deleted(machine):
@@ -480,7 +547,11 @@ def test_with_an_index_that_cannot_be_written_the_known_places_are_deleted(machi
 
     outcome = remove(machine)
 
-    same_text(with_sorted_deletions(outcome.stdout), FOUND + STOPPED + """\
+    same_text(
+        with_sorted_deletions(outcome.stdout),
+        FOUND
+        + STOPPED
+        + """\
 DEL: /opt/corvan/zor/install/rmdirs.sh
 DEL: /opt/corvan/zor/install/trawlcfg.sh
 DEL: /opt/corvan/zor/install/zor_install.properties
@@ -502,24 +573,45 @@ RMDIR: /opt/corvan/zor/config
 RMDIR: /opt/corvan/zor/cache_data
 DEL: /opt/corvan/zor/ZOR_files
 RMDIR: /opt/corvan/zor
-""" + SHARED_END)
+"""
+        + SHARED_END,
+    )
     same_text(machine.listing("/etc", "/opt", "/usr/kel"), LEFT)
 
 
 # Files that somebody added.
 
-ORDERS = pytest.mark.parametrize("prepare", [lambda machine: None, without_index],
-                                 ids=["by the index", "by known places"])
+ORDERS = pytest.mark.parametrize(
+    "prepare", [lambda machine: None, without_index], ids=["by the index", "by known places"]
+)
 
 
 @ORDERS
-@pytest.mark.parametrize("path", [
-    "config/mine", "config/deep/er/mine", "config/xss/mine", "properties/mine",
-    "properties/deep/mine", "cache_data/mine", "cache_data/deep/mine", "install/mine",
-    "logs/mine", "_uninst/mine", "bin/etc/mine", "bin/etc/trawlhw/mine", "bin/etc/trawluse/mine",
-    "bin/etc/trawlnet/mine", "bin/etc/trawlfs/mine", "bin/etc/trawlsw/mine",
-    "bin/etc/trawlvpd/mine", "install/QMX_CLI/mine", "install/QMX_CLI/linux-ix86/mine",
-    "install/QMX_CLI/linux-ix86/msg_cat/mine"])
+@pytest.mark.parametrize(
+    "path",
+    [
+        "config/mine",
+        "config/deep/er/mine",
+        "config/xss/mine",
+        "properties/mine",
+        "properties/deep/mine",
+        "cache_data/mine",
+        "cache_data/deep/mine",
+        "install/mine",
+        "logs/mine",
+        "_uninst/mine",
+        "bin/etc/mine",
+        "bin/etc/trawlhw/mine",
+        "bin/etc/trawluse/mine",
+        "bin/etc/trawlnet/mine",
+        "bin/etc/trawlfs/mine",
+        "bin/etc/trawlsw/mine",
+        "bin/etc/trawlvpd/mine",
+        "install/QMX_CLI/mine",
+        "install/QMX_CLI/linux-ix86/mine",
+        "install/QMX_CLI/linux-ix86/msg_cat/mine",
+    ],
+)
 def test_an_added_file_is_deleted_with_the_toolkit(machine, prepare, path):
     install(machine)
     prepare(machine)
@@ -531,10 +623,18 @@ def test_an_added_file_is_deleted_with_the_toolkit(machine, prepare, path):
     same_text(machine.listing("/etc", "/opt", "/usr/kel"), LEFT)
 
 
-@pytest.mark.parametrize("path", [
-    "bin/mine", "bin/plugins/mine", "bin/customscanners/mine", "mine",
-    "install/QMX_CLI/linux-ix86/bin/mine", "install/QMX_CLI/linux-ix86/lib/mine",
-    "install/QMX_CLI/linux-ix86/msg_cat/C/mine"])
+@pytest.mark.parametrize(
+    "path",
+    [
+        "bin/mine",
+        "bin/plugins/mine",
+        "bin/customscanners/mine",
+        "mine",
+        "install/QMX_CLI/linux-ix86/bin/mine",
+        "install/QMX_CLI/linux-ix86/lib/mine",
+        "install/QMX_CLI/linux-ix86/msg_cat/C/mine",
+    ],
+)
 def test_an_added_file_stays_where_only_empty_directories_are_removed(machine, path):
     install(machine)
     machine.plant(f"{HOME}/{path}", "mine")
@@ -546,10 +646,18 @@ def test_an_added_file_stays_where_only_empty_directories_are_removed(machine, p
     assert not machine.exists("/etc/zor")
 
 
-@pytest.mark.parametrize("path", [
-    "bin/mine", "bin/plugins/mine", "bin/customscanners/mine", "mine",
-    "install/QMX_CLI/linux-ix86/bin/mine", "install/QMX_CLI/linux-ix86/lib/mine",
-    "install/QMX_CLI/linux-ix86/msg_cat/C/mine"])
+@pytest.mark.parametrize(
+    "path",
+    [
+        "bin/mine",
+        "bin/plugins/mine",
+        "bin/customscanners/mine",
+        "mine",
+        "install/QMX_CLI/linux-ix86/bin/mine",
+        "install/QMX_CLI/linux-ix86/lib/mine",
+        "install/QMX_CLI/linux-ix86/msg_cat/C/mine",
+    ],
+)
 def test_by_known_places_an_added_file_is_deleted_there_too(machine, path):
     install(machine)
     without_index(machine)
@@ -561,9 +669,19 @@ def test_by_known_places_an_added_file_is_deleted_there_too(machine, path):
 
 
 @ORDERS
-@pytest.mark.parametrize("path", [
-    "logs/deep/mine", "_uninst/deep/mine", "bin/etc/other/mine", "bin/etc/trawlhw/deep/mine",
-    "bin/other/mine", "other/mine", "install/other/mine", "install/QMX_CLI/other/mine"])
+@pytest.mark.parametrize(
+    "path",
+    [
+        "logs/deep/mine",
+        "_uninst/deep/mine",
+        "bin/etc/other/mine",
+        "bin/etc/trawlhw/deep/mine",
+        "bin/other/mine",
+        "other/mine",
+        "install/other/mine",
+        "install/QMX_CLI/other/mine",
+    ],
+)
 def test_an_added_directory_stays_where_only_files_are_deleted(machine, prepare, path):
     install(machine)
     prepare(machine)
@@ -594,9 +712,16 @@ def test_files_beside_a_directory_that_stays_are_deleted(machine, prepare):
 def test_empty_directories_of_the_layout_are_removed(machine, prepare):
     install(machine)
     prepare(machine)
-    for path in ("_uninst", "install/QMX_CLI/linux-ix86/bin", "install/QMX_CLI/linux-ix86/lib",
-                 "install/QMX_CLI/linux-ix86/msg_cat/C", "bin/etc/trawlvpd", "bin/plugins",
-                 "bin/customscanners", "logs"):
+    for path in (
+        "_uninst",
+        "install/QMX_CLI/linux-ix86/bin",
+        "install/QMX_CLI/linux-ix86/lib",
+        "install/QMX_CLI/linux-ix86/msg_cat/C",
+        "bin/etc/trawlvpd",
+        "bin/plugins",
+        "bin/customscanners",
+        "logs",
+    ):
         machine.make_directory(f"{HOME}/{path}")
 
     remove(machine)
@@ -606,51 +731,28 @@ def test_empty_directories_of_the_layout_are_removed(machine, prepare):
 
 def test_the_directories_are_removed_in_a_fixed_order_by_the_index(machine):
     install(machine)
-    for path in ("_uninst", "install/QMX_CLI/linux-ix86/bin", "install/QMX_CLI/linux-ix86/lib",
-                 "install/QMX_CLI/linux-ix86/msg_cat/C", "bin/etc/trawlhw", "bin/etc/trawluse",
-                 "bin/etc/trawlnet", "bin/etc/trawlfs", "bin/etc/trawlsw", "bin/etc/trawlvpd",
-                 "bin/plugins", "bin/customscanners", "logs"):
+    for path in (
+        "_uninst",
+        "install/QMX_CLI/linux-ix86/bin",
+        "install/QMX_CLI/linux-ix86/lib",
+        "install/QMX_CLI/linux-ix86/msg_cat/C",
+        "bin/etc/trawlhw",
+        "bin/etc/trawluse",
+        "bin/etc/trawlnet",
+        "bin/etc/trawlfs",
+        "bin/etc/trawlsw",
+        "bin/etc/trawlvpd",
+        "bin/plugins",
+        "bin/customscanners",
+        "logs",
+    ):
         machine.make_directory(f"{HOME}/{path}")
 
     # Those removed only if empty are removed without a message.
-    printed_lines(remove(machine),
-                  "RM FILE: /opt/corvan/zor/zor.log.bak",
-                  "RMDIR: /opt/corvan/zor/_uninst",
-                  "RMDIR: /opt/corvan/zor/install/QMX_CLI/linux-ix86/msg_cat",
-                  "RMDIR: /opt/corvan/zor/install/QMX_CLI/linux-ix86",
-                  "RMDIR: /opt/corvan/zor/install/QMX_CLI",
-                  "RMDIR: /opt/corvan/zor/install",
-                  "RMDIR: /opt/corvan/zor/bin/etc/trawlhw",
-                  "RMDIR: /opt/corvan/zor/bin/etc/trawluse",
-                  "RMDIR: /opt/corvan/zor/bin/etc/trawlnet",
-                  "RMDIR: /opt/corvan/zor/bin/etc/trawlfs",
-                  "RMDIR: /opt/corvan/zor/bin/etc/trawlsw",
-                  "RMDIR: /opt/corvan/zor/bin/etc/trawlvpd",
-                  "RMDIR: /opt/corvan/zor/bin/etc",
-                  "RMDIR: /opt/corvan/zor/properties",
-                  "RMDIR: /opt/corvan/zor/config/xss",
-                  "RMDIR: /opt/corvan/zor/config",
-                  "RMDIR: /opt/corvan/zor/logs",
-                  "RMDIR: /opt/corvan/zor/cache_data",
-                  "RMDIR: /usr/kel/corvan/common/ZOR/logs")
-
-
-def test_the_directories_are_removed_in_a_fixed_order_by_known_places(machine):
-    install(machine)
-    without_index(machine)
-    for path in ("_uninst", "install/QMX_CLI/linux-ix86/bin", "install/QMX_CLI/linux-ix86/lib",
-                 "install/QMX_CLI/linux-ix86/msg_cat/C", "bin/etc/trawlhw", "bin/etc/trawluse",
-                 "bin/etc/trawlnet", "bin/etc/trawlfs", "bin/etc/trawlsw", "bin/etc/trawlvpd",
-                 "bin/plugins", "bin/customscanners", "logs"):
-        machine.make_directory(f"{HOME}/{path}")
-
-    outcome = remove(machine)
-
-    same_lines([line for line in outcome.stdout.splitlines() if line.startswith("RMDIR: ")], [
+    printed_lines(
+        remove(machine),
+        "RM FILE: /opt/corvan/zor/zor.log.bak",
         "RMDIR: /opt/corvan/zor/_uninst",
-        "RMDIR: /opt/corvan/zor/install/QMX_CLI/linux-ix86/bin",
-        "RMDIR: /opt/corvan/zor/install/QMX_CLI/linux-ix86/lib",
-        "RMDIR: /opt/corvan/zor/install/QMX_CLI/linux-ix86/msg_cat/C",
         "RMDIR: /opt/corvan/zor/install/QMX_CLI/linux-ix86/msg_cat",
         "RMDIR: /opt/corvan/zor/install/QMX_CLI/linux-ix86",
         "RMDIR: /opt/corvan/zor/install/QMX_CLI",
@@ -662,18 +764,69 @@ def test_the_directories_are_removed_in_a_fixed_order_by_known_places(machine):
         "RMDIR: /opt/corvan/zor/bin/etc/trawlsw",
         "RMDIR: /opt/corvan/zor/bin/etc/trawlvpd",
         "RMDIR: /opt/corvan/zor/bin/etc",
-        "RMDIR: /opt/corvan/zor/bin/plugins",
-        "RMDIR: /opt/corvan/zor/bin/customscanners",
-        "RMDIR: /opt/corvan/zor/bin",
         "RMDIR: /opt/corvan/zor/properties",
         "RMDIR: /opt/corvan/zor/config/xss",
         "RMDIR: /opt/corvan/zor/config",
         "RMDIR: /opt/corvan/zor/logs",
         "RMDIR: /opt/corvan/zor/cache_data",
-        "RMDIR: /opt/corvan/zor",
         "RMDIR: /usr/kel/corvan/common/ZOR/logs",
-        "RMDIR: /usr/kel/corvan/common/ZOR",
-        "RMDIR: /etc/zor"])
+    )
+
+
+def test_the_directories_are_removed_in_a_fixed_order_by_known_places(machine):
+    install(machine)
+    without_index(machine)
+    for path in (
+        "_uninst",
+        "install/QMX_CLI/linux-ix86/bin",
+        "install/QMX_CLI/linux-ix86/lib",
+        "install/QMX_CLI/linux-ix86/msg_cat/C",
+        "bin/etc/trawlhw",
+        "bin/etc/trawluse",
+        "bin/etc/trawlnet",
+        "bin/etc/trawlfs",
+        "bin/etc/trawlsw",
+        "bin/etc/trawlvpd",
+        "bin/plugins",
+        "bin/customscanners",
+        "logs",
+    ):
+        machine.make_directory(f"{HOME}/{path}")
+
+    outcome = remove(machine)
+
+    same_lines(
+        [line for line in outcome.stdout.splitlines() if line.startswith("RMDIR: ")],
+        [
+            "RMDIR: /opt/corvan/zor/_uninst",
+            "RMDIR: /opt/corvan/zor/install/QMX_CLI/linux-ix86/bin",
+            "RMDIR: /opt/corvan/zor/install/QMX_CLI/linux-ix86/lib",
+            "RMDIR: /opt/corvan/zor/install/QMX_CLI/linux-ix86/msg_cat/C",
+            "RMDIR: /opt/corvan/zor/install/QMX_CLI/linux-ix86/msg_cat",
+            "RMDIR: /opt/corvan/zor/install/QMX_CLI/linux-ix86",
+            "RMDIR: /opt/corvan/zor/install/QMX_CLI",
+            "RMDIR: /opt/corvan/zor/install",
+            "RMDIR: /opt/corvan/zor/bin/etc/trawlhw",
+            "RMDIR: /opt/corvan/zor/bin/etc/trawluse",
+            "RMDIR: /opt/corvan/zor/bin/etc/trawlnet",
+            "RMDIR: /opt/corvan/zor/bin/etc/trawlfs",
+            "RMDIR: /opt/corvan/zor/bin/etc/trawlsw",
+            "RMDIR: /opt/corvan/zor/bin/etc/trawlvpd",
+            "RMDIR: /opt/corvan/zor/bin/etc",
+            "RMDIR: /opt/corvan/zor/bin/plugins",
+            "RMDIR: /opt/corvan/zor/bin/customscanners",
+            "RMDIR: /opt/corvan/zor/bin",
+            "RMDIR: /opt/corvan/zor/properties",
+            "RMDIR: /opt/corvan/zor/config/xss",
+            "RMDIR: /opt/corvan/zor/config",
+            "RMDIR: /opt/corvan/zor/logs",
+            "RMDIR: /opt/corvan/zor/cache_data",
+            "RMDIR: /opt/corvan/zor",
+            "RMDIR: /usr/kel/corvan/common/ZOR/logs",
+            "RMDIR: /usr/kel/corvan/common/ZOR",
+            "RMDIR: /etc/zor",
+        ],
+    )
 
 
 @ORDERS
@@ -713,7 +866,9 @@ def test_files_that_a_user_may_not_delete_stay_and_the_removal_succeeds(machine)
 
     printed_lines(outcome, "RM FILE: /home/ann/corvan/zor/bin/trawlcfg")
     printed_lines(outcome, "DEL: /home/ann/corvan/zor/config/xss/schema.xss")
-    same_text(machine.listing("/home/ann"), """\
+    same_text(
+        machine.listing("/home/ann"),
+        """\
 d 0755 /home/ann
 d 0755 /home/ann/corvan
 d 0755 /home/ann/corvan/zor
@@ -726,7 +881,8 @@ f 0755 /home/ann/corvan/zor/bin/trawlhw
 d 0755 /home/ann/corvan/zor/config
 d 0555 /home/ann/corvan/zor/config/xss
 f 0755 /home/ann/corvan/zor/config/xss/schema.xss
-""")
+""",
+    )
 
 
 def test_a_directory_that_a_user_may_not_read_stays(machine):
@@ -741,25 +897,27 @@ def test_a_directory_that_a_user_may_not_read_stays(machine):
 
 # The common directory and the registry's directory.
 
+
 def test_files_of_the_common_log_directory_are_deleted(machine):
     install(machine)
     machine.plant("/usr/kel/corvan/common/ZOR/logs/log", "x")
     machine.plant("/usr/kel/corvan/common/ZOR/file", "x")
 
-    printed_lines(remove(machine),
-                  "DEL: /usr/kel/corvan/common/ZOR/logs/log",
-                  "RMDIR: /usr/kel/corvan/common/ZOR/logs",
-                  "DEL: /usr/kel/corvan/common/ZOR/file",
-                  "RMDIR: /usr/kel/corvan/common/ZOR",
-                  "DEL: /etc/zor/zor.ini")
+    printed_lines(
+        remove(machine),
+        "DEL: /usr/kel/corvan/common/ZOR/logs/log",
+        "RMDIR: /usr/kel/corvan/common/ZOR/logs",
+        "DEL: /usr/kel/corvan/common/ZOR/file",
+        "RMDIR: /usr/kel/corvan/common/ZOR",
+        "DEL: /etc/zor/zor.ini",
+    )
 
 
 def test_a_directory_in_the_common_log_directory_keeps_it(machine):
     install(machine)
     machine.plant("/usr/kel/corvan/common/ZOR/logs/deep/log", "kept")
 
-    printed_lines(remove(machine), "RMDIR: /opt/corvan/zor/cache_data",
-                  "DEL: /etc/zor/zor.ini")
+    printed_lines(remove(machine), "RMDIR: /opt/corvan/zor/cache_data", "DEL: /etc/zor/zor.ini")
 
     assert machine.read("/usr/kel/corvan/common/ZOR/logs/deep/log") == "kept"
 
@@ -779,8 +937,12 @@ def test_a_missing_common_directory_is_no_trouble(machine):
     install(machine)
     machine.remove("/usr/kel")
 
-    printed_lines(remove(machine), "RMDIR: /opt/corvan/zor/cache_data",
-                  "DEL: /etc/zor/zor.ini", "RMDIR: /etc/zor")
+    printed_lines(
+        remove(machine),
+        "RMDIR: /opt/corvan/zor/cache_data",
+        "DEL: /etc/zor/zor.ini",
+        "RMDIR: /etc/zor",
+    )
 
 
 def test_a_common_directory_of_the_administrators_choice_is_cleaned(machine):
@@ -788,8 +950,9 @@ def test_a_common_directory_of_the_administrators_choice_is_cleaned(machine):
     install(machine)
     machine.make_directory("/usr/kel/corvan/common/ZOR/logs")
 
-    printed_lines(remove(machine), "RMDIR: /srv/c/ZOR/logs", "RMDIR: /srv/c/ZOR",
-                  "DEL: /etc/zor/zor.ini")
+    printed_lines(
+        remove(machine), "RMDIR: /srv/c/ZOR/logs", "RMDIR: /srv/c/ZOR", "DEL: /etc/zor/zor.ini"
+    )
 
     assert machine.exists("/srv/c")
     assert machine.exists("/usr/kel/corvan/common/ZOR/logs")
@@ -808,8 +971,12 @@ def test_a_registry_directory_that_is_not_empty_is_told_as_removed_all_the_same(
     install(machine)
     machine.plant("/etc/zor/foreign", "kept")
 
-    printed_lines(remove(machine), "DEL: /etc/zor/zor.ini", "RMDIR: /etc/zor",
-                  "Uninstallation successful, removing temporary files")
+    printed_lines(
+        remove(machine),
+        "DEL: /etc/zor/zor.ini",
+        "RMDIR: /etc/zor",
+        "Uninstallation successful, removing temporary files",
+    )
 
     assert machine.read("/etc/zor/foreign") == "kept"
     assert not machine.exists("/etc/zor/zor.ini")
@@ -855,9 +1022,18 @@ def test_a_removed_toolkit_can_be_installed_again(machine):
     same_tree(after, before)
 
 
-@pytest.mark.parametrize("options", [("-n",), ("-r",), ("-norollback",), ("-eeo", "-z"),
-                                     ("-f", "provider_cache"), ("-c", "/var/trace"),
-                                     ("-s", "/no/such.spb")])
+@pytest.mark.parametrize(
+    "options",
+    [
+        ("-n",),
+        ("-r",),
+        ("-norollback",),
+        ("-eeo", "-z"),
+        ("-f", "provider_cache"),
+        ("-c", "/var/trace"),
+        ("-s", "/no/such.spb"),
+    ],
+)
 def test_options_of_the_installation_change_nothing_in_a_removal(machine, options):
     install(machine)
 

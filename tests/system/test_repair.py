@@ -27,7 +27,9 @@ def repair(machine, *options, exploiter="ABC"):
 def test_a_repair_prints_its_progress(machine):
     break_installation(machine)
 
-    printed(repair(machine), """\
+    printed(
+        repair(machine),
+        """\
 SPB file: /media/toolkit.spb
 ZOR version: 22/12/02zor_9.2.30.0000
 Install type: global
@@ -67,7 +69,8 @@ Exec '/opt/corvan/zor/bin/trawlcfg -enable all >/dev/null 2>&1' returned 0
 Installation successful, committing changes
 RMDIR: /opt/corvan/zor/cache_data
 Done.
-""")
+""",
+    )
 
 
 def test_a_repair_brings_the_scanner_control_back(machine):
@@ -83,10 +86,12 @@ def test_an_empty_scanner_control_is_repaired_too(machine):
     break_installation(machine)
     machine.plant(CONTROL, "", 0o755)
 
-    printed_lines(repair(machine),
-                  "*** Error: found /opt/corvan/zor/bin/trawlcfg with invalid size.",
-                  "ZOR broken in existing location, forcing update.",
-                  "Log file is: /opt/corvan/zor/ZOR_files")
+    printed_lines(
+        repair(machine),
+        "*** Error: found /opt/corvan/zor/bin/trawlcfg with invalid size.",
+        "ZOR broken in existing location, forcing update.",
+        "Log file is: /opt/corvan/zor/ZOR_files",
+    )
 
     assert machine.read(CONTROL).startswith("#!/bin/sh\n")
 
@@ -95,8 +100,10 @@ def test_an_empty_scanner_control_is_repaired_too(machine):
 def test_a_broken_installation_of_any_version_is_deployed_again(machine, version):
     break_installation(machine, version)
 
-    printed_lines(repair(machine), "Installed ZOR is older (or the same version), performing "
-                                   "upgrade (deploying files)")
+    printed_lines(
+        repair(machine),
+        "Installed ZOR is older (or the same version), performing upgrade (deploying files)",
+    )
 
     assert machine.read("/etc/zor/zor.ini").startswith("ZOR_Version = 9.2.30.0000\n")
     assert machine.exists(CONTROL)
@@ -106,27 +113,35 @@ def test_a_broken_installation_of_a_later_build_date_is_only_registered(machine)
     # The fourth number of this build is 0 and cannot be lowered, so the date decides.
     break_installation(machine, "10.0.0.0000", "23/01/01")
 
-    printed_lines(repair(machine, exploiter="XYZ"),
-                  "ZOR broken in existing location, forcing update.",
-                  "Log file is: /opt/corvan/zor/ZOR_files",
-                  "currentZorHome = '/opt/corvan/zor' currentCfgHome = '/opt/corvan/zor'",
-                  "Installed ZOR is not older than this version, updating exploiters only")
+    printed_lines(
+        repair(machine, exploiter="XYZ"),
+        "ZOR broken in existing location, forcing update.",
+        "Log file is: /opt/corvan/zor/ZOR_files",
+        "currentZorHome = '/opt/corvan/zor' currentCfgHome = '/opt/corvan/zor'",
+        "Installed ZOR is not older than this version, updating exploiters only",
+    )
 
     assert not machine.exists(CONTROL)
-    same_text(machine.read("/etc/zor/zor.ini"), """\
+    same_text(
+        machine.read("/etc/zor/zor.ini"),
+        """\
 ZOR_Version = 9.2.30.0000
 ZOR_BuildDate = 23/01/01
 ZOR_HomeDirectory = /opt/corvan/zor
 ZOR_Exploiters = ABC:XYZ:
 ZOR_ConfigRootDirectory = /opt/corvan/zor
-""")
+""",
+    )
 
 
 def test_a_repair_keeps_the_exploiters_and_adds_the_caller(machine):
     break_installation(machine)
 
-    printed_lines(repair(machine, exploiter="XYZ"), "Adding exploiter XYZ to INI file",
-                  "Saving INI file to /etc/zor/zor.ini")
+    printed_lines(
+        repair(machine, exploiter="XYZ"),
+        "Adding exploiter XYZ to INI file",
+        "Saving INI file to /etc/zor/zor.ini",
+    )
 
     assert "\nZOR_Exploiters = ABC:XYZ:\n" in machine.read("/etc/zor/zor.ini")
 
@@ -167,9 +182,12 @@ def test_a_repair_cannot_do_without_the_settings_file(machine):
     outcome = machine.run("i", "ABC", "-s", SPB)
 
     assert outcome.status == 1
-    printed_lines(outcome, "Could not load property file",
-                  "Exec '/opt/corvan/zor/bin/trawlcfg -enable all >/dev/null 2>&1' returned 0",
-                  "Installation failed, rolling back")
+    printed_lines(
+        outcome,
+        "Could not load property file",
+        "Exec '/opt/corvan/zor/bin/trawlcfg -enable all >/dev/null 2>&1' returned 0",
+        "Installation failed, rolling back",
+    )
     rolled_back(machine, before, FILE_INDEX, PROPERTIES_DIRECTORY, XSS_FILES)
 
 
@@ -179,7 +197,9 @@ def test_a_broken_installation_is_not_removed(machine):
 
     outcome = machine.run("r", "ABC")
 
-    printed(outcome, """\
+    printed(
+        outcome,
+        """\
 ZOR version: 22/12/02zor_9.2.30.0000
 Install type: global
 Register exploiter: yes
@@ -192,17 +212,20 @@ Log file is: /opt/corvan/zor/ZOR_files
 currentZorHome = '/opt/corvan/zor' currentCfgHome = '/opt/corvan/zor'
 *** Error: INI file not found: nothing to remove.
 Done.
-""", status=1)
+""",
+        status=1,
+    )
     same_tree(machine.tree(), before)
 
 
-def test_a_broken_installation_elsewhere_is_looked_for_in_the_given_directory_by_a_removal(
-        machine):
+def test_a_broken_installation_elsewhere_is_looked_for_in_the_given_directory_by_a_removal(machine):
     break_installation(machine)
 
-    printed_lines(machine.run("r", "ABC", "-d", "/opt/given"),
-                  "*** Error: cannot find /opt/corvan/zor/bin/trawlcfg in INI home dir.",
-                  "Log file is: /opt/given/ZOR_files")
+    printed_lines(
+        machine.run("r", "ABC", "-d", "/opt/given"),
+        "*** Error: cannot find /opt/corvan/zor/bin/trawlcfg in INI home dir.",
+        "Log file is: /opt/given/ZOR_files",
+    )
 
 
 def test_an_installation_that_cannot_be_written_is_not_repaired_but_installed_afresh(machine):
@@ -214,10 +237,15 @@ def test_an_installation_that_cannot_be_written_is_not_repaired_but_installed_af
     outcome = machine.run("i", "ABC", "-s", SPB, user=ANN)
 
     not_printed(outcome, "forcing update")
-    printed_lines(outcome, "*** Error: cannot create file in INI home dir.",
-                  "Log file is: /home/ann/corvan/zor/ZOR_files")
-    printed_lines(outcome, "Performing fresh install on /home/ann/corvan/zor "
-                           "(config=/home/ann/corvan/zor/config)")
+    printed_lines(
+        outcome,
+        "*** Error: cannot create file in INI home dir.",
+        "Log file is: /home/ann/corvan/zor/ZOR_files",
+    )
+    printed_lines(
+        outcome,
+        "Performing fresh install on /home/ann/corvan/zor (config=/home/ann/corvan/zor/config)",
+    )
 
 
 def test_a_per_user_installation_is_repaired_too(machine):
@@ -239,8 +267,11 @@ def test_files_in_a_directory_that_must_not_be_searched_cannot_be_opened(machine
 
     assert outcome.status == 1
     printed_lines(outcome, "ZOR broken in existing location, forcing update.")
-    printed_lines(outcome, "Bin dir file extraction failed",
-                  "File extraction failed, error = 2 (Cannot open file for writing)")
+    printed_lines(
+        outcome,
+        "Bin dir file extraction failed",
+        "File extraction failed, error = 2 (Cannot open file for writing)",
+    )
 
 
 def test_a_registry_that_must_not_be_searched_for_cannot_be_opened(machine):

@@ -11,7 +11,8 @@ STOP_COMMANDS = [
     "/opt/corvan/zor/bin/trawlfs [-shutdown]",
     "/opt/corvan/zor/bin/trawlcfg [-disable] [all]",
     "/opt/corvan/zor/bin/trawlcfg [-shutdown] [all] [-timeout] [60] [-force]",
-    "/opt/corvan/zor/bin/trawlcfg [-shutdown] [all] [-timeout] [120]"]
+    "/opt/corvan/zor/bin/trawlcfg [-shutdown] [all] [-timeout] [120]",
+]
 
 START_COMMAND = "/opt/corvan/zor/bin/trawlcfg [-enable] [all]"
 
@@ -26,7 +27,8 @@ def install(machine, *options, **how):
 @pytest.mark.parametrize("failing", ["trawlfs", "-disable", "-force", "-timeout 120", "trawl"])
 @pytest.mark.parametrize("options", [(), ("-eeo", "-z")], ids=["", "-z"])
 def test_a_failing_stop_command_does_not_keep_the_later_ones_from_running(
-        machine, failing, options):
+    machine, failing, options
+):
     install(machine)
     machine.let_commands_fail((failing, 5))
 
@@ -42,12 +44,13 @@ def test_a_missing_file_system_scanner_shows_as_the_shells_status(machine):
     printed_lines(
         outcome,
         "Exec '/opt/corvan/zor/bin/trawlfs -shutdown >/dev/null 2>&1' returned 32512",
-        "Exec '/opt/corvan/zor/bin/trawlcfg -disable all >/dev/null 2>&1' returned 0")
+        "Exec '/opt/corvan/zor/bin/trawlcfg -disable all >/dev/null 2>&1' returned 0",
+    )
     same_lines(outcome.commands, STOP_COMMANDS[1:] + [START_COMMAND])
 
 
 def test_the_old_programs_stop_the_scanners_and_the_new_one_starts_them(machine):
-    script = b"#!/bin/sh\necho new \"$@\" >>/var/scanners/commands\n"
+    script = b'#!/bin/sh\necho new "$@" >>/var/scanners/commands\n'
     install(machine)
     machine.pack({"bin/trawlcfg": script, "bin/trawlfs": script})
 
@@ -56,18 +59,24 @@ def test_the_old_programs_stop_the_scanners_and_the_new_one_starts_them(machine)
 
 def test_the_scanners_are_stopped_before_the_first_file_is_touched(machine):
     install(machine)
-    machine.plant(HOME + "/bin/trawlcfg", "#!/bin/sh\ntest -e /opt/corvan/zor/properties/scan."
-                  "properties && echo there \"$1\" >>/var/scanners/commands\n", 0o755)
+    machine.plant(
+        HOME + "/bin/trawlcfg",
+        "#!/bin/sh\ntest -e /opt/corvan/zor/properties/scan."
+        'properties && echo there "$1" >>/var/scanners/commands\n',
+        0o755,
+    )
 
-    same_lines(install(machine).commands[1:4], ["there -disable", "there -shutdown",
-                                                "there -shutdown"])
+    same_lines(
+        install(machine).commands[1:4], ["there -disable", "there -shutdown", "there -shutdown"]
+    )
 
 
 def test_the_scanners_are_started_when_the_registry_is_written(machine):
     install(machine)
     machine.register(version="9.0.0.0000")
-    machine.pack({"bin/trawlcfg": b"#!/bin/sh\nhead -n 1 /etc/zor/zor.ini "
-                                  b">>/var/scanners/commands\n"})
+    machine.pack(
+        {"bin/trawlcfg": b"#!/bin/sh\nhead -n 1 /etc/zor/zor.ini >>/var/scanners/commands\n"}
+    )
 
     same_lines(install(machine).commands[4:], ["ZOR_Version = 9.2.30.0000"])
 
@@ -98,9 +107,13 @@ def test_the_programs_of_a_per_user_installation_are_its_own(machine):
 
     outcome = install(machine, user=ANN)
 
-    same_lines(outcome.commands, [
-        line.replace("/opt/corvan/zor", "/home/ann/corvan/zor")
-        for line in STOP_COMMANDS + [START_COMMAND]])
+    same_lines(
+        outcome.commands,
+        [
+            line.replace("/opt/corvan/zor", "/home/ann/corvan/zor")
+            for line in STOP_COMMANDS + [START_COMMAND]
+        ],
+    )
 
 
 def test_a_failing_restart_is_not_told_when_it_succeeds(machine):
@@ -114,8 +127,11 @@ def test_a_failing_restart_leaves_the_upgrade_committed(machine, options):
     install(machine)
     machine.let_commands_fail(("-enable", 1))
 
-    printed_lines(install(machine, *options), "*** Error: could not restart ZOR.",
-                  "Installation successful, committing changes")
+    printed_lines(
+        install(machine, *options),
+        "*** Error: could not restart ZOR.",
+        "Installation successful, committing changes",
+    )
 
 
 @pytest.mark.parametrize("options", [(), ("-eeo", "-z")], ids=["", "-z"])
@@ -142,13 +158,17 @@ def test_debug_mode_shows_the_output_of_each_command_in_its_place(machine):
         "scanner control output: -shutdown all -timeout 60 -force",
         "Exec '/opt/corvan/zor/bin/trawlcfg -shutdown all -timeout 60 -force' returned 0",
         "scanner control output: -shutdown all -timeout 120",
-        "Exec '/opt/corvan/zor/bin/trawlcfg -shutdown all -timeout 120' returned 0")
-    assert outcome.stderr == """\
+        "Exec '/opt/corvan/zor/bin/trawlcfg -shutdown all -timeout 120' returned 0",
+    )
+    assert (
+        outcome.stderr
+        == """\
 scanner control error: -shutdown
 scanner control error: -disable all
 scanner control error: -shutdown all -timeout 60 -force
 scanner control error: -shutdown all -timeout 120
 """
+    )
 
 
 def test_without_debug_mode_nothing_of_a_commands_output_is_seen(machine):

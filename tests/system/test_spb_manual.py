@@ -23,8 +23,9 @@ def section(title):
 
 
 def test_the_manual_page_renders_without_a_warning(page):
-    done = subprocess.run(["groff", "-ww", "-man", "-Tutf8"], input=page, capture_output=True,
-                          check=False)
+    done = subprocess.run(
+        ["groff", "-ww", "-man", "-Tutf8"], input=page, capture_output=True, check=False
+    )
 
     assert (done.returncode, done.stderr) == (0, b"")
     assert b"pack, list and check SPBs" in done.stdout

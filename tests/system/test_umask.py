@@ -6,10 +6,11 @@ from harness.checks import same_text
 from harness.installations import ANNS_TREE, SHARED_TREE
 from harness.machine import ANN, SPB
 
-UMASKS = pytest.mark.parametrize("umask", [0o000, 0o022, 0o077, 0o777],
-                                 ids=["000", "022", "077", "777"])
+UMASKS = pytest.mark.parametrize(
+    "umask", [0o000, 0o022, 0o077, 0o777], ids=["000", "022", "077", "777"]
+)
 
-REPORTING_SCANNER_CONTROL = b"#!/bin/sh\necho \"$1 $(umask)\" >>/var/scanners/umasks\n"
+REPORTING_SCANNER_CONTROL = b'#!/bin/sh\necho "$1 $(umask)" >>/var/scanners/umasks\n'
 
 
 @UMASKS

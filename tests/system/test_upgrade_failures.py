@@ -44,12 +44,15 @@ RMDIR: /opt/corvan/zor/properties
 Starting file extraction...
 """
 
-UP_TO_PROPERTIES = UP_TO_EXTRACTION + """\
+UP_TO_PROPERTIES = (
+    UP_TO_EXTRACTION
+    + """\
 Extracting configs to '/opt/corvan/zor/config'
 Exec '/usr/sbin/selinuxenabled >/dev/null 2>&1' returned 32512
 SELinux not enabled or not supported
 Customizing properties file: /opt/corvan/zor/config/Zor.properties
 """
+)
 
 RESTARTED_AND_FAILED = """\
 Exec '/opt/corvan/zor/bin/trawlcfg -enable all >/dev/null 2>&1' returned 0
@@ -81,16 +84,23 @@ def test_a_missing_package_is_told_after_the_properties_are_gone(machine):
 
     outcome = fail(machine)
 
-    printed(outcome, UP_TO_EXTRACTION +
-            "*** Error: package not found or not valid.\n"
-            "File extraction failed\n" + RESTARTED_AND_FAILED, status=1)
+    printed(
+        outcome,
+        UP_TO_EXTRACTION + "*** Error: package not found or not valid.\n"
+        "File extraction failed\n" + RESTARTED_AND_FAILED,
+        status=1,
+    )
     rolled_back(machine, before, PROPERTIES_DIRECTORY)
 
 
-@pytest.mark.parametrize("empty, told", [
-    ("bin/empty", "Bin dir file extraction failed\n"),
-    ("properties/empty", ""),
-    ("config/empty", "Extracting configs to '/opt/corvan/zor/config'\n")])
+@pytest.mark.parametrize(
+    "empty, told",
+    [
+        ("bin/empty", "Bin dir file extraction failed\n"),
+        ("properties/empty", ""),
+        ("config/empty", "Extracting configs to '/opt/corvan/zor/config'\n"),
+    ],
+)
 def test_a_failed_extraction_brings_back_the_replaced_files(machine, empty, told):
     install_older(machine)
     machine.pack({empty: b""})
@@ -98,9 +108,14 @@ def test_a_failed_extraction_brings_back_the_replaced_files(machine, empty, told
 
     outcome = fail(machine)
 
-    printed(outcome, UP_TO_EXTRACTION + told +
-            "File extraction failed, error = 1 (Cannot open file for reading)\n"
-            "File extraction failed\n" + RESTARTED_AND_FAILED, status=1)
+    printed(
+        outcome,
+        UP_TO_EXTRACTION
+        + told
+        + "File extraction failed, error = 1 (Cannot open file for reading)\n"
+        "File extraction failed\n" + RESTARTED_AND_FAILED,
+        status=1,
+    )
     rolled_back(machine, before, FILE_INDEX, PROPERTIES_DIRECTORY)
     assert not machine.exists(HOME + "/ZOR_files")
 
@@ -148,15 +163,23 @@ def test_an_older_backup_does_not_come_back(machine):
 
 def test_the_scanners_are_started_again_before_the_rollback(machine):
     install_older(machine)
-    machine.pack({"bin/empty": b"", "bin/trawlcfg": b"#!/bin/sh\necho new \"$@\" "
-                                                   b">>/var/scanners/commands\n"})
+    machine.pack(
+        {
+            "bin/empty": b"",
+            "bin/trawlcfg": b'#!/bin/sh\necho new "$@" >>/var/scanners/commands\n',
+        }
+    )
 
-    same_lines(fail(machine).commands, [
-        "/opt/corvan/zor/bin/trawlfs [-shutdown]",
-        "/opt/corvan/zor/bin/trawlcfg [-disable] [all]",
-        "/opt/corvan/zor/bin/trawlcfg [-shutdown] [all] [-timeout] [60] [-force]",
-        "/opt/corvan/zor/bin/trawlcfg [-shutdown] [all] [-timeout] [120]",
-        "new -enable all"])
+    same_lines(
+        fail(machine).commands,
+        [
+            "/opt/corvan/zor/bin/trawlfs [-shutdown]",
+            "/opt/corvan/zor/bin/trawlcfg [-disable] [all]",
+            "/opt/corvan/zor/bin/trawlcfg [-shutdown] [all] [-timeout] [60] [-force]",
+            "/opt/corvan/zor/bin/trawlcfg [-shutdown] [all] [-timeout] [120]",
+            "new -enable all",
+        ],
+    )
 
 
 def test_a_failing_restart_after_a_failure_is_told(machine):
@@ -164,11 +187,14 @@ def test_a_failing_restart_after_a_failure_is_told(machine):
     machine.remove(SPB)
     machine.let_commands_fail(("-enable", 1))
 
-    printed_lines(fail(machine), "File extraction failed",
-                  "Exec '/opt/corvan/zor/bin/trawlcfg -enable all >/dev/null 2>&1' returned 256",
-                  "*** Error: could not restart ZOR.",
-                  "Installation failed, rolling back",
-                  "Done.")
+    printed_lines(
+        fail(machine),
+        "File extraction failed",
+        "Exec '/opt/corvan/zor/bin/trawlcfg -enable all >/dev/null 2>&1' returned 256",
+        "*** Error: could not restart ZOR.",
+        "Installation failed, rolling back",
+        "Done.",
+    )
 
 
 def test_a_missing_main_property_file_fails_the_upgrade(machine):
@@ -176,10 +202,16 @@ def test_a_missing_main_property_file_fails_the_upgrade(machine):
     machine.remove(MAIN)
     before = machine.tree()
 
-    printed(fail(machine), UP_TO_PROPERTIES + f"""\
+    printed(
+        fail(machine),
+        UP_TO_PROPERTIES
+        + f"""\
 Loading file {MAIN} error: 2 (No such file or directory)
 Could not load property file
-""" + RESTARTED_AND_FAILED, status=1)
+"""
+        + RESTARTED_AND_FAILED,
+        status=1,
+    )
 
     rolled_back(machine, before, FILE_INDEX, PROPERTIES_DIRECTORY, XSS_FILES)
 
@@ -192,13 +224,15 @@ def test_a_main_property_file_that_cannot_be_saved_fails_the_upgrade(machine):
 
     outcome = fail(machine, user=ANN)
 
-    printed_lines(outcome, f"Customizing properties file: {path}",
-                  f"Saving file {path} error: 13 (Permission denied)",
-                  "Could not save property file",
-                  "Exec '/home/ann/corvan/zor/bin/trawlcfg -enable all >/dev/null 2>&1' "
-                  "returned 0",
-                  "Installation failed, rolling back",
-                  "Done.")
+    printed_lines(
+        outcome,
+        f"Customizing properties file: {path}",
+        f"Saving file {path} error: 13 (Permission denied)",
+        "Could not save property file",
+        "Exec '/home/ann/corvan/zor/bin/trawlcfg -enable all >/dev/null 2>&1' returned 0",
+        "Installation failed, rolling back",
+        "Done.",
+    )
     rolled_back(machine, before, FILE_INDEX, PROPERTIES_DIRECTORY, XSS_FILES)
 
 
@@ -208,12 +242,18 @@ def test_a_missing_trace_property_file_fails_the_upgrade(machine):
     machine.remove(TRACE)
     before = machine.tree()
 
-    printed(fail(machine), UP_TO_PROPERTIES + f"""\
+    printed(
+        fail(machine),
+        UP_TO_PROPERTIES
+        + f"""\
 Looking for Trace Dir
 Customizing property file: {TRACE}
 Loading file {TRACE} error: 2 (No such file or directory)
 Could not load property file
-""" + RESTARTED_AND_FAILED, status=1)
+"""
+        + RESTARTED_AND_FAILED,
+        status=1,
+    )
 
     rolled_back(machine, before, FILE_INDEX, PROPERTIES_DIRECTORY, XSS_FILES, MAIN_PROPERTY_FILE)
 
@@ -227,18 +267,22 @@ def test_a_trace_property_file_that_cannot_be_saved_fails_the_upgrade(machine):
 
     outcome = fail(machine, user=ANN)
 
-    printed_lines(outcome, f"Customizing property file: {path}",
-                  f"Saving file {path} error: 13 (Permission denied)",
-                  "Could not save property file",
-                  "Exec '/home/ann/corvan/zor/bin/trawlcfg -enable all >/dev/null 2>&1' "
-                  "returned 0",
-                  "Installation failed, rolling back",
-                  "Done.")
+    printed_lines(
+        outcome,
+        f"Customizing property file: {path}",
+        f"Saving file {path} error: 13 (Permission denied)",
+        "Could not save property file",
+        "Exec '/home/ann/corvan/zor/bin/trawlcfg -enable all >/dev/null 2>&1' returned 0",
+        "Installation failed, rolling back",
+        "Done.",
+    )
     not_printed(outcome, "File saved successfully")
     rolled_back(machine, before, FILE_INDEX, PROPERTIES_DIRECTORY, XSS_FILES, MAIN_PROPERTY_FILE)
 
 
-UP_TO_REGISTRY = UP_TO_PROPERTIES + f"""\
+UP_TO_REGISTRY = (
+    UP_TO_PROPERTIES
+    + f"""\
 Looking for Trace Dir
 Customizing property file: {TRACE}
 File saved successfully
@@ -251,6 +295,7 @@ Adding exploiter ABC to INI file
 Updating BuildDate informations to: 22/12/02
 Saving INI file to /etc/zor/zor.ini
 """
+)
 
 
 def test_a_registry_that_cannot_be_backed_up_fails_the_upgrade(machine):
@@ -258,9 +303,13 @@ def test_a_registry_that_cannot_be_backed_up_fails_the_upgrade(machine):
     machine.make_directory("/etc/zor/zor.ini.bak")
     before = machine.tree()
 
-    printed(fail(machine), UP_TO_REGISTRY +
-            "*** Error: could not open or write to INI file. Error = 2\n" +
-            RESTARTED_AND_FAILED, status=1)
+    printed(
+        fail(machine),
+        UP_TO_REGISTRY
+        + "*** Error: could not open or write to INI file. Error = 2\n"
+        + RESTARTED_AND_FAILED,
+        status=1,
+    )
 
     rolled_back(machine, before, FILE_INDEX, PROPERTIES_DIRECTORY, XSS_FILES, MAIN_PROPERTY_FILE)
 
@@ -276,12 +325,17 @@ def test_a_full_disk_under_the_backup_of_the_registry_fails_the_upgrade(machine)
     """
 
     outcome = machine.run_in_shell(
-        script, "i", "ABC", "-s", SPB, options=("--size", "4096", "--tmpfs", "/etc/zor"))
+        script, "i", "ABC", "-s", SPB, options=("--size", "4096", "--tmpfs", "/etc/zor")
+    )
 
-    printed_lines(outcome, "Saving INI file to /etc/zor/zor.ini",
-                  "*** Error: could not open or write to INI file. Error = 6")
-    assert outcome.stdout.endswith("Installation failed, rolling back\nDone.\nstatus 1\n"
-                                   "zor.ini\nsame\n")
+    printed_lines(
+        outcome,
+        "Saving INI file to /etc/zor/zor.ini",
+        "*** Error: could not open or write to INI file. Error = 6",
+    )
+    assert outcome.stdout.endswith(
+        "Installation failed, rolling back\nDone.\nstatus 1\nzor.ini\nsame\n"
+    )
 
 
 def test_a_registry_that_cannot_be_written_whole_comes_back(machine):
@@ -291,13 +345,17 @@ def test_a_registry_that_cannot_be_written_whole_comes_back(machine):
     before = machine.tree()
 
     # One block of 512 bytes: enough for the copy, too little with the long identifier.
-    outcome = machine.run_in_shell("trap '' XFSZ; ulimit -f 1; exec \"$0\" \"$@\"",
-                                   "i", "A" * 400, "-s", SPB)
+    outcome = machine.run_in_shell(
+        'trap \'\' XFSZ; ulimit -f 1; exec "$0" "$@"', "i", "A" * 400, "-s", SPB
+    )
 
     assert outcome.status == 1
-    printed_lines(outcome, "Saving INI file to /etc/zor/zor.ini",
-                  "*** Error: could not open or write to INI file. Error = 5",
-                  "Installation failed, rolling back")
+    printed_lines(
+        outcome,
+        "Saving INI file to /etc/zor/zor.ini",
+        "*** Error: could not open or write to INI file. Error = 5",
+        "Installation failed, rolling back",
+    )
     rolled_back(machine, before)
 
 
@@ -309,11 +367,14 @@ def test_a_registration_only_that_cannot_save_the_registry_fails(machine):
 
     outcome = fail(machine)
 
-    printed_lines(outcome, "Adding exploiter ABC to INI file",
-                  "Saving INI file to /etc/zor/zor.ini",
-                  "*** Error: could not open or write to INI file. Error = 2",
-                  "Installation failed, rolling back",
-                  "Done.")
+    printed_lines(
+        outcome,
+        "Adding exploiter ABC to INI file",
+        "Saving INI file to /etc/zor/zor.ini",
+        "*** Error: could not open or write to INI file. Error = 2",
+        "Installation failed, rolling back",
+        "Done.",
+    )
     same_lines(outcome.commands, [])
     same_tree(machine.tree(), before)
 
@@ -327,8 +388,15 @@ def test_a_script_that_the_package_does_not_carry_stays_filled_in(machine):
 
     fail(machine)
 
-    rolled_back(machine, before, FILE_INDEX, PROPERTIES_DIRECTORY, XSS_FILES, MAIN_PROPERTY_FILE,
-                SCRIPTS_OF_OLD)
+    rolled_back(
+        machine,
+        before,
+        FILE_INDEX,
+        PROPERTIES_DIRECTORY,
+        XSS_FILES,
+        MAIN_PROPERTY_FILE,
+        SCRIPTS_OF_OLD,
+    )
     assert machine.read(HOME + "/install/trawlcfg.sh") == "older /opt/corvan/zor\n"
 
 
@@ -339,10 +407,13 @@ def test_the_single_user_flag_is_made_after_a_failure_too(machine):
 
     outcome = fail(machine, "-r")
 
-    printed_lines(outcome, "File extraction failed",
-                  "Creating single user mode flag file: /opt/corvan/zor/config/SingleUserMode",
-                  "Exec '/opt/corvan/zor/bin/trawlcfg -enable all >/dev/null 2>&1' returned 0",
-                  "Installation failed, rolling back")
+    printed_lines(
+        outcome,
+        "File extraction failed",
+        "Creating single user mode flag file: /opt/corvan/zor/config/SingleUserMode",
+        "Exec '/opt/corvan/zor/bin/trawlcfg -enable all >/dev/null 2>&1' returned 0",
+        "Installation failed, rolling back",
+    )
     rolled_back(machine, before, PROPERTIES_DIRECTORY, SINGLE_USER_FLAG, FILE_INDEX)
     assert machine.index(HOME).endswith("\n/opt/corvan/zor/config/SingleUserMode\n")
 
@@ -353,10 +424,13 @@ def test_without_rollback_the_replaced_files_stay_beside_the_new_ones(machine):
 
     outcome = fail(machine, "-norollback")
 
-    printed_lines(outcome, "*** Error: could not open or write to INI file. Error = 2",
-                  "Exec '/opt/corvan/zor/bin/trawlcfg -enable all >/dev/null 2>&1' returned 0",
-                  "Installation failed",
-                  "Done.")
+    printed_lines(
+        outcome,
+        "*** Error: could not open or write to INI file. Error = 2",
+        "Exec '/opt/corvan/zor/bin/trawlcfg -enable all >/dev/null 2>&1' returned 0",
+        "Installation failed",
+        "Done.",
+    )
     assert machine.read(HOME + "/bin/trawlhw.bak") == "older"
     assert machine.read_bytes(HOME + "/bin/trawlhw") == b"\x7fELF hardware scanner\x00\xff"
     assert machine.read(HOME + "/config/xss/schema.xss.bak") == "<schema/>\n"

@@ -24,14 +24,16 @@ def installed(machine):
 
 def doctor(machine, *arguments, status):
     found = report(machine, "doctor", *arguments, status=status)
-    return (found["interrupted"], [(one["action"], one["path"]) for one in found["actions"]],
-            [one["code"] for one in found["advice"]])
+    return (
+        found["interrupted"],
+        [(one["action"], one["path"]) for one in found["actions"]],
+        [one["code"] for one in found["advice"]],
+    )
 
 
 def interrupt_upgrade(machine):
     """Leaves what a kill in the middle of an extraction leaves."""
-    machine.plant(HOME + "/bin/trawlhw.bak", machine.read_bytes(HOME + "/bin/trawlhw"),
-                  0o755)
+    machine.plant(HOME + "/bin/trawlhw.bak", machine.read_bytes(HOME + "/bin/trawlhw"), 0o755)
     machine.plant(HOME + "/bin/trawlhw", b"half of", 0o600)
     machine.plant(HOME + "/ZOR_files", "# File created by ZOR: 22/12/02zor_9.2.30.0000\n")
 
@@ -66,8 +68,12 @@ def test_an_interrupted_extraction_goes_back_to_the_old_files(installed):
 
     _, actions, advice = doctor(installed, "--apply", status=1)
 
-    assert [action for action, _ in actions] == ["restore", "rebuild-index", "set-modes",
-                                                 "enable-scanners"]
+    assert [action for action, _ in actions] == [
+        "restore",
+        "rebuild-index",
+        "set-modes",
+        "enable-scanners",
+    ]
     assert advice == ["reinstall"]
     assert installed.read_bytes(HOME + "/bin/trawlhw") == old
     assert not installed.exists(HOME + "/bin/trawlhw.bak")
@@ -84,8 +90,13 @@ def test_an_interrupted_commit_goes_forward(installed):
 
     assert interrupted == "upgrade"
     assert [action for action, _ in actions] == [
-        "delete-backup", "customise", "delete-backup", "delete-backup", "set-modes",
-        "enable-scanners"]
+        "delete-backup",
+        "customise",
+        "delete-backup",
+        "delete-backup",
+        "set-modes",
+        "enable-scanners",
+    ]
     assert not installed.exists(HOME + "/bin/trawlhw.bak")
     assert installed.read_bytes(HOME + "/bin/trawlhw") != b"old"
 
@@ -96,7 +107,10 @@ def test_an_empty_registry_with_a_complete_backup_is_restored(installed):
     installed.plant(INI, "")
 
     assert doctor(installed, "--apply", status=0) == (
-        "registration", [("restore-registry", INI)], [])
+        "registration",
+        [("restore-registry", INI)],
+        [],
+    )
     assert installed.read(INI) == old
 
 
@@ -133,24 +147,30 @@ def test_a_backup_with_another_name_is_not_restored(installed):
 
 
 def test_an_interrupted_removal_is_finished(installed):
-    listed = [line for line in installed.read(HOME + "/ZOR_files").splitlines()
-              if not line.startswith("#")]
+    listed = [
+        line
+        for line in installed.read(HOME + "/ZOR_files").splitlines()
+        if not line.startswith("#")
+    ]
     for path in sorted(listed):
         if installed.exists(path):
             installed.remove(path)
         if path.endswith("/trawlcfg"):
             break
 
-    assert doctor(installed, "--apply", status=3) == (
-        "removal", [("finish-removal", HOME)], [])
+    assert doctor(installed, "--apply", status=3) == ("removal", [("finish-removal", HOME)], [])
     assert not installed.exists(HOME) and not installed.exists(INI)
 
 
-@pytest.mark.parametrize("careless", [
-    lambda machine: machine.remove(HOME + "/bin"),
-    lambda machine: machine.remove(HOME + "/bin/trawlcfg"),
-    lambda machine: machine.plant(INI, machine.read(INI).replace("SHOP:", "SHOP:DESK:")),
-], ids=["bin deleted", "control deleted", "another exploiter"])
+@pytest.mark.parametrize(
+    "careless",
+    [
+        lambda machine: machine.remove(HOME + "/bin"),
+        lambda machine: machine.remove(HOME + "/bin/trawlcfg"),
+        lambda machine: machine.plant(INI, machine.read(INI).replace("SHOP:", "SHOP:DESK:")),
+    ],
+    ids=["bin deleted", "control deleted", "another exploiter"],
+)
 def test_a_careless_deletion_is_not_taken_for_a_removal(installed, careless):
     careless(installed)
     installed.plant(HOME + "/config/mine", b"mine")
@@ -181,5 +201,7 @@ def test_it_does_not_start_while_another_run_holds_the_lock(installed):
         outcome = zorctl(installed, "doctor", "--apply")
 
     assert (outcome.status, outcome.stderr) == (
-        75, "zorctl: cannot take the lock /run/wzorinst.lock\n")
+        75,
+        "zorctl: cannot take the lock /run/wzorinst.lock\n",
+    )
     assert installed.exists(HOME + "/bin/trawlhw.bak")

@@ -7,8 +7,7 @@ from harness.machine import SPB
 from harness.zorctl import report, zorctl
 
 HOME = "/opt/corvan/zor"
-WARNING = ("zorctl: warning: cannot lock /run/wzorinst.lock; this may change while it is "
-           "reported\n")
+WARNING = "zorctl: warning: cannot lock /run/wzorinst.lock; this may change while it is reported\n"
 
 
 @pytest.fixture
@@ -45,7 +44,8 @@ def test_the_text_says_it_in_short(ready):
     outcome = zorctl(ready, "plan", "i", "SHOP", "-s", SPB)
 
     assert outcome.stdout.startswith(
-        "Operation: fresh (global) in /opt/corvan/zor\nResult: success\nScanners stopped: no\n")
+        "Operation: fresh (global) in /opt/corvan/zor\nResult: success\nScanners stopped: no\n"
+    )
     assert "\nFiles created: 15\n" in outcome.stdout
     assert outcome.status == 0
 
@@ -81,7 +81,10 @@ def test_one_of_two_exploiters_is_only_unregistered(installed):
     found = plan(installed, "r", "SHOP")
 
     assert (found["operation"], found["deleted"], found["replaced"]) == (
-        "unregistration", [], ["/etc/zor/zor.ini"])
+        "unregistration",
+        [],
+        ["/etc/zor/zor.ini"],
+    )
 
 
 def test_a_run_that_would_fail_ends_with_1_and_says_why(ready):
@@ -89,8 +92,10 @@ def test_a_run_that_would_fail_ends_with_1_and_says_why(ready):
 
     found = plan(ready, "i", "SHOP", "-s", SPB, status=1)
 
-    assert found["failure"] == ("the entry for /opt/corvan/zor/bin/empty cannot be opened: it is "
-                                "empty or of an unknown method")
+    assert found["failure"] == (
+        "the entry for /opt/corvan/zor/bin/empty cannot be opened: it is "
+        "empty or of an unknown method"
+    )
 
 
 def test_removing_what_is_not_installed_ends_with_3(ready):
@@ -117,15 +122,22 @@ def test_the_log_of_the_run_is_not_touched(ready):
     assert ready.read("/tmp/log") == "old"
 
 
-@pytest.mark.parametrize("arguments, reason", [
-    (("x", "SHOP"), "Invalid command: x"),
-    (("i", "SHOP", "-%"), "Invalid option: -%"),
-    (("i", "SHOP", "-s"), "Missing argument for option: -s"),
-    (("i", "SHOP"), "Error: an SPB file is required to install or upgrade"),
-])
+@pytest.mark.parametrize(
+    "arguments, reason",
+    [
+        (("x", "SHOP"), "Invalid command: x"),
+        (("i", "SHOP", "-%"), "Invalid option: -%"),
+        (("i", "SHOP", "-s"), "Missing argument for option: -s"),
+        (("i", "SHOP"), "Error: an SPB file is required to install or upgrade"),
+    ],
+)
 def test_a_command_line_that_the_installer_refuses_ends_with_2(ready, arguments, reason):
-    printed(zorctl(ready, "plan", *arguments), "", status=2,
-            stderr=f"zorctl: wzorinst would not accept this command line: {reason}\n")
+    printed(
+        zorctl(ready, "plan", *arguments),
+        "",
+        status=2,
+        stderr=f"zorctl: wzorinst would not accept this command line: {reason}\n",
+    )
 
 
 def test_without_a_lock_there_is_a_warning(machine):

@@ -29,8 +29,9 @@ def ready(machine):
 def signed(ready, tmp_path):
     """A signed package; /media/signers allows its signer."""
     for name in ("key", "other"):
-        subprocess.run(["ssh-keygen", "-q", "-t", "ed25519", "-N", "", "-f", tmp_path / name],
-                       check=True)
+        subprocess.run(
+            ["ssh-keygen", "-q", "-t", "ed25519", "-N", "", "-f", tmp_path / name], check=True
+        )
     key = (tmp_path / "key.pub").read_text()
     ready.plant("/media/signers", f'maker@example.org namespaces="spb" {key}')
     sign(ready, tmp_path / "key")
@@ -41,8 +42,11 @@ def sign(machine, key, namespace="spb"):
     package = machine.at(SPB)
     if os.path.exists(package + ".sig"):
         os.unlink(package + ".sig")
-    subprocess.run(["ssh-keygen", "-q", "-Y", "sign", "-f", key, "-n", namespace, package],
-                   check=True, stderr=subprocess.DEVNULL)
+    subprocess.run(
+        ["ssh-keygen", "-q", "-Y", "sign", "-f", key, "-n", namespace, package],
+        check=True,
+        stderr=subprocess.DEVNULL,
+    )
 
 
 def logs(machine):
@@ -106,8 +110,12 @@ def test_a_package_that_cannot_be_installed_ends_with_65(ready):
 
 
 def test_a_missing_package_ends_with_65(ready):
-    printed(zorctl(ready, "run", "--", "i", "SHOP", "-s", "/media/none"), "", status=65,
-            stderr="zorctl: /media/none: No such file or directory\n")
+    printed(
+        zorctl(ready, "run", "--", "i", "SHOP", "-s", "/media/none"),
+        "",
+        status=65,
+        stderr="zorctl: /media/none: No such file or directory\n",
+    )
 
 
 def test_another_run_that_holds_the_lock_ends_with_75(ready):
@@ -140,19 +148,34 @@ def test_a_signed_package_is_installed(signed):
 def test_the_signature_can_have_another_name(signed):
     os.rename(signed.at(SPB + ".sig"), signed.at("/media/signature"))
 
-    outcome = zorctl(signed, "run", "--signers", "/media/signers", "--signature",
-                     "/media/signature", "--", "i", "SHOP", "-s", SPB)
+    outcome = zorctl(
+        signed,
+        "run",
+        "--signers",
+        "/media/signers",
+        "--signature",
+        "/media/signature",
+        "--",
+        "i",
+        "SHOP",
+        "-s",
+        SPB,
+    )
 
     assert outcome.status == 0
 
 
-@pytest.mark.parametrize("spoil", [
-    lambda machine, keys: machine.remove(SPB + ".sig"),
-    lambda machine, keys: machine.plant(SPB + ".sig", b"no signature"),
-    lambda machine, keys: machine.plant(SPB, machine.read_bytes(SPB) + b"x"),
-    lambda machine, keys: sign(machine, keys / "other"),
-    lambda machine, keys: sign(machine, keys / "key", "file"),
-], ids=["none", "damaged", "of other bytes", "by somebody else", "for something else"])
+@pytest.mark.parametrize(
+    "spoil",
+    [
+        lambda machine, keys: machine.remove(SPB + ".sig"),
+        lambda machine, keys: machine.plant(SPB + ".sig", b"no signature"),
+        lambda machine, keys: machine.plant(SPB, machine.read_bytes(SPB) + b"x"),
+        lambda machine, keys: sign(machine, keys / "other"),
+        lambda machine, keys: sign(machine, keys / "key", "file"),
+    ],
+    ids=["none", "damaged", "of other bytes", "by somebody else", "for something else"],
+)
 def test_without_a_valid_signature_it_ends_with_77(signed, tmp_path, spoil):
     spoil(signed, tmp_path)
 
@@ -164,9 +187,13 @@ def test_without_a_valid_signature_it_ends_with_77(signed, tmp_path, spoil):
 
 
 def test_a_command_line_that_the_installer_refuses_ends_with_2(ready):
-    printed(zorctl(ready, "run", "--", "i", "SHOP"), "", status=2,
-            stderr="zorctl: wzorinst would not accept this command line: "
-            "Error: an SPB file is required to install or upgrade\n")
+    printed(
+        zorctl(ready, "run", "--", "i", "SHOP"),
+        "",
+        status=2,
+        stderr="zorctl: wzorinst would not accept this command line: "
+        "Error: an SPB file is required to install or upgrade\n",
+    )
 
 
 def test_what_is_installed_is_what_was_verified(ready):
@@ -183,6 +210,7 @@ def test_what_is_installed_is_what_was_verified(ready):
 def test_a_daemon_that_a_command_leaves_keeps_neither_the_lock_nor_the_run(ready):
     program = ready.read_bytes(SPB)  # the toolkit's scanner control, with a daemon
     from harness import toolkit  # pylint: disable=import-outside-toplevel
+
     control = toolkit.SCANNER_PROGRAM.replace(b"#!/bin/sh\n", b"#!/bin/sh\nsleep 60 &\n", 1)
     ready.pack({"bin/trawlcfg": control})
     assert ready.read_bytes(SPB) != program

@@ -57,11 +57,17 @@ def test_nothing_is_installed(machine):
 
     outcome = zorctl(machine, "status")
 
-    printed(outcome, HEAD + """
+    printed(
+        outcome,
+        HEAD
+        + """
 Status of shared (global) installation: absent
 INI file = /etc/zor/zor.ini
 Not installed
-""" + NONE_OF_ROOT, status=3)
+"""
+        + NONE_OF_ROOT,
+        status=3,
+    )
     assert machine.tree() == before
 
 
@@ -83,22 +89,52 @@ def test_the_json_of_an_intact_installation(installed):
         "tool": {"version": "9.2.30.0000", "build_date": "22/12/02"},
         "default_install_type": "global",
         "common_directory": "/usr/kel/corvan/common",
-        "installations": [{
-            "type": "global", "user": None, "uid": None, "health": "intact", "problems": [],
-            "registry": {"path": "/etc/zor/zor.ini", "state": "complete",
-                         "backup_state": "missing"},
-            "version": "9.2.30.0000", "build_date": "22/12/02", "home": HOME,
-            "configuration_root": HOME, "exploiters": ["SHOP", "DESK"], "home_state": "intact",
-            "index": {"path": HOME + "/ZOR_files", "state": "complete", "files": 17},
-            "recorded_type": "global", "single_user_mode": False, "backups": [],
-        }, {
-            "type": "local", "user": "root", "uid": 0, "health": "absent", "problems": [],
-            "registry": {"path": "/root/.zor/zor.ini", "state": "missing",
-                         "backup_state": "missing"},
-            "version": None, "build_date": None, "home": None, "configuration_root": None,
-            "exploiters": None, "home_state": None, "index": None, "recorded_type": None,
-            "single_user_mode": None, "backups": None,
-        }],
+        "installations": [
+            {
+                "type": "global",
+                "user": None,
+                "uid": None,
+                "health": "intact",
+                "problems": [],
+                "registry": {
+                    "path": "/etc/zor/zor.ini",
+                    "state": "complete",
+                    "backup_state": "missing",
+                },
+                "version": "9.2.30.0000",
+                "build_date": "22/12/02",
+                "home": HOME,
+                "configuration_root": HOME,
+                "exploiters": ["SHOP", "DESK"],
+                "home_state": "intact",
+                "index": {"path": HOME + "/ZOR_files", "state": "complete", "files": 17},
+                "recorded_type": "global",
+                "single_user_mode": False,
+                "backups": [],
+            },
+            {
+                "type": "local",
+                "user": "root",
+                "uid": 0,
+                "health": "absent",
+                "problems": [],
+                "registry": {
+                    "path": "/root/.zor/zor.ini",
+                    "state": "missing",
+                    "backup_state": "missing",
+                },
+                "version": None,
+                "build_date": None,
+                "home": None,
+                "configuration_root": None,
+                "exploiters": None,
+                "home_state": None,
+                "index": None,
+                "recorded_type": None,
+                "single_user_mode": None,
+                "backups": None,
+            },
+        ],
     }
 
 
@@ -108,12 +144,19 @@ def test_the_shell_format_can_be_evaluated(installed):
     zorctl(installed, "status")  # plants the binary
 
     outcome = installed.execute(
-        ["/bin/sh", "-c", 'eval "$(/media/zorctl status --format shell)"\n'
-         'echo "$ZORCTL_COUNT $ZORCTL_0_HEALTH $ZORCTL_0_VERSION $ZORCTL_0_REGISTRY_STATE"\n'
-         'echo "$ZORCTL_0_EXPLOITERS"; echo "[$ZORCTL_1_VERSION]"'],
-        user=ANN, umask=0o022, environment=None,
+        [
+            "/bin/sh",
+            "-c",
+            'eval "$(/media/zorctl status --format shell)"\n'
+            'echo "$ZORCTL_COUNT $ZORCTL_0_HEALTH $ZORCTL_0_VERSION $ZORCTL_0_REGISTRY_STATE"\n'
+            'echo "$ZORCTL_0_EXPLOITERS"; echo "[$ZORCTL_1_VERSION]"',
+        ],
+        user=ANN,
+        umask=0o022,
+        environment=None,
         options=("--ro-bind", os.path.realpath(os.environ["ZORCTL"]), "/media/zorctl"),
-        everywhere=False)
+        everywhere=False,
+    )
 
     printed(outcome, "2 intact 9.2.30.0000 complete\nSH'OP; exit 9\nA B\nDESK\n[]\n")
 
@@ -124,7 +167,9 @@ def test_a_user_sees_the_shared_installation_and_its_own(installed):
     found = report(installed, "status", user=ANN)
 
     assert [(one["type"], one["user"], one["health"]) for one in found["installations"]] == [
-        ("global", None, "intact"), ("local", "ann", "intact")]
+        ("global", None, "intact"),
+        ("local", "ann", "intact"),
+    ]
     assert found["default_install_type"] == "local"
     assert found["installations"][1]["exploiters"] == ["ANNS"]
 
@@ -134,10 +179,13 @@ def test_root_sees_the_installations_of_all_users(installed):
 
     found = report(installed, "status", "--all-users")
 
-    assert [(one["type"], one["user"], one["uid"], one["health"])
-            for one in found["installations"]] == [
-        ("global", None, None, "intact"), ("local", "root", 0, "absent"),
-        ("local", "ann", 1000, "intact")]
+    assert [
+        (one["type"], one["user"], one["uid"], one["health"]) for one in found["installations"]
+    ] == [
+        ("global", None, None, "intact"),
+        ("local", "root", 0, "absent"),
+        ("local", "ann", 1000, "intact"),
+    ]
 
 
 @pytest.mark.parametrize("options", [(), ("--json",), ("--format", "shell")])
@@ -152,14 +200,16 @@ def test_a_missing_home_directory_is_damage(installed):
 
     one, problems = shared(installed, status=1)
 
-    assert (one["health"], one["home_state"], problems) == ("damaged", "missing",
-                                                            ["home-missing"])
+    assert (one["health"], one["home_state"], problems) == ("damaged", "missing", ["home-missing"])
 
 
-@pytest.mark.parametrize("spoil, state, problem", [
-    (lambda m: m.remove(HOME + "/bin/trawlcfg"), "control-missing", "control-missing"),
-    (lambda m: m.plant(HOME + "/bin/trawlcfg", b""), "control-empty", "control-empty"),
-])
+@pytest.mark.parametrize(
+    "spoil, state, problem",
+    [
+        (lambda m: m.remove(HOME + "/bin/trawlcfg"), "control-missing", "control-missing"),
+        (lambda m: m.plant(HOME + "/bin/trawlcfg", b""), "control-empty", "control-empty"),
+    ],
+)
 def test_a_broken_scanner_control_is_damage(installed, spoil, state, problem):
     spoil(installed)
 
@@ -174,16 +224,25 @@ def test_an_empty_registry_next_to_a_complete_backup_is_damage(installed):
 
     one, problems = shared(installed, status=1)
 
-    assert one["registry"] == {"path": "/etc/zor/zor.ini", "state": "empty",
-                               "backup_state": "complete"}
+    assert one["registry"] == {
+        "path": "/etc/zor/zor.ini",
+        "state": "empty",
+        "backup_state": "complete",
+    }
     assert problems == ["registry-damaged"]
-    assert one["problems"][0]["text"] == ("/etc/zor/zor.ini is no registry: empty; "
-                                          "/etc/zor/zor.ini.bak is complete")
+    assert one["problems"][0]["text"] == (
+        "/etc/zor/zor.ini is no registry: empty; /etc/zor/zor.ini.bak is complete"
+    )
 
 
-@pytest.mark.parametrize("text, state", [
-    ("ZOR_Version = 9.x\n", "bad-version"), ("ZOR_Version = 9.2\n", "incomplete"), (" \n", "empty"),
-])
+@pytest.mark.parametrize(
+    "text, state",
+    [
+        ("ZOR_Version = 9.x\n", "bad-version"),
+        ("ZOR_Version = 9.2\n", "incomplete"),
+        (" \n", "empty"),
+    ],
+)
 def test_a_registry_that_does_not_parse_is_damage(installed, text, state):
     installed.plant("/etc/zor/zor.ini", text)
 
@@ -225,7 +284,11 @@ def test_what_may_not_be_read_is_unknown_and_no_failure(installed):
     one = outcome["installations"][0]
 
     assert (one["health"], one["recorded_type"], one["single_user_mode"], one["backups"]) == (
-        "intact", "unknown", "unknown", "unknown")
+        "intact",
+        "unknown",
+        "unknown",
+        "unknown",
+    )
 
 
 def test_a_registry_that_may_not_be_read_is_unknown(installed):
@@ -242,13 +305,22 @@ def plant_fifo(machine, path):
     os.mkfifo(machine.at(path))
 
 
-@pytest.mark.parametrize("path, member, value", [
-    ("/etc/zor/zor.ini", "registry", {"path": "/etc/zor/zor.ini", "state": "not-regular",
-                                      "backup_state": "missing"}),
-    (HOME + "/ZOR_files", "index", {"path": HOME + "/ZOR_files", "state": "not-regular",
-                                    "files": "unknown"}),
-    (HOME + "/install/zor_install.properties", "recorded_type", "unknown"),
-])
+@pytest.mark.parametrize(
+    "path, member, value",
+    [
+        (
+            "/etc/zor/zor.ini",
+            "registry",
+            {"path": "/etc/zor/zor.ini", "state": "not-regular", "backup_state": "missing"},
+        ),
+        (
+            HOME + "/ZOR_files",
+            "index",
+            {"path": HOME + "/ZOR_files", "state": "not-regular", "files": "unknown"},
+        ),
+        (HOME + "/install/zor_install.properties", "recorded_type", "unknown"),
+    ],
+)
 def test_a_fifo_in_place_of_a_file_is_not_waited_for(installed, path, member, value):
     plant_fifo(installed, path)
     try:
@@ -269,7 +341,10 @@ def test_a_registry_without_end_is_not_read(machine):
     found = report(machine, "status", "--all-users", status=1)
 
     assert [(one["user"], one["registry"]["state"]) for one in found["installations"]] == [
-        (None, "too-large"), ("root", "missing"), ("ann", "not-regular")]
+        (None, "too-large"),
+        ("root", "missing"),
+        ("ann", "not-regular"),
+    ]
 
 
 def test_control_characters_are_escaped(machine):
@@ -284,8 +359,9 @@ def test_control_characters_are_escaped(machine):
 
 def test_bytes_that_are_not_utf_8_are_escaped_in_json(machine):
     machine.register()
-    machine.plant("/etc/zor/zor.ini",
-                  machine.read_bytes("/etc/zor/zor.ini").replace(b"ABC:", b"A\xffC:"))
+    machine.plant(
+        "/etc/zor/zor.ini", machine.read_bytes("/etc/zor/zor.ini").replace(b"ABC:", b"A\xffC:")
+    )
 
     found = report(machine, "status", "--type", "global", status=1)
 
@@ -296,8 +372,16 @@ def test_without_a_terminal_nothing_is_coloured(installed):
     assert "\033" not in zorctl(installed, "status", environment={"TERM": "xterm"}).stdout
 
 
-@pytest.mark.parametrize("arguments", [(), ("nonsense",), ("status", "--nonsense"),
-                                       ("status", "--type", "other"), ("status", "more")])
+@pytest.mark.parametrize(
+    "arguments",
+    [
+        (),
+        ("nonsense",),
+        ("status", "--nonsense"),
+        ("status", "--type", "other"),
+        ("status", "more"),
+    ],
+)
 def test_a_wrong_command_line_ends_with_2(machine, arguments):
     outcome = zorctl(machine, *arguments)
 

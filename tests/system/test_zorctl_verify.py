@@ -56,19 +56,25 @@ def test_an_installation_of_a_user_is_as_it_should_be(machine, runs):
 
 def test_what_differs_from_the_package(installed):
     installed.plant(HOME + "/bin/trawlhw", b"#!/bin/sh\nexit 1\n", 0o755)
-    installed.plant(HOME + "/bin/trawlfs",
-                    installed.read_bytes(HOME + "/bin/trawlfs").replace(b"exit 0", b"exit 1"), 0o755)
+    installed.plant(
+        HOME + "/bin/trawlfs",
+        installed.read_bytes(HOME + "/bin/trawlfs").replace(b"exit 0", b"exit 1"),
+        0o755,
+    )
     installed.remove(HOME + "/config/ZorHWConfig.xml")
     installed.change_mode(HOME + "/bin/trawlcfg", 0o4755)
     installed.plant(HOME + "/bin/mine", b"mine")
 
-    check(installed, """
+    check(
+        installed,
+        """
 foreign     /opt/corvan/zor/bin/mine
 .M.......    /opt/corvan/zor/bin/trawlcfg
 ..5......    /opt/corvan/zor/bin/trawlfs
 S.5......    /opt/corvan/zor/bin/trawlhw
 missing   c /opt/corvan/zor/config/ZorHWConfig.xml
-""")
+""",
+    )
 
 
 def test_what_differs_from_the_index(installed):
@@ -76,16 +82,25 @@ def test_what_differs_from_the_index(installed):
     installed.remove(HOME + "/config/ZorHWConfig.xml")
     installed.change_mode(HOME + "/bin/trawlcfg", 0o4755)
 
-    check(installed, """
+    check(
+        installed,
+        """
 .M.......    /opt/corvan/zor/bin/trawlcfg
 missing   c /opt/corvan/zor/config/ZorHWConfig.xml
-""", spb=())
+""",
+        spb=(),
+    )
 
 
 def test_changed_settings_are_told_by_their_keys(installed):
     path = HOME + "/config/Zor.properties"
-    installed.plant(path, installed.read(path).replace("trace_level=3", "trace_level=5")
-                    .replace("trace_file=zor.log\n", "") + "my.setting=1\n#note=1\n")
+    installed.plant(
+        path,
+        installed.read(path)
+        .replace("trace_level=3", "trace_level=5")
+        .replace("trace_file=zor.log\n", "")
+        + "my.setting=1\n#note=1\n",
+    )
 
     expected = """
 ..5......  c /opt/corvan/zor/config/Zor.properties
@@ -146,12 +161,27 @@ def test_the_json_says_the_same(installed):
 
     assert (found["type"], found["home"], found["compared_with"]) == ("global", HOME, "package")
     assert found["differences"] == [
-        {"path": HOME + "/bin/mi\tne", "kind": "foreign", "columns": None, "configuration": False,
-         "keys": []},
-        {"path": HOME + "/bin/trawlhw", "kind": "changed", "columns": "SM5......",
-         "configuration": False, "keys": []},
-        {"path": path, "kind": "customised", "columns": "..5......", "configuration": True,
-         "keys": ["my.setting"]},
+        {
+            "path": HOME + "/bin/mi\tne",
+            "kind": "foreign",
+            "columns": None,
+            "configuration": False,
+            "keys": [],
+        },
+        {
+            "path": HOME + "/bin/trawlhw",
+            "kind": "changed",
+            "columns": "SM5......",
+            "configuration": False,
+            "keys": [],
+        },
+        {
+            "path": path,
+            "kind": "customised",
+            "columns": "..5......",
+            "configuration": True,
+            "keys": ["my.setting"],
+        },
     ]
 
 
@@ -182,22 +212,28 @@ def test_without_index_and_package_it_cannot_check(installed):
 
     outcome = zorctl(installed, "verify")
 
-    printed(outcome, "", status=2, stderr="zorctl: /opt/corvan/zor/ZOR_files: missing; "
-            "name the package to compare with it\n")
+    printed(
+        outcome,
+        "",
+        status=2,
+        stderr="zorctl: /opt/corvan/zor/ZOR_files: missing; "
+        "name the package to compare with it\n",
+    )
 
 
 def test_a_damaged_registry_is_a_difference(installed):
     installed.plant("/etc/zor/zor.ini", "")
 
-    printed(zorctl(installed, "verify", SPB), "", status=1,
-            stderr="zorctl: /etc/zor/zor.ini: empty\n")
+    printed(
+        zorctl(installed, "verify", SPB), "", status=1, stderr="zorctl: /etc/zor/zor.ini: empty\n"
+    )
 
 
 def test_a_damaged_entry_says_nothing_about_its_file(installed):
     package = installed.read_bytes(SPB)
     content = installed.read_bytes(HOME + "/bin/trawlhw")
     at = package.index(content)  # small files are stored
-    installed.plant("/media/bad", package[:at - 1])
+    installed.plant("/media/bad", package[: at - 1])
 
     outcome = zorctl(installed, "verify", "/media/bad")
 

@@ -97,8 +97,11 @@ def borrowed_paths():
     """The real machine's directories that a sandbox sees read-only, at their own paths."""
     children = sorted(os.listdir("/usr"))
     paths = ["/usr/" + name for name in children if name not in OWN_USR_CHILDREN]
-    paths += ["/" + name for name in MERGED_DIRECTORIES
-              if os.path.isdir("/" + name) and not os.path.islink("/" + name)]
+    paths += [
+        "/" + name
+        for name in MERGED_DIRECTORIES
+        if os.path.isdir("/" + name) and not os.path.islink("/" + name)
+    ]
     if os.path.isdir("/etc/alternatives"):
         paths.append("/etc/alternatives")
     return paths
@@ -120,14 +123,25 @@ def environment_of(home, changes=None):
     WZOR_SANDBOX allows the tests that plant files in /etc or /usr to do so.
     """
     environment = {"PATH": "/usr/bin", "TZ": "UTC0", "HOME": home, "WZOR_SANDBOX": "1"}
-    environment.update({name: value for name, value in os.environ.items()
-                        if name.startswith(PASSED_VARIABLES)})
+    environment.update(
+        {name: value for name, value in os.environ.items() if name.startswith(PASSED_VARIABLES)}
+    )
     environment.update(changes or {})
     return {name: value for name, value in environment.items() if value is not None}
 
 
-def command_line(root, command, *, uid, environment, directory="/tmp", read_only=None,
-                 writable=None, options=(), maps_users=True):
+def command_line(
+    root,
+    command,
+    *,
+    uid,
+    environment,
+    directory="/tmp",
+    read_only=None,
+    writable=None,
+    options=(),
+    maps_users=True,
+):
     """The bwrap command line that runs `command` as `uid` on the machine in `root`.
 
     `read_only` maps paths of the sandbox to host paths bound there read-only; `writable` names

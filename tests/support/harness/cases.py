@@ -29,15 +29,23 @@ class RuleBook(list):
 
     def rule(self, name, reason, *statuses):
         """Makes the decorated function a rule for runs that end with one of `statuses`."""
+
         def add(function):
             self.append(Rule(name, reason, statuses, function))
             return function
+
         return add
 
     def first(self, case, path):
         """The name of the first rule that excuses the difference at `path`, or None."""
-        return next((rule.name for rule in self
-                     if case.status in rule.statuses and rule.excuses(case, path)), None)
+        return next(
+            (
+                rule.name
+                for rule in self
+                if case.status in rule.statuses and rule.excuses(case, path)
+            ),
+            None,
+        )
 
 
 @dataclass(kw_only=True)
@@ -129,14 +137,20 @@ class FailedCall(Case):
             if change.target == backup and (given_up or made and change.done):
                 return True
             made = made or change.target == backup and change.done
-            given_up = made and (given_up or change.kind == "unlink" and change.path == backup
-                                 and change.done)
+            given_up = made and (
+                given_up or change.kind == "unlink" and change.path == backup and change.done
+            )
         return False
 
 
 def is_same_but_for_the_mode(wanted, got):
-    return (wanted is not None and got is not None and wanted.kind == got.kind
-            and wanted.content == got.content and wanted.owner == got.owner)
+    return (
+        wanted is not None
+        and got is not None
+        and wanted.kind == got.kind
+        and wanted.content == got.content
+        and wanted.owner == got.owner
+    )
 
 
 def is_below(path, directory):

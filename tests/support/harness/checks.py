@@ -7,16 +7,21 @@ def same_text(actual, expected, what="text"):
     """Compares two texts."""
     if actual == expected:
         return
-    difference = "\n".join(difflib.unified_diff(
-        expected.splitlines(), actual.splitlines(), "expected", "actual", lineterm="", n=2))
-    raise AssertionError(f"\n{what} expected:\n{expected}\n{what} found:\n{actual}\n"
-                         f"difference:\n{difference}\n")
+    difference = "\n".join(
+        difflib.unified_diff(
+            expected.splitlines(), actual.splitlines(), "expected", "actual", lineterm="", n=2
+        )
+    )
+    raise AssertionError(
+        f"\n{what} expected:\n{expected}\n{what} found:\n{actual}\ndifference:\n{difference}\n"
+    )
 
 
 def same_lines(actual, expected, what="lines"):
     """Compares two lists of texts."""
-    same_text("".join(line + "\n" for line in actual),
-              "".join(line + "\n" for line in expected), what)
+    same_text(
+        "".join(line + "\n" for line in actual), "".join(line + "\n" for line in expected), what
+    )
 
 
 def printed(outcome, expected, status=0, stderr=""):
@@ -30,8 +35,9 @@ def printed_lines(outcome, *lines):
     """Checks that the output holds `lines`, one right after the other."""
     block = "".join(line + "\n" for line in lines)
     if "\n" + block not in "\n" + outcome.stdout:
-        raise AssertionError(f"\nlines expected somewhere:\n{block}\noutput found:\n"
-                             f"{outcome.stdout}")
+        raise AssertionError(
+            f"\nlines expected somewhere:\n{block}\noutput found:\n{outcome.stdout}"
+        )
 
 
 def not_printed(outcome, text):
@@ -48,8 +54,9 @@ def same_tree(actual, expected):
     for path in sorted(set(actual) | set(expected)):
         before, after = expected.get(path), actual.get(path)
         if before != after:
-            lines.append(f"{path}\n    expected: {describe(before)}\n    found:    "
-                         f"{describe(after)}\n")
+            lines.append(
+                f"{path}\n    expected: {describe(before)}\n    found:    {describe(after)}\n"
+            )
     raise AssertionError("\ntrees differ:\n" + "".join(lines))
 
 

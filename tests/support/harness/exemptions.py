@@ -56,31 +56,50 @@ def is_index(content):
 
 # Where nothing was lost, only left.
 
-@rule("a failed deletion of the probe",
-      "The probe file shows that home can be written; if it cannot be deleted, it stays, empty.",
-      0, 1)
+
+@rule(
+    "a failed deletion of the probe",
+    "The probe file shows that home can be written; if it cannot be deleted, it stays, empty.",
+    0,
+    1,
+)
 def probe_stays(case, path):
-    return (path == PROBE == case.hit and case.kind in ("unlink", "walk")
-            and case.content(path) == b"")
+    return (
+        path == PROBE == case.hit and case.kind in ("unlink", "walk") and case.content(path) == b""
+    )
 
 
-@rule("a failed step of a commit",
-      "A commit ignores failures: the backup that cannot be deleted stays next to the new file.", 0)
+@rule(
+    "a failed step of a commit",
+    "A commit ignores failures: the backup that cannot be deleted stays next to the new file.",
+    0,
+)
 def backup_stays(case, path):
-    return (path.endswith(BACKUP) and path == case.hit and case.kind in ("unlink", "walk")
-            and case.new(path)
-            and case.content(path) in contents_before(case, path.removesuffix(BACKUP)))
+    return (
+        path.endswith(BACKUP)
+        and path == case.hit
+        and case.kind in ("unlink", "walk")
+        and case.new(path)
+        and case.content(path) in contents_before(case, path.removesuffix(BACKUP))
+    )
 
 
-@rule("a failed step of a rollback",
-      "A rollback ignores failures and goes on: what it cannot delete, remove or rename stays, and "
-      "the old content of a file that was not renamed back is in its backup.", 1)
+@rule(
+    "a failed step of a rollback",
+    "A rollback ignores failures and goes on: what it cannot delete, remove or rename stays, and "
+    "the old content of a file that was not renamed back is in its backup.",
+    1,
+)
 def rollback_step_fails(case, path):
     original = case.hit.removesuffix(BACKUP)
     if not case.point.late or case.kind not in ("unlink", "rename", "rmdir", "walk"):
         return False
-    if path == case.hit and case.kind in ("rmdir", "walk") and case.after.get(path) and (
-            case.after[path].kind == "d"):
+    if (
+        path == case.hit
+        and case.kind in ("rmdir", "walk")
+        and case.after.get(path)
+        and (case.after[path].kind == "d")
+    ):
         return case.new(path)
     if path == original + BACKUP:
         return case.new(path) and case.content(path) in contents_before(case, original)
@@ -93,35 +112,55 @@ def rollback_step_fails(case, path):
     return in_backup or case.content(path) == case.package.get(original)
 
 
-@rule("a removal is best effort",
-      "What a removal cannot look at or delete stays, with what lies below; it succeeds all the "
-      "same.", 0)
+@rule(
+    "a removal is best effort",
+    "What a removal cannot look at or delete stays, with what lies below; it succeeds all the "
+    "same.",
+    0,
+)
 def removal_is_best_effort(case, path):
     if case.scenario.arguments[0] != "r" or not (case.hits_above(path) or is_below(case.hit, path)):
         return False
     if case.hit == INDEX:
-        return (path == INDEX and case.kind in ("unlink", "walk")
-                and is_index(case.content(path)))
+        return path == INDEX and case.kind in ("unlink", "walk") and is_index(case.content(path))
     disabled = path == CONTROL_STATE and (case.content(path) or b"").startswith(DISABLED)
     return path in case.after and (disabled or case.unchanged(path))
 
 
-@rule("deletions of an upgrade are best effort",
-      "Obsolete files, the old \"properties\" and the cache that cannot be looked at or deleted "
-      "stay; the upgrade succeeds all the same.", 0, 1)
+@rule(
+    "deletions of an upgrade are best effort",
+    'Obsolete files, the old "properties" and the cache that cannot be looked at or deleted '
+    "stay; the upgrade succeeds all the same.",
+    0,
+    1,
+)
 def upgrade_deletion_is_best_effort(case, path):
-    place = next((p for p in (HOME + "/properties", HOME + "/cache_data", *OBSOLETE_FILES)
-                  if is_below(path, p)), None)
-    return (place is not None and is_below(case.hit, place) and case.unchanged(path)
-            and case.kind in ("access", "open", "fstat", "getdents64", "stat", "unlink", "rmdir",
-                              "walk"))
+    place = next(
+        (
+            p
+            for p in (HOME + "/properties", HOME + "/cache_data", *OBSOLETE_FILES)
+            if is_below(path, p)
+        ),
+        None,
+    )
+    return (
+        place is not None
+        and is_below(case.hit, place)
+        and case.unchanged(path)
+        and case.kind
+        in ("access", "open", "fstat", "getdents64", "stat", "unlink", "rmdir", "walk")
+    )
 
 
 # Records that are kept outside of the journal.
 
-@rule("the index is not journalled",
-      "The index of installed files stays after a rollback, as it then is, and is deleted after a "
-      "failed extraction: a removal without it goes by the known places.", 1)
+
+@rule(
+    "the index is not journalled",
+    "The index of installed files stays after a rollback, as it then is, and is deleted after a "
+    "failed extraction: a removal without it goes by the known places.",
+    1,
+)
 def index_is_not_journalled(case, path):
     if path != INDEX:
         return False
@@ -130,33 +169,44 @@ def index_is_not_journalled(case, path):
     return is_index(case.content(path))
 
 
-@rule("the index is best effort",
-      "An index that cannot be read, opened or written lists fewer files: a removal will know "
-      "fewer.", 0)
+@rule(
+    "the index is best effort",
+    "An index that cannot be read, opened or written lists fewer files: a removal will know "
+    "fewer.",
+    0,
+)
 def index_is_best_effort(case, path):
     if path != INDEX or path not in case.wanted or not is_index(case.content(path)):
         return False
-    ours = case.hit in (INDEX, INSTALL_TYPE) or (
-        case.hits_above(INDEX) and case.says(NOT_INDEXED))
-    known = set(lines_of(case.wanted[path].content)) | set(lines_of(
-        case.before[path].content if path in case.before else b""))
+    ours = case.hit in (INDEX, INSTALL_TYPE) or (case.hits_above(INDEX) and case.says(NOT_INDEXED))
+    known = set(lines_of(case.wanted[path].content)) | set(
+        lines_of(case.before[path].content if path in case.before else b"")
+    )
     return ours and all(line in known for line in lines_of(case.content(path))[1:])
 
 
-@rule("a removal deletes what the index lists",
-      "A removal whose index cannot be read lists only the installer's own files and leaves the "
-      "rest; one whose index is empty takes every file in the known places.", 0)
+@rule(
+    "a removal deletes what the index lists",
+    "A removal whose index cannot be read lists only the installer's own files and leaves the "
+    "rest; one whose index is empty takes every file in the known places.",
+    0,
+)
 def removal_goes_by_the_index(case, path):
     if case.scenario.arguments[0] != "r" or case.hit != INDEX:
         return False
     short = case.reference("with an index that lists nothing")
-    return (case.after.get(path) == short.get(path)
-            or (case.lost(path) and is_below(path, HOME) and case.content(INDEX) is None))
+    return case.after.get(path) == short.get(path) or (
+        case.lost(path) and is_below(path, HOME) and case.content(INDEX) is None
+    )
 
 
-@rule("the install type is best effort",
-      "The install-type file is neither journalled nor checked: one that cannot be written is "
-      "missing, and a rollback leaves it.", 0, 1)
+@rule(
+    "the install type is best effort",
+    "The install-type file is neither journalled nor checked: one that cannot be written is "
+    "missing, and a rollback leaves it.",
+    0,
+    1,
+)
 def install_type_is_best_effort(case, path):
     if path != INSTALL_TYPE:
         return False
@@ -165,16 +215,23 @@ def install_type_is_best_effort(case, path):
     return case.hit == INSTALL_TYPE and case.lost(path)
 
 
-@rule("the single-user flag is not journalled",
-      "The flag file is made at the end of every installation that asks for it, of a failing one "
-      "too, and stays.", 1)
+@rule(
+    "the single-user flag is not journalled",
+    "The flag file is made at the end of every installation that asks for it, of a failing one "
+    "too, and stays.",
+    1,
+)
 def flag_is_not_journalled(case, path):
     return path == SINGLE_USER_FLAG and case.new(path) and case.content(path) == b""
 
 
-@rule("the common setting outlives a rollback",
-      "The setting file of the common directory is the house's, not the installation's: once "
-      "written, it stays. One that cannot be written is missing: the default counts.", 0, 1)
+@rule(
+    "the common setting outlives a rollback",
+    "The setting file of the common directory is the house's, not the installation's: once "
+    "written, it stays. One that cannot be written is missing: the default counts.",
+    0,
+    1,
+)
 def setting_outlives(case, path):
     if not is_below(path, "/etc/kel") or path in case.before:
         return False
@@ -183,8 +240,11 @@ def setting_outlives(case, path):
     return case.new(path) and case.content(path) in (None, DEFAULT_SETTING)
 
 
-@rule("a common setting that cannot be read is left alone",
-      "The default common directory is used in this run.", 0)
+@rule(
+    "a common setting that cannot be read is left alone",
+    "The default common directory is used in this run.",
+    0,
+)
 def unreadable_setting(case, path):
     if case.hit != COMMON_SETTING or case.kind not in LOOKS or is_below(path, "/etc/kel"):
         return False
@@ -192,32 +252,52 @@ def unreadable_setting(case, path):
     return case.after.get(path) == without.get(path)
 
 
-@rule("the common directory is best effort",
-      "A common or log directory that cannot be created does not fail an installation.", 0)
+@rule(
+    "the common directory is best effort",
+    "A common or log directory that cannot be created does not fail an installation.",
+    0,
+)
 def common_directory_is_best_effort(case, path):
-    return (is_below(path, "/usr/kel") and case.lost(path) and case.hits_above(path)
-            and case.kind in ("mkdir", *LOOKS))
+    return (
+        is_below(path, "/usr/kel")
+        and case.lost(path)
+        and case.hits_above(path)
+        and case.kind in ("mkdir", *LOOKS)
+    )
 
 
 # What an upgrade changes outside of the journal.
 
-@rule("an upgrade's deletions are not undone",
-      "Obsolete files and \"properties\" are deleted without a journal entry: after a failure they "
-      "are gone.", 1)
+
+@rule(
+    "an upgrade's deletions are not undone",
+    'Obsolete files and "properties" are deleted without a journal entry: after a failure they '
+    "are gone.",
+    1,
+)
 def deletions_are_not_undone(case, path):
-    return (case.says(DEPLOYING) and case.lost(path)
-            and (path in OBSOLETE_FILES or is_below(path, HOME + "/properties")))
+    return (
+        case.says(DEPLOYING)
+        and case.lost(path)
+        and (path in OBSOLETE_FILES or is_below(path, HOME + "/properties"))
+    )
 
 
-@rule("the settings are not journalled",
-      "An upgrade brings Zor.properties to the new version without a journal entry: after a "
-      "failure the edited file stays, with every setting of its owner.", 1)
+@rule(
+    "the settings are not journalled",
+    "An upgrade brings Zor.properties to the new version without a journal entry: after a "
+    "failure the edited file stays, with every setting of its owner.",
+    1,
+)
 def settings_are_not_journalled(case, path):
     return path == SETTINGS and case.after.get(path) == case.normal.get(path)
 
 
-@rule("a property file that cannot be written keeps its old content",
-      "Property files and scripts are replaced as a whole; a failure is no error.", 0)
+@rule(
+    "a property file that cannot be written keeps its old content",
+    "Property files and scripts are replaced as a whole; a failure is no error.",
+    0,
+)
 def property_file_keeps_its_content(case, path):
     if path not in (SETTINGS, TRACE_SETTINGS, *SCRIPTS) or path != case.hit:
         return False
@@ -226,102 +306,168 @@ def property_file_keeps_its_content(case, path):
     return case.content(path) == old
 
 
-@rule("the second pass over \"config/xss\" takes the backup",
-      "Its files are extracted twice; the second backup replaces the first, so a rollback from "
-      "then on deletes them.", 1)
+@rule(
+    'the second pass over "config/xss" takes the backup',
+    "Its files are extracted twice; the second backup replaces the first, so a rollback from "
+    "then on deletes them.",
+    1,
+)
 def second_pass_takes_the_backup(case, path):
-    return (os.path.dirname(path) == HOME + "/config/xss" and path in case.package
-            and case.lost(path) and case.began_second_backup(path))
+    return (
+        os.path.dirname(path) == HOME + "/config/xss"
+        and path in case.package
+        and case.lost(path)
+        and case.began_second_backup(path)
+    )
 
 
 # Steps whose failure is not looked at.
 
-@rule("modes are best effort",
-      "A mode that cannot be set is left as it is; the content is what counts.", 0)
+
+@rule(
+    "modes are best effort",
+    "A mode that cannot be set is left as it is; the content is what counts.",
+    0,
+)
 def modes_are_best_effort(case, path):
-    return (case.only_mode_differs(path) and path == case.hit
-            and case.kind in ("fchmod", "chmod", *LOOKS))
+    return (
+        case.only_mode_differs(path)
+        and path == case.hit
+        and case.kind in ("fchmod", "chmod", *LOOKS)
+    )
 
 
-@rule("scripts are best effort",
-      "A script that cannot be looked at, read or opened keeps its placeholders.", 0)
+@rule(
+    "scripts are best effort",
+    "A script that cannot be looked at, read or opened keeps its placeholders.",
+    0,
+)
 def scripts_are_best_effort(case, path):
-    return (path in SCRIPTS and path == case.hit
-            and case.kind in ("open to create", *LOOKS)
-            and case.content(path) == case.package[path])
+    return (
+        path in SCRIPTS
+        and path == case.hit
+        and case.kind in ("open to create", *LOOKS)
+        and case.content(path) == case.package[path]
+    )
 
 
-@rule("a damaged entry is a shorter file",
-      "A read error or failed seek in the package ends the entry's data without an error.", 0)
+@rule(
+    "a damaged entry is a shorter file",
+    "A read error or failed seek in the package ends the entry's data without an error.",
+    0,
+)
 def damaged_entry_is_shorter(case, path):
     content = case.content(path)
     if case.hit not in PACKAGES or case.kind not in ("read", "lseek"):
         return False
-    return path == case.point.entry and content is not None and (
-        case.package[path].startswith(content) or case.package[case.hit].startswith(content))
+    return (
+        path == case.point.entry
+        and content is not None
+        and (case.package[path].startswith(content) or case.package[case.hit].startswith(content))
+    )
 
 
-@rule("a scanner control that does not run changes no state",
-      "If a failure spoils the scanner control or fills its disk, its commands do nothing: the "
-      "scanners stay disabled, or the common trace path unset. The restart comes before the "
-      "rollback.", 0, 1)
+@rule(
+    "a scanner control that does not run changes no state",
+    "If a failure spoils the scanner control or fills its disk, its commands do nothing: the "
+    "scanners stay disabled, or the common trace path unset. The restart comes before the "
+    "rollback.",
+    0,
+    1,
+)
 def control_does_not_run(case, path):
     content = case.content(path)
     spoilt = case.point.entry in (CONTROL, COMMON_PROGRAM) or CONTROL_FAILED.search(case.output)
-    return (path == CONTROL_STATE and bool(spoilt)
-            and (content is None or content.startswith(DISABLED)))
+    return (
+        path == CONTROL_STATE and bool(spoilt) and (content is None or content.startswith(DISABLED))
+    )
 
 
-@rule("the common trace path is the scanner control's",
-      "The last step of a fresh installation makes the scanner control keep the path, in a file of "
-      "its own. If the installation fails after that, the file stays.", 1)
+@rule(
+    "the common trace path is the scanner control's",
+    "The last step of a fresh installation makes the scanner control keep the path, in a file of "
+    "its own. If the installation fails after that, the file stays.",
+    1,
+)
 def trace_path_stays(case, path):
-    return (path == CONTROL_STATE and case.scenario.name == "install" and case.new(path)
-            and case.content(path) == case.normal[path].content
-            and TRACE_PATH_SET.search(case.output) is not None)
+    return (
+        path == CONTROL_STATE
+        and case.scenario.name == "install"
+        and case.new(path)
+        and case.content(path) == case.normal[path].content
+        and TRACE_PATH_SET.search(case.output) is not None
+    )
 
 
-@rule("the toolkit's programs leave their own files",
-      "A scanner control that fails on a full disk leaves its empty scratch file.", 0, 1)
+@rule(
+    "the toolkit's programs leave their own files",
+    "A scanner control that fails on a full disk leaves its empty scratch file.",
+    0,
+    1,
+)
 def scratch_file_stays(case, path):
-    return (path == SCRATCH_FILE and case.content(path) == b""
-            and CONTROL_FAILED.search(case.output) is not None)
+    return (
+        path == SCRATCH_FILE
+        and case.content(path) == b""
+        and CONTROL_FAILED.search(case.output) is not None
+    )
 
 
 # Judgements about the whole machine.
 
-@rule("a registry that cannot be read or verified counts as none",
-      "If zor.ini cannot be opened or read, or home cannot be written, i makes a fresh "
-      "installation: other exploiters, a newer version and the owner's settings are replaced.", 0)
+
+@rule(
+    "a registry that cannot be read or verified counts as none",
+    "If zor.ini cannot be opened or read, or home cannot be written, i makes a fresh "
+    "installation: other exploiters, a newer version and the owner's settings are replaced.",
+    0,
+)
 def unreadable_registry(case, _):
     unreadable = case.hit == REGISTRY and case.kind in LOOKS
     unwritable = case.hit == PROBE and case.kind in ("open to create", *LOOKS)
-    return (case.scenario.arguments[0] == "i" and (unreadable or unwritable)
-            and not differences(case.reference("with an empty registry"), case.after))
+    return (
+        case.scenario.arguments[0] == "i"
+        and (unreadable or unwritable)
+        and not differences(case.reference("with an empty registry"), case.after)
+    )
 
 
-@rule("a scanner control that cannot be looked at counts as broken",
-      "i then repairs the installation with its own version and registers that, also in place of a "
-      "newer one.", 0)
+@rule(
+    "a scanner control that cannot be looked at counts as broken",
+    "i then repairs the installation with its own version and registers that, also in place of a "
+    "newer one.",
+    0,
+)
 def unreadable_control(case, path):
-    if (case.scenario.arguments[0] != "i" or case.hit != CONTROL
-            or case.kind not in ("access", "stat", "walk")):
+    if (
+        case.scenario.arguments[0] != "i"
+        or case.hit != CONTROL
+        or case.kind not in ("access", "stat", "walk")
+    ):
         return False
     repaired = case.reference("without a scanner control")
     return path == REGISTRY and case.after[path] == repaired[path]
 
 
-@rule("a removal is not rolled back",
-      "A removal that cannot save the registry leaves the old one, and its copy in zor.ini.bak.", 1)
+@rule(
+    "a removal is not rolled back",
+    "A removal that cannot save the registry leaves the old one, and its copy in zor.ini.bak.",
+    1,
+)
 def removal_is_not_rolled_back(case, path):
-    return (case.scenario.arguments[0] == "r" and path == REGISTRY + BACKUP and case.new(path)
-            and case.hit in (REGISTRY, path)
-            and case.before[REGISTRY].content.startswith(case.content(path) or b""))
+    return (
+        case.scenario.arguments[0] == "r"
+        and path == REGISTRY + BACKUP
+        and case.new(path)
+        and case.hit in (REGISTRY, path)
+        and case.before[REGISTRY].content.startswith(case.content(path) or b"")
+    )
 
 
 KEPT_DIRECTORY = Rule(
     "a directory that is not empty stays",
-    "A rollback or a removal keeps a directory in which something excused above is left.")
+    "A rollback or a removal keeps a directory in which something excused above is left.",
+)
 
 
 def judge(case, points=None):

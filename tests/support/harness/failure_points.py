@@ -57,19 +57,50 @@ ERRORS = {
 }
 
 # The kernel's names, of both builds, that go by another name above.
-KINDS = {"_llseek": "lseek", "faccessat": "access", "faccessat2": "access", "fchmodat": "chmod",
-         "fchmodat2": "chmod", "fchown32": "fchown", "fchownat": "chown", "fdatasync": "fsync",
-         "fstatfs64": "fstatfs", "ftruncate64": "ftruncate", "lchown": "chown", "lchown32": "chown",
-         "mkdirat": "mkdir", "openat": "open", "openat2": "open", "pread64": "read",
-         "readlinkat": "readlink", "renameat": "rename", "renameat2": "rename",
-         "sendfile64": "sendfile", "statfs64": "statfs", "sync_file_range2": "sync_file_range"}
+KINDS = {
+    "_llseek": "lseek",
+    "faccessat": "access",
+    "faccessat2": "access",
+    "fchmodat": "chmod",
+    "fchmodat2": "chmod",
+    "fchown32": "fchown",
+    "fchownat": "chown",
+    "fdatasync": "fsync",
+    "fstatfs64": "fstatfs",
+    "ftruncate64": "ftruncate",
+    "lchown": "chown",
+    "lchown32": "chown",
+    "mkdirat": "mkdir",
+    "openat": "open",
+    "openat2": "open",
+    "pread64": "read",
+    "readlinkat": "readlink",
+    "renameat": "rename",
+    "renameat2": "rename",
+    "sendfile64": "sendfile",
+    "statfs64": "statfs",
+    "sync_file_range2": "sync_file_range",
+}
 
 # What makes earlier changes durable.
 SYNCS = ("fsync", "sync_file_range", "syncfs")
 
 # Calls that a trace of files and descriptors shows as well, but that touch no file system.
-NOT_OF_FILES = {"close_range", "dup", "dup2", "dup3", "execve", "fcntl", "fcntl64", "mmap",
-                "mmap2", "pipe", "pipe2", "poll", "ppoll"}
+NOT_OF_FILES = {
+    "close_range",
+    "dup",
+    "dup2",
+    "dup3",
+    "execve",
+    "fcntl",
+    "fcntl64",
+    "mmap",
+    "mmap2",
+    "pipe",
+    "pipe2",
+    "poll",
+    "ppoll",
+}
 
 # The first thing that the installer does itself is to ask who runs it.
 FIRST_CALL = re.compile(r"getuid(32)?\(")
@@ -125,15 +156,28 @@ def kind_of(name, arguments):
 
 
 # Calls whose first argument is a descriptor and whose strings are no paths.
-OF_DESCRIPTORS = {"read", "write", "fgetxattr", "flistxattr", "fremovexattr", "fsetxattr",
-                  "fstatfs"}
+OF_DESCRIPTORS = {
+    "read",
+    "write",
+    "fgetxattr",
+    "flistxattr",
+    "fremovexattr",
+    "fsetxattr",
+    "fstatfs",
+}
 
 
 def paths_of(kind, arguments):
     """The paths that a call's arguments name, or that of its descriptor."""
-    named = [] if kind in OF_DESCRIPTORS else [
-        os.path.join(directory, name) for directory, name in PATH.findall(arguments)
-        if name or not directory]
+    named = (
+        []
+        if kind in OF_DESCRIPTORS
+        else [
+            os.path.join(directory, name)
+            for directory, name in PATH.findall(arguments)
+            if name or not directory
+        ]
+    )
     if named:
         return tuple(named[:2])
     descriptor = DESCRIPTOR.match(arguments.replace("AT_FDCWD", "0"))
@@ -161,8 +205,18 @@ def points_of(trace):
         path = opened.get(path, path)
         if new := OPENED.match(result):
             opened["/proc/self/fd/" + new.group(1)] = new.group(2)
-        points.append(Point(name, counts[name], kind, path, arguments, late, result,
-                            target=others[0] if others else ""))
+        points.append(
+            Point(
+                name,
+                counts[name],
+                kind,
+                path,
+                arguments,
+                late,
+                result,
+                target=others[0] if others else "",
+            )
+        )
         late = late or (kind == "chmod" and path == INDEX)
     assert begun, "the trace shows no first call of the installer"
     return with_entries(with_walks(points))
@@ -178,8 +232,9 @@ def with_walks(points):
         opened = OPENED.match(point.result)
         if point.kind == "open" and "O_PATH" in point.arguments and opened:
             below = opened.group(0) + ", "
-            reached = next((p.path for p in points[number + 1 :] if p.arguments.startswith(below)),
-                           point.path)
+            reached = next(
+                (p.path for p in points[number + 1 :] if p.arguments.startswith(below)), point.path
+            )
             point = replace(point, kind="walk", path=reached)
         result.append(point)
     return result
@@ -190,9 +245,15 @@ def with_entries(points):
     entry, result = "", []
     for number, point in enumerate(points):
         if point.path in PACKAGES and point.kind == "open":
-            after = points[number + 1:]
-            created = next((p for p in after if p.kind == "open to create"
-                            or p.path == point.path and p.kind == "close"), point)
+            after = points[number + 1 :]
+            created = next(
+                (
+                    p
+                    for p in after
+                    if p.kind == "open to create" or p.path == point.path and p.kind == "close"
+                ),
+                point,
+            )
             entry = created.path if created.kind == "open to create" else ""
         result.append(replace(point, entry=entry))
         if point.path in PACKAGES and point.kind == "close":
@@ -206,8 +267,19 @@ WITH_THE_END = ("-e", "quiet=attach,personality", "-e", "signal=all")
 
 
 def strace(*options, tells=CALLS_ONLY):
-    return ("/usr/bin/timeout", "--kill-after=1", str(TIME_LIMIT), "/usr/bin/strace", *tells, "-y",
-            "-s", "512", "-o", TRACE, *options)
+    return (
+        "/usr/bin/timeout",
+        "--kill-after=1",
+        str(TIME_LIMIT),
+        "/usr/bin/strace",
+        *tells,
+        "-y",
+        "-s",
+        "512",
+        "-o",
+        TRACE,
+        *options,
+    )
 
 
 NAME_CHANGES = "rename,renameat,renameat2,unlink,unlinkat"
@@ -227,9 +299,15 @@ def run_failing(scenario, machine, point, error):
 
     Returns the outcome and the renamings and deletions that the run tried.
     """
-    outcome = scenario.run(machine, strace("-e", f"trace={point.name},{NAME_CHANGES}", "-e",
-                                           f"inject={point.name}:error={error}"
-                                           f":when={point.count}"))
+    outcome = scenario.run(
+        machine,
+        strace(
+            "-e",
+            f"trace={point.name},{NAME_CHANGES}",
+            "-e",
+            f"inject={point.name}:error={error}:when={point.count}",
+        ),
+    )
     trace = machine.read(TRACE)
     hit = [line for line in trace.splitlines() if line.endswith("(INJECTED)")]
     assert len(hit) == 1, f"{point.label} was not met as expected: {hit}"
@@ -260,8 +338,12 @@ def name_changes_of(trace):
 
 def run_killed(scenario, machine, point):
     """Runs `scenario` and kills the installer just before the call of `point` is made."""
-    outcome = scenario.run(machine, strace("-e", f"trace={point.name}", "-e",
-                                       f"inject={point.name}:signal=KILL:when={point.count}"))
+    outcome = scenario.run(
+        machine,
+        strace(
+            "-e", f"trace={point.name}", "-e", f"inject={point.name}:signal=KILL:when={point.count}"
+        ),
+    )
     met = outcome.status == 128 + signal.SIGKILL and machine.read(TRACE).endswith("= ?\n")
     assert met, f"{point.label} was not met as expected: status {outcome.status}"
 
@@ -281,13 +363,21 @@ class Signalled:
 
 def run_signalled(scenario, machine, point, name):
     """Runs `scenario` and sends the installer a signal as the call of `point` is made."""
-    outcome = scenario.run(machine, strace(
-        "-e", f"trace={point.name},{NAME_CHANGES},{STARTS}", "-e",
-        f"inject={point.name}:signal={name}:when={point.count}", tells=WITH_THE_END))
+    outcome = scenario.run(
+        machine,
+        strace(
+            "-e",
+            f"trace={point.name},{NAME_CHANGES},{STARTS}",
+            "-e",
+            f"inject={point.name}:signal={name}:when={point.count}",
+            tells=WITH_THE_END,
+        ),
+    )
     trace = machine.read(TRACE)
     _, met, rest = trace.partition(f"--- SIG{name} ")
     assert met, f"{point.label} was not met as expected: {trace}"
-    died = rest.endswith((f"+++ killed by SIG{name} +++\n",
-                          f"+++ killed by SIG{name} (core dumped) +++\n"))
+    died = rest.endswith(
+        (f"+++ killed by SIG{name} +++\n", f"+++ killed by SIG{name} (core dumped) +++\n")
+    )
     commands = [line for line in rest.splitlines() if line.startswith(tuple(STARTS.split(",")))]
     return Signalled(outcome, died, len(commands), name_changes_of(trace))

@@ -130,5 +130,8 @@ def tree_with(listing, changes):
     """`listing` with changed, added or (None) missing paths: {"/etc": "d 0755"}."""
     nodes = {line[7:]: line[:6] for line in listing.splitlines()}
     nodes.update(changes)
-    return "".join(f"{nodes[path]} {path}\n" for path in sorted(nodes, key=lambda p: p.split("/"))
-                   if nodes[path])
+    return "".join(
+        f"{nodes[path]} {path}\n"
+        for path in sorted(nodes, key=lambda p: p.split("/"))
+        if nodes[path]
+    )

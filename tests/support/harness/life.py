@@ -31,13 +31,25 @@ FAILING_COMMANDS = ("common_trace_path", "-enable", "-shutdown", "-disable")
 
 # Where files are planted below a home directory, and the actions that delete them.
 PLANTED = {
-    "mine": (), "bin/mine": (), "bin/plugins/mine": (), "bin/other/deep/mine": (),
-    "install/sub/mine": (), "logs/sub/mine": (), "bin/trawlhw.bak": ("replace",),
-    "bin/trawlnet": ("upgrade",), "bin/libzor.so": ("upgrade", "remove"),
-    "properties/mine": ("upgrade", "remove"), "cache_data/deep/mine": ("upgrade", "remove"),
-    "config/mine": ("remove",), "config/xss/mine": ("remove",), "install/mine": ("remove",),
-    "logs/mine": ("remove",), "_uninst/mine": ("remove",), "bin/etc/mine": ("remove",),
-    "bin/etc/trawlfs/mine": ("remove",), "zor.log": ("remove",),
+    "mine": (),
+    "bin/mine": (),
+    "bin/plugins/mine": (),
+    "bin/other/deep/mine": (),
+    "install/sub/mine": (),
+    "logs/sub/mine": (),
+    "bin/trawlhw.bak": ("replace",),
+    "bin/trawlnet": ("upgrade",),
+    "bin/libzor.so": ("upgrade", "remove"),
+    "properties/mine": ("upgrade", "remove"),
+    "cache_data/deep/mine": ("upgrade", "remove"),
+    "config/mine": ("remove",),
+    "config/xss/mine": ("remove",),
+    "install/mine": ("remove",),
+    "logs/mine": ("remove",),
+    "_uninst/mine": ("remove",),
+    "bin/etc/mine": ("remove",),
+    "bin/etc/trawlfs/mine": ("remove",),
+    "zor.log": ("remove",),
 }
 
 VERSIONS = ((1, 0, 0, 0), (9, 2, 29, 9999), OWN_VERSION, (9, 2, 30, 1), (10, 0, 0, 0))
@@ -49,10 +61,17 @@ COMMON_DIRECTORIES = ("/usr/kel", "/usr/kel/corvan", "/usr/kel/corvan/common")
 # Removed with the shared installation, but made by private ones of root as well.
 COMMON_LOGS = "/usr/kel/corvan/common/ZOR"
 
-RULES = (rollback.FILE_INDEX, rollback.INSTALL_TYPE_FILE, rollback.SINGLE_USER_FLAG,
-         rollback.COMMON_SETTING, rollback.OLDER_BACKUP,
-         rollback.XSS_FILES, rollback.MAIN_PROPERTY_FILE, rollback.TRACE_PROPERTY_FILE,
-         rollback.SCRIPTS_OF_OLD)
+RULES = (
+    rollback.FILE_INDEX,
+    rollback.INSTALL_TYPE_FILE,
+    rollback.SINGLE_USER_FLAG,
+    rollback.COMMON_SETTING,
+    rollback.OLDER_BACKUP,
+    rollback.XSS_FILES,
+    rollback.MAIN_PROPERTY_FILE,
+    rollback.TRACE_PROPERTY_FILE,
+    rollback.SCRIPTS_OF_OLD,
+)
 
 UPGRADE_RULES = RULES + (rollback.PROPERTIES_DIRECTORY, rollback.OBSOLETE_FILE)
 
@@ -73,18 +92,32 @@ class Life:
         self.beginning = self.machine.tree()
 
     def live(self, steps):
-        actions = [self.install] * 6 + [self.remove] * 4 + [self.plant] * 3 + [
-            self.change_the_version, self.change_a_setting, self.break_the_scanner_control,
-            self.let_commands_fail, self.delete_the_home, self.spoil_the_registry,
-            self.install_privately, self.remove_privately, self.report]
+        actions = (
+            [self.install] * 6
+            + [self.remove] * 4
+            + [self.plant] * 3
+            + [
+                self.change_the_version,
+                self.change_a_setting,
+                self.break_the_scanner_control,
+                self.let_commands_fail,
+                self.delete_the_home,
+                self.spoil_the_registry,
+                self.install_privately,
+                self.remove_privately,
+                self.report,
+            ]
+        )
         try:
             for _ in range(steps):
                 self.random.choice(actions)()
                 self.check_always()
         except AssertionError as failure:
-            raise AssertionError(f"\nseed {self.seed} failed in its last step:\n" + "".join(
-                f"    {number}. {step}\n" for number, step in enumerate(self.steps, 1)
-            ) + str(failure)) from None
+            raise AssertionError(
+                f"\nseed {self.seed} failed in its last step:\n"
+                + "".join(f"    {number}. {step}\n" for number, step in enumerate(self.steps, 1))
+                + str(failure)
+            ) from None
         finally:
             self.machine.delete()
 
@@ -111,8 +144,12 @@ class Life:
     def change_the_version(self):
         place = self.place()
         if place.record:
-            place.record = Record(self.random.choice(VERSIONS), self.random.choice(DATES),
-                                  place.record.home, place.record.exploiters)
+            place.record = Record(
+                self.random.choice(VERSIONS),
+                self.random.choice(DATES),
+                place.record.home,
+                place.record.exploiters,
+            )
             self.steps.append(f"write {place.registry}: {place.record}")
             self.machine.plant(place.registry, place.record.text())
 
@@ -159,8 +196,11 @@ class Life:
             place.record = None
 
     def forget_below(self, directory):
-        self.planted = {path: content for path, content in self.planted.items()
-                        if not path.startswith(directory + "/")}
+        self.planted = {
+            path: content
+            for path, content in self.planted.items()
+            if not path.startswith(directory + "/")
+        }
 
     # What exploiters do.
 
@@ -175,8 +215,9 @@ class Life:
 
     def run(self, place, *arguments):
         umask = self.random.choice((0o000, 0o022, 0o077))
-        self.steps.append(f"{place.user.name}: wzorinst {shlex.join(arguments)} "
-                          f"(umask {umask:03o})")
+        self.steps.append(
+            f"{place.user.name}: wzorinst {shlex.join(arguments)} (umask {umask:03o})"
+        )
         return self.machine.run(*arguments, user=place.user, umask=umask)
 
     def draw_package(self):
@@ -191,12 +232,14 @@ class Life:
         exploiter, options = self.random.choice(EXPLOITERS), self.draw_options(place)
         directory = self.random.choice((None, *place.homes))
         before = self.machine.tree()
-        expected = expect_installation(place, before, package, exploiter, options, directory,
-                                       self.failures)
+        expected = expect_installation(
+            place, before, package, exploiter, options, directory, self.failures
+        )
         index = self.index_text(expected.home)
 
-        outcome = self.run(place, "i", exploiter, "-s", SPB, *options,
-                           *(("-d", directory) if directory else ()))
+        outcome = self.run(
+            place, "i", exploiter, "-s", SPB, *options, *(("-d", directory) if directory else ())
+        )
 
         after = self.machine.tree()
         self.status_is(outcome, 1 if expected.failure else 0)
@@ -218,22 +261,28 @@ class Life:
         if expected.kind == "upgrade":
             self.expect_deleted(expected.home, "upgrade")
             assert expected.home + "/cache_data" not in after
-        listed = [line for line in self.index_text(expected.home).splitlines()
-                  if not line.startswith("#")]
+        listed = [
+            line for line in self.index_text(expected.home).splitlines() if not line.startswith("#")
+        ]
         if expected.deploys or "-r" in options:
             same_lines(listed, expect_index(index, package, expected, options), "index")
         # What an earlier run left in this home is the installation's own now, if it is listed.
-        self.leftovers = {path for path in self.leftovers
-                          if not (path + "/").startswith(expected.home + "/")
-                          or (is_file(after, path) and path not in listed
-                              and path != expected.home + "/ZOR_files")}
+        self.leftovers = {
+            path
+            for path in self.leftovers
+            if not (path + "/").startswith(expected.home + "/")
+            or (
+                is_file(after, path) and path not in listed and path != expected.home + "/ZOR_files"
+            )
+        }
 
     def check_failed(self, place, options, expected, before, after):
         self.leftovers |= set(after) - set(before)
         if "-norollback" in options:
             # What it replaced and deleted before it failed stays replaced and deleted.
-            self.planted = {path: content for path, content in self.planted.items()
-                            if path in after}
+            self.planted = {
+                path: content for path, content in self.planted.items() if path in after
+            }
             if expected.failure == "late":
                 place.record = expected.record
             return
@@ -297,8 +346,9 @@ class Life:
         exploiter, options = self.random.choice(EXPLOITERS), self.draw_options(place)
         before = self.machine.tree()
         removal = expect_removal(place, before, exploiter)
-        failure = expect_fresh_failure(place, before, package, place.private, options,
-                                       self.failures)
+        failure = expect_fresh_failure(
+            place, before, package, place.private, options, self.failures
+        )
         home = place.record.home if place.record else ""
         listed = self.index_text(home).splitlines()
 
@@ -334,17 +384,24 @@ class Life:
         outcome = self.run(place, "t")
         lines = []
         for number, shown in enumerate(self.places):
-            lines += ["", ("Status of shared (global) installation:",
-                           "Status of installation for current user:")[number]]
+            lines += [
+                "",
+                (
+                    "Status of shared (global) installation:",
+                    "Status of installation for current user:",
+                )[number],
+            ]
             if shown is not place and number == 1:
                 # Root's own installation, which no life uses.
                 lines += ["INI file = /root/.zor/zor.ini", "Not installed"]
                 continue
             lines.append(f"INI file = {shown.registry}")
             if shown.record:
-                lines += [f"Install dir = {shown.record.home}",
-                          "Install version = {}.{}.{}.{:04}".format(*shown.record.version),
-                          f"Exploiter list = {shown.record.exploiters}"]
+                lines += [
+                    f"Install dir = {shown.record.home}",
+                    "Install version = {}.{}.{}.{:04}".format(*shown.record.version),
+                    f"Exploiter list = {shown.record.exploiters}",
+                ]
             else:
                 lines.append("Not installed")
         same_lines(outcome.stdout.splitlines()[3:], lines, "status report")
@@ -357,11 +414,13 @@ class Life:
         self.leftovers &= set(tree)
         for place in self.places:
             if place.record:
-                same_text(tree[place.registry].content.decode(), place.record.text(),
-                          place.registry)
+                same_text(
+                    tree[place.registry].content.decode(), place.record.text(), place.registry
+                )
             else:
-                assert place.registry not in tree or place.registry in self.leftovers, \
-                    f"{place.registry} is there, but nothing is installed"
+                assert (
+                    place.registry not in tree or place.registry in self.leftovers
+                ), f"{place.registry} is there, but nothing is installed"
         for path, content in self.planted.items():
             assert path in tree and tree[path].content == content, f"planted file gone: {path}"
         for path in tree:
@@ -380,7 +439,8 @@ class Life:
 
     def status_is(self, outcome, status):
         assert outcome.status == status and outcome.stderr.count("\n") == outcome.stderr.count(
-            "scanner control error: ") + outcome.stderr.count("not found\n") + \
-            outcome.stderr.count("Permission denied\n"), (
-                f"exit status expected: {status}, came: {outcome.status}\n{outcome.stdout}"
-                f"{outcome.stderr}")
+            "scanner control error: "
+        ) + outcome.stderr.count("not found\n") + outcome.stderr.count("Permission denied\n"), (
+            f"exit status expected: {status}, came: {outcome.status}\n{outcome.stdout}"
+            f"{outcome.stderr}"
+        )

@@ -19,9 +19,16 @@ OWN_DATE = "22/12/02"
 EMPTY = b""
 PACKAGES = {
     "the toolkit": ({}, (), True),
-    "another build": ({"bin/trawlhw": b"another hardware scanner", "bin/extra": b"extra",
-                       "properties/more.properties": b"more=1\n",
-                       "config/xss/other.xss": b"<other/>\n"}, (), True),
+    "another build": (
+        {
+            "bin/trawlhw": b"another hardware scanner",
+            "bin/extra": b"extra",
+            "properties/more.properties": b"more=1\n",
+            "config/xss/other.xss": b"<other/>\n",
+        },
+        (),
+        True,
+    ),
     "one without scripts": ({}, ("install/trawlcfg.sh", "install/rmdirs.sh"), True),
     "one without scanner control": ({}, ("bin/trawlcfg",), True),
     "one without Zor.properties": ({}, ("config/Zor.properties",), True),
@@ -48,16 +55,17 @@ class Record:
     exploiters: str
 
     def text(self):
-        return ("ZOR_Version = {}.{}.{}.{:04}\n".format(*self.version) +
-                f"ZOR_BuildDate = {self.date}\n"
-                f"ZOR_HomeDirectory = {self.home}\n"
-                f"ZOR_Exploiters = {self.exploiters}\n"
-                f"ZOR_ConfigRootDirectory = {self.home}\n")
+        return (
+            "ZOR_Version = {}.{}.{}.{:04}\n".format(*self.version)
+            + f"ZOR_BuildDate = {self.date}\n"
+            f"ZOR_HomeDirectory = {self.home}\n"
+            f"ZOR_Exploiters = {self.exploiters}\n"
+            f"ZOR_ConfigRootDirectory = {self.home}\n"
+        )
 
     def is_not_newer(self):
         """Whether files of the installer's own version are deployed over this installation."""
-        return self.version < OWN_VERSION or (
-            self.version == OWN_VERSION and self.date <= OWN_DATE)
+        return self.version < OWN_VERSION or (self.version == OWN_VERSION and self.date <= OWN_DATE)
 
     def knows(self, exploiter):
         return exploiter in self.exploiters.split(":")
@@ -80,10 +88,22 @@ class Place:
 
 
 def places():
-    return [Place(ROOT, "/etc/zor/zor.ini", ("/opt/corvan/zor", "/opt/my zor"), "/opt/private",
-                  "/opt/traces/zor"),
-            Place(ANN, "/home/ann/.zor/zor.ini", ("/home/ann/corvan/zor", "/home/ann/zor"),
-                  "/home/ann/private", "/home/ann/traces/zor")]
+    return [
+        Place(
+            ROOT,
+            "/etc/zor/zor.ini",
+            ("/opt/corvan/zor", "/opt/my zor"),
+            "/opt/private",
+            "/opt/traces/zor",
+        ),
+        Place(
+            ANN,
+            "/home/ann/.zor/zor.ini",
+            ("/home/ann/corvan/zor", "/home/ann/zor"),
+            "/home/ann/private",
+            "/home/ann/traces/zor",
+        ),
+    ]
 
 
 class Package:
@@ -95,8 +115,11 @@ class Package:
         self.files = {}
         self.content = b"no archive"
         if changes is not None:
-            self.files = {n: d for n, d in {**toolkit.FILES, **changes}.items()
-                          if not n.endswith("/") and n not in without}
+            self.files = {
+                n: d
+                for n, d in {**toolkit.FILES, **changes}.items()
+                if not n.endswith("/") and n not in without
+            }
             self.content = toolkit.package(changes, without)
 
 
@@ -134,8 +157,7 @@ def expect_installation(place, tree, package, exploiter, options, directory, fai
         home = directory or place.homes[0]
         failure = expect_fresh_failure(place, tree, package, home, options, failures)
         exploiters = ":" if "-n" in options else exploiter + ":"
-        return Installation("fresh", home, failure,
-                            Record(OWN_VERSION, OWN_DATE, home, exploiters))
+        return Installation("fresh", home, failure, Record(OWN_VERSION, OWN_DATE, home, exploiters))
 
     if is_broken:
         record = replace(record, version=OWN_VERSION)
@@ -157,8 +179,11 @@ def expect_fresh_failure(place, tree, package, home, options, failures):
     def has(name):
         return name in package.files or is_file(tree, f"{home}/{name}")
 
-    if not (package.is_extractable and has("config/Zor.properties")
-            and has("config/ZorTrace.properties")):
+    if not (
+        package.is_extractable
+        and has("config/Zor.properties")
+        and has("config/ZorTrace.properties")
+    ):
         return "early"
     if place.is_shared or "-c" in options:
         control = tree.get(home + "/bin/trawlcfg")
@@ -169,9 +194,14 @@ def expect_fresh_failure(place, tree, package, home, options, failures):
 
 
 def expect_upgrade_failure(tree, package, home):
-    works = (package.is_extractable and is_file(tree, home + "/config/Zor.properties")
-             and ("config/ZorTrace.properties" in package.files
-                  or is_file(tree, home + "/config/ZorTrace.properties")))
+    works = (
+        package.is_extractable
+        and is_file(tree, home + "/config/Zor.properties")
+        and (
+            "config/ZorTrace.properties" in package.files
+            or is_file(tree, home + "/config/ZorTrace.properties")
+        )
+    )
     return None if works else "early"
 
 
@@ -200,8 +230,11 @@ def expect_index(before, package, expected, options):
     """The path lines of the index after an installation that succeeds; `before` is its text."""
     lines = [line for line in before.splitlines() if line and not line.startswith("#")]
     if expected.deploys:
-        found = set(lines) | {f"{expected.home}/{name}" for name in package.files
-                              if expected.kind == "fresh" or name != "config/Zor.properties"}
+        found = set(lines) | {
+            f"{expected.home}/{name}"
+            for name in package.files
+            if expected.kind == "fresh" or name != "config/Zor.properties"
+        }
         found |= {f"{expected.home}/{name}" for name in OWN_FILES}
         lines = sorted(found)
     if expected.kind == "fresh":

@@ -112,7 +112,7 @@ def check_huge_file(path, size):
     assert os.path.getsize(path) == size
     with open(path, "rb") as file:
         while block := file.read(len(BLOCK)):
-            assert block == BLOCK[:len(block)], f"before {file.tell()}"
+            assert block == BLOCK[: len(block)], f"before {file.tell()}"
 
 
 def remove(machine):

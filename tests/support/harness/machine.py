@@ -17,9 +17,20 @@ BINARY = "/media/wzorinst"
 SPB = "/media/toolkit.spb"
 
 # What a tree or listing leaves out: the real machine, the media and the scanners' logs.
-UNLISTED = ("/dev", "/media", "/proc", "/usr/sbin", "/var", "/sbin", "/etc/alternatives",
-            "/etc/ld.so.cache", "/etc/nsswitch.conf", "/etc/passwd", "/etc/group",
-            *("/" + name for name in bubblewrap.MERGED_DIRECTORIES))
+UNLISTED = (
+    "/dev",
+    "/media",
+    "/proc",
+    "/usr/sbin",
+    "/var",
+    "/sbin",
+    "/etc/alternatives",
+    "/etc/ld.so.cache",
+    "/etc/nsswitch.conf",
+    "/etc/passwd",
+    "/etc/group",
+    *("/" + name for name in bubblewrap.MERGED_DIRECTORIES),
+)
 
 TIME_STAMP = re.compile(r"^\d{4}-\d\d-\d\dT\d\d:\d\d:\d\d$")
 
@@ -140,14 +151,23 @@ class Machine:
         """Plants another package; the arguments are those of `toolkit.package`."""
         self.plant(SPB, toolkit.package(changes, without))
 
-    def register(self, home="/opt/corvan/zor", version="9.2.30.0000", date="22/12/02",
-                 exploiters="ABC:", path="/etc/zor/zor.ini"):
+    def register(
+        self,
+        home="/opt/corvan/zor",
+        version="9.2.30.0000",
+        date="22/12/02",
+        exploiters="ABC:",
+        path="/etc/zor/zor.ini",
+    ):
         """Plants a registry as the installer writes it."""
-        self.plant(path, f"ZOR_Version = {version}\n"
-                         f"ZOR_BuildDate = {date}\n"
-                         f"ZOR_HomeDirectory = {home}\n"
-                         f"ZOR_Exploiters = {exploiters}\n"
-                         f"ZOR_ConfigRootDirectory = {home}\n")
+        self.plant(
+            path,
+            f"ZOR_Version = {version}\n"
+            f"ZOR_BuildDate = {date}\n"
+            f"ZOR_HomeDirectory = {home}\n"
+            f"ZOR_Exploiters = {exploiters}\n"
+            f"ZOR_ConfigRootDirectory = {home}\n",
+        )
 
     def plant_scanner_control(self, home="/opt/corvan/zor"):
         """Plants the two scanner programs, which make an installation count as intact."""
@@ -160,16 +180,19 @@ class Machine:
 
     def add_selinux(self, enabled_status=0, chcon_status=0):
         """Plants stand-ins for the SELinux tools, which log their command lines too."""
-        for path, status in (("/usr/sbin/selinuxenabled", enabled_status),
-                             ("/media/chcon", chcon_status)):
+        for path, status in (
+            ("/usr/sbin/selinuxenabled", enabled_status),
+            ("/media/chcon", chcon_status),
+        ):
             script = toolkit.SCANNER_PROGRAM.replace(b"[ -e", b"exit %d\n[ -e" % status)
             self.plant(path, script, 0o755)
         self.has_selinux = True
 
     # Running.
 
-    def run(self, *arguments, user=ROOT, umask=0o022, environment=None, options=(),
-            everywhere=False):
+    def run(
+        self, *arguments, user=ROOT, umask=0o022, environment=None, options=(), everywhere=False
+    ):
         """Runs wzorinst with `arguments`.
 
         A user other than root finds everything read-only but the user's own places, unless
@@ -188,14 +211,24 @@ class Machine:
         if self.has_selinux:
             read_only["/usr/bin/chcon"] = self.at("/media/chcon")
         line = bubblewrap.command_line(
-            self.root, command, uid=user.uid,
-            environment=bubblewrap.environment_of(user.home, environment), read_only=read_only,
-            writable=None if everywhere else user.writable, options=options,
-            maps_users=self.maps_users or user.uid != 0)
-        done = subprocess.run(line, stdin=subprocess.DEVNULL, capture_output=True, check=False,
-                              umask=umask)
-        return Outcome(as_text(done.stdout), as_text(done.stderr), done.returncode,
-                       self.logged_commands()[before:])
+            self.root,
+            command,
+            uid=user.uid,
+            environment=bubblewrap.environment_of(user.home, environment),
+            read_only=read_only,
+            writable=None if everywhere else user.writable,
+            options=options,
+            maps_users=self.maps_users or user.uid != 0,
+        )
+        done = subprocess.run(
+            line, stdin=subprocess.DEVNULL, capture_output=True, check=False, umask=umask
+        )
+        return Outcome(
+            as_text(done.stdout),
+            as_text(done.stderr),
+            done.returncode,
+            self.logged_commands()[before:],
+        )
 
     def logged_commands(self):
         """The command lines of the scanner programs so far, oldest first."""

@@ -43,8 +43,12 @@ class PlannedLife(Life):
 
     def depends_on_failing_command(self, plan, outcome):
         """A plan takes it that commands succeed: one that fails may make the run fail."""
-        return (plan["succeeds"] and outcome.status == 1 and "common_trace_path" in self.failures
-                and any("common_trace_path" in command for command in plan["commands"]))
+        return (
+            plan["succeeds"]
+            and outcome.status == 1
+            and "common_trace_path" in self.failures
+            and any("common_trace_path" in command for command in plan["commands"])
+        )
 
 
 def names(tree, kind):
@@ -55,19 +59,28 @@ def names(tree, kind):
 def compare(plan, outcome, before, after, keeps_all):
     """Compares what was planned with what happened."""
     assert outcome.status == (0 if plan["succeeds"] else 1), f"{plan}\n{outcome.stdout}"
-    changed = {path for path in names(before, "f") & names(after, "f")
-               if before[path].content != after[path].content}
+    changed = {
+        path
+        for path in names(before, "f") & names(after, "f")
+        if before[path].content != after[path].content
+    }
     vanished = names(before, "f") - names(after, "f")
     if not plan["succeeds"]:
-        lost = {path for path in changed | vanished} - set(plan["not_restored"])
+        lost = (changed | vanished) - set(plan["not_restored"])
         assert keeps_all or not lost, f"not brought back and not foreseen: {sorted(lost)}"
         return
     same_lines(sorted(names(after, "f") - names(before, "f")), sorted(plan["created"]), "created")
     same_lines(sorted(vanished), sorted(plan["deleted"]), "deleted")
-    same_lines(sorted(names(after, "d") - names(before, "d")),
-               sorted(plan["created_directories"]), "created directories")
-    same_lines(sorted(names(before, "d") - names(after, "d")),
-               sorted(plan["deleted_directories"]), "deleted directories")
+    same_lines(
+        sorted(names(after, "d") - names(before, "d")),
+        sorted(plan["created_directories"]),
+        "created directories",
+    )
+    same_lines(
+        sorted(names(before, "d") - names(after, "d")),
+        sorted(plan["deleted_directories"]),
+        "deleted directories",
+    )
     unforeseen = changed - set(plan["replaced"]) - set(plan["edited"])
     assert not unforeseen, f"changed and not foreseen: {sorted(unforeseen)}"
     if plan["unchanged"]:

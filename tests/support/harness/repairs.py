@@ -9,8 +9,10 @@ from dataclasses import dataclass, field
 from harness.cases import BACKUP
 from harness.scenarios import HOME, REGISTRY, SCRIPTS, SETTINGS, TRACE_SETTINGS
 
-UNTRUSTED = ("of somebody else, or in a directory that somebody else may write to: such a backup is "
-             "left to the administrator")
+UNTRUSTED = (
+    "of somebody else, or in a directory that somebody else may write to: such a backup is "
+    "left to the administrator"
+)
 NEW_FILE = "brought by the package, and nothing had been there: it stays as a file nobody listed"
 PROPERTIES = "in properties, which an upgrade deletes first: install again to have them back"
 SECOND_PASS = "in config/xss, whose second extraction takes the place of the old file's backup"
@@ -71,7 +73,8 @@ def exception_for(case, path):
     if is_untrusted(case, path):
         return UNTRUSTED
     if path.startswith(HOME + "/config/xss/") and (
-            content(case.between, path + BACKUP) == content(case.normal, path)):
+        content(case.between, path + BACKUP) == content(case.normal, path)
+    ):
         return SECOND_PASS
     return None
 
@@ -112,9 +115,16 @@ def judge(case):
         if status != 0 or REGISTRY in tree or any(path in tree for path in programs(case.package)):
             case.violations.append("(running it again does not finish it)")
         return
-    elif registered == content(case.normal, REGISTRY) and case.scenario.name != "unregister" and (
-            all(content(case.after, path) == content(case.normal, path)
-                for path in programs(case.package))):
+    elif (
+        registered == content(case.normal, REGISTRY)
+        and case.scenario.name != "unregister"
+        and (
+            all(
+                content(case.after, path) == content(case.normal, path)
+                for path in programs(case.package)
+            )
+        )
+    ):
         case.state = "new"
     elif registered == content(case.before, REGISTRY):
         case.state = "old"

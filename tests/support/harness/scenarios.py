@@ -38,8 +38,9 @@ COMMAND_LOG = "/var/commands"
 
 OLD_FILE = HOME + "/bin/trawlold"
 OLD_PROPERTIES = HOME + "/properties/old.properties"
-OBSOLETE_FILES = tuple(HOME + "/bin/" + name
-                       for name in ("trawlnet", "libzor.so", "kpo_config.xml"))
+OBSOLETE_FILES = tuple(
+    HOME + "/bin/" + name for name in ("trawlnet", "libzor.so", "kpo_config.xml")
+)
 
 # What an administrator has given to a user and a group of operators.
 OPERATORS = (1002, 1003)
@@ -60,8 +61,9 @@ class Scenario:
     def run(self, machine, tool=()):
         """Runs the installer on `machine`, under the command `tool`."""
         environment = {"ZOR_COMMAND_LOG": COMMAND_LOG, **self.environment}
-        return machine.execute([*tool, BINARY, *self.arguments], ROOT, 0o022, environment, (),
-                               False)
+        return machine.execute(
+            [*tool, BINARY, *self.arguments], ROOT, 0o022, environment, (), False
+        )
 
 
 def toolkit_packages():
@@ -72,8 +74,11 @@ def toolkit_packages():
         subprocess.run([scripts / "build_toolkit.sh", tree], check=True)
         packages = {}
         for path, options in ((SPB, ()), (STORED_SPB, ("--stored",))):
-            subprocess.run([scripts / "pack_toolkit.py", tree, "-o", package,
-                            *options], check=True, stdout=subprocess.DEVNULL)
+            subprocess.run(
+                [scripts / "pack_toolkit.py", tree, "-o", package, *options],
+                check=True,
+                stdout=subprocess.DEVNULL,
+            )
             with open(package, "rb") as file:
                 packages[path] = file.read()
         return packages
@@ -103,6 +108,7 @@ def can_give_files_away(machine):
 
 
 # Furnishing.
+
 
 def nothing_installed(_):
     """A machine that never saw the toolkit."""
@@ -163,30 +169,54 @@ def last_exploiter(machine):
 
 def with_registry_that_cannot_be_saved(furnish):
     """A directory at the registry's backup name stops the last fatal step."""
+
     def furnish_so(machine):
         furnish(machine)
         machine.make_directory(REGISTRY + ".bak")
+
     return furnish_so
 
 
-SCENARIOS = {scenario.name: scenario for scenario in (
-    Scenario("install", "fresh installation", ("i", "SHOP", "-s", STORED_SPB), nothing_installed),
-    Scenario("upgrade", "upgrade of an older version", ("i", "CLUB", "-s", SPB), older_version),
-    Scenario("register", "registration on a newer version", ("i", "CLUB", "-s", SPB),
-             newer_version),
-    Scenario("unregister", "removal of one of two exploiters", ("r", "DESK"), two_exploiters),
-    Scenario("remove", "removal of the last exploiter", ("r", "SHOP"), last_exploiter),
-    Scenario("failing-install", "fresh installation whose last step fails",
-         ("i", "SHOP", "-s", SPB, "-r"), nothing_installed, True,
-         {"ZOR_FAIL": "-s common_trace_path:9"}),
-    Scenario("failing-upgrade", "upgrade whose last step fails", ("i", "CLUB", "-s", SPB),
-         with_registry_that_cannot_be_saved(older_version), True),
-    Scenario("failing-register", "registration whose last step fails", ("i", "CLUB", "-s", SPB),
-         with_registry_that_cannot_be_saved(newer_version), True),
-)}
+SCENARIOS = {
+    scenario.name: scenario
+    for scenario in (
+        Scenario(
+            "install", "fresh installation", ("i", "SHOP", "-s", STORED_SPB), nothing_installed
+        ),
+        Scenario("upgrade", "upgrade of an older version", ("i", "CLUB", "-s", SPB), older_version),
+        Scenario(
+            "register", "registration on a newer version", ("i", "CLUB", "-s", SPB), newer_version
+        ),
+        Scenario("unregister", "removal of one of two exploiters", ("r", "DESK"), two_exploiters),
+        Scenario("remove", "removal of the last exploiter", ("r", "SHOP"), last_exploiter),
+        Scenario(
+            "failing-install",
+            "fresh installation whose last step fails",
+            ("i", "SHOP", "-s", SPB, "-r"),
+            nothing_installed,
+            True,
+            {"ZOR_FAIL": "-s common_trace_path:9"},
+        ),
+        Scenario(
+            "failing-upgrade",
+            "upgrade whose last step fails",
+            ("i", "CLUB", "-s", SPB),
+            with_registry_that_cannot_be_saved(older_version),
+            True,
+        ),
+        Scenario(
+            "failing-register",
+            "registration whose last step fails",
+            ("i", "CLUB", "-s", SPB),
+            with_registry_that_cannot_be_saved(newer_version),
+            True,
+        ),
+    )
+}
 
 
 # Trees.
+
 
 def tree_of(machine):
     """The machine's whole tree; the time in the first line of an index is left out."""

@@ -14,11 +14,11 @@ TOOL = str(REPOSITORY / "tools" / "spb")
 # What `spb check` reports about the toolkit is gone with these.
 WITHOUT_FINDINGS = {
     "config/ZorTrace.properties": b"handlers.traceFile.fileName=$(ZOR_DestinationDir)/logs/t.log\n"
-                                  b"config.root=$(ZOR_ConfigRootDirectory)\n",
+    b"config.root=$(ZOR_ConfigRootDirectory)\n",
     "install/trawlcfg.sh": b"#!/bin/sh\nexec '$(ZOR_DestinationDir)/bin/trawlcfg' \"$@\"\n"
-                           b"# $(ZOR_ConfigRootDirectory) $(CorvanCommonDir) $(date)\n",
+    b"# $(ZOR_ConfigRootDirectory) $(CorvanCommonDir) $(date)\n",
     "install/rmdirs.sh": b"#!/bin/sh\nrmdir '$(ZOR_DestinationDir)/logs' \\\n"
-                         b"'$(ZOR_ConfigRootDirectory)/config' '$(CorvanCommonDir)/ZOR'\n",
+    b"'$(ZOR_ConfigRootDirectory)/config' '$(CorvanCommonDir)/ZOR'\n",
 }
 
 
@@ -28,8 +28,9 @@ def archive(changes=None, without=()):
 
 
 def run(*arguments, **options):
-    return subprocess.run([TOOL, *arguments], capture_output=True, text=True, check=False,
-                          **options)
+    return subprocess.run(
+        [TOOL, *arguments], capture_output=True, text=True, check=False, **options
+    )
 
 
 def check(path):

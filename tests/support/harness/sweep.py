@@ -106,8 +106,10 @@ def arguments_of(description, scenarios, sample=False):
 
 def built(preset):
     """Builds the installer; returns its path."""
-    for command in (["cmake", "--preset", preset],
-                    ["cmake", "--build", "--preset", preset, "--target", "wzorinst"]):
+    for command in (
+        ["cmake", "--preset", preset],
+        ["cmake", "--build", "--preset", preset, "--target", "wzorinst"],
+    ):
         subprocess.run(command, cwd=REPOSITORY, check=True, stdout=subprocess.DEVNULL)
     return os.path.join(REPOSITORY, "build", preset, "src/install/standalone/wzorinst")
 
@@ -134,6 +136,7 @@ class Laboratory:
 
     def run_all(self, jobs, work):
         """The results of `work`(machine, job) for each job, in the order of the jobs."""
+
         def on_a_free_machine(job):
             machine = self.free.get()
             try:
@@ -165,8 +168,13 @@ class Bench:
 
     def facts(self):
         """What every case of this scenario holds: arguments for the making of one."""
-        return {"scenario": self.scenario, "before": self.before, "normal": self.normal,
-                "package": self.package, "reference": self.reference}
+        return {
+            "scenario": self.scenario,
+            "before": self.before,
+            "normal": self.normal,
+            "package": self.package,
+            "reference": self.reference,
+        }
 
     def reference(self, name):
         """The tree of a run on a machine that differs as `name` says."""
@@ -189,23 +197,28 @@ def package_files(packages):
 
 # Trees to compare with.
 
+
 def run_without(*paths):
     """The tree that a scenario leaves on a machine without these paths."""
+
     def run(scenario, machine):
         for path in paths:
             if machine.exists(path):
                 machine.remove(path)
         scenario.run(machine)
         return tree_of(machine)
+
     return run
 
 
 def run_with_empty(path):
     """The tree that a scenario leaves on a machine where the file `path` is empty."""
+
     def run(scenario, machine):
         with open(machine.at(path), "wb"):
             pass
         return run_without()(scenario, machine)
+
     return run
 
 
@@ -230,14 +243,19 @@ REFERENCES = {
 
 # Tables.
 
+
 def table(heading, rows):
     """Lines of columns: the first to the left, all others to the right."""
     texts = [[str(cell) for cell in row] for row in (heading, *rows)]
     widths = [max(len(row[i]) for row in texts) for i in range(len(heading))]
     return "".join(
-        "  ".join([row[0].ljust(widths[0])] +
-                  [cell.rjust(width) for cell, width in zip(row[1:], widths[1:])]).rstrip() + "\n"
-        for row in texts)
+        "  ".join(
+            [row[0].ljust(widths[0])]
+            + [cell.rjust(width) for cell, width in zip(row[1:], widths[1:])]
+        ).rstrip()
+        + "\n"
+        for row in texts
+    )
 
 
 def shortened(names):
@@ -248,8 +266,12 @@ def shortened(names):
 
 def paragraph(first, text):
     """`first` and, indented below it, `text`."""
-    return first + "\n" + textwrap.fill(text, 96, initial_indent="    ",
-                                        subsequent_indent="    ") + "\n"
+    return (
+        first
+        + "\n"
+        + textwrap.fill(text, 96, initial_indent="    ", subsequent_indent="    ")
+        + "\n"
+    )
 
 
 def print_exemptions(cases):
@@ -264,6 +286,9 @@ def print_rules(rules, cases):
         used.update({(name, case.scenario.name) for name in case.excused.values()})
     print("Exemptions used (runs)\n")
     for rule in rules:
-        scenarios = [f"{scenario} {used[rule.name, scenario]}" for scenario in SCENARIOS
-                     if used[rule.name, scenario]]
+        scenarios = [
+            f"{scenario} {used[rule.name, scenario]}"
+            for scenario in SCENARIOS
+            if used[rule.name, scenario]
+        ]
         print(paragraph(f"{rule.name}: {', '.join(scenarios) or 'none'}", rule.reason))

@@ -49,15 +49,49 @@ class Entry:
 
     def local_header(self):
         sizes = (self.crc, self.packed_size, self.size) if self.local_sizes else (0, 0, 0)
-        return struct.pack("<4sHHHHHIIIHH", b"PK\3\4", 20, self.flags, self.local_method, 0, 0x21,
-                           *sizes, len(self.name), len(self.local_extra)
-                           ) + self.name + self.local_extra
+        return (
+            struct.pack(
+                "<4sHHHHHIIIHH",
+                b"PK\3\4",
+                20,
+                self.flags,
+                self.local_method,
+                0,
+                0x21,
+                *sizes,
+                len(self.name),
+                len(self.local_extra),
+            )
+            + self.name
+            + self.local_extra
+        )
 
     def central_header(self, offset):
-        return struct.pack("<4sHHHHHHIIIHHHHHII", b"PK\1\2", self.made_by, 20, self.flags,
-                           self.method, 0, 0x21, self.crc, self.packed_size, self.size,
-                           len(self.name), len(self.central_extra), len(self.comment), 0, 0,
-                           self.attributes, offset) + self.name + self.central_extra + self.comment
+        return (
+            struct.pack(
+                "<4sHHHHHHIIIHHHHHII",
+                b"PK\1\2",
+                self.made_by,
+                20,
+                self.flags,
+                self.method,
+                0,
+                0x21,
+                self.crc,
+                self.packed_size,
+                self.size,
+                len(self.name),
+                len(self.central_extra),
+                len(self.comment),
+                0,
+                0,
+                self.attributes,
+                offset,
+            )
+            + self.name
+            + self.central_extra
+            + self.comment
+        )
 
 
 class Writer:
@@ -82,12 +116,29 @@ class Writer:
         count = self.count & MAX_COUNT
         if zip64 and self.count > MAX_COUNT:
             end = self.file.tell()
-            self.file.write(struct.pack("<4sQHHIIQQQQ", b"PK\6\6", 44, 45, 45, 0, 0, self.count,
-                                        self.count, len(self.central), start))
+            self.file.write(
+                struct.pack(
+                    "<4sQHHIIQQQQ",
+                    b"PK\6\6",
+                    44,
+                    45,
+                    45,
+                    0,
+                    0,
+                    self.count,
+                    self.count,
+                    len(self.central),
+                    start,
+                )
+            )
             self.file.write(struct.pack("<4sIQI", b"PK\6\7", 0, end, 1))
             count = MAX_COUNT
-        self.file.write(struct.pack("<4sHHHHIIH", b"PK\5\6", 0, 0, count, count,
-                                    len(self.central), start, len(comment)) + comment)
+        self.file.write(
+            struct.pack(
+                "<4sHHHHIIH", b"PK\5\6", 0, 0, count, count, len(self.central), start, len(comment)
+            )
+            + comment
+        )
 
 
 class Archive:

@@ -20,8 +20,14 @@ def zorctl(machine, *arguments, user=ROOT, environment=None, tool=(), everywhere
     if not machine.exists(BINARY):
         machine.plant(BINARY)
     binary = os.path.realpath(os.environ["ZORCTL"])
-    return machine.execute([*tool, BINARY, *arguments], user, 0o022, environment,
-                           ("--ro-bind", binary, BINARY), everywhere)
+    return machine.execute(
+        [*tool, BINARY, *arguments],
+        user,
+        0o022,
+        environment,
+        ("--ro-bind", binary, BINARY),
+        everywhere,
+    )
 
 
 def schema(name):
