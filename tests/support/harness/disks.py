@@ -81,7 +81,10 @@ def why_not(*command):
 
 
 def run(*command):
-    done = subprocess.run(command, check=False, capture_output=True, text=True)
+    """Runs a command that Ctrl-C does not reach, so that cleaning up goes on to its end."""
+    done = subprocess.run(
+        command, check=False, capture_output=True, text=True, start_new_session=True
+    )
     if done.returncode != 0:
         raise OSError(f"{' '.join(command)}: {done.stderr.strip()}")
 
