@@ -7,7 +7,9 @@ from harness.machine import SPB
 from harness.zorctl import report, zorctl
 
 HOME = "/opt/corvan/zor"
-WARNING = "zorctl: warning: cannot lock /run/wzorinst.lock; this may change while it is reported\n"
+WARNING = """\
+zorctl: warning: cannot lock /run/wzorinst.lock; this may change while it is reported
+"""
 
 
 @pytest.fixture

@@ -4,7 +4,6 @@
 #include "zip_file.h"
 
 #include <algorithm>
-#include <memory>
 #include <vector>
 
 #include <unistd.h>
@@ -20,7 +19,7 @@ using Consumer = std::function<bool(const char*, std::size_t)>;
 class RawReader {
 public:
     RawReader(int archive, const ZipEntry& entry)
-        : archive_(archive), at_(dataStart(entry)), left_(entry.compressedSize), block_(BlockSize)
+        : archive_(archive), at_(dataStart(entry)), left_(entry.compressedSize)
     {
     }
 
@@ -43,7 +42,9 @@ private:
     int archive_;
     std::int64_t at_;
     std::uint32_t left_;
-    std::vector<char> block_;
+    // One for all: to allocate and clear a block for each of many small entries costs more than to
+    // read them. The tools have one thread.
+    inline static std::vector<char> block_ = std::vector<char>(BlockSize);
 };
 
 EntryState readStored(RawReader& reader, const ZipEntry& entry, const Consumer& consume)
@@ -59,17 +60,22 @@ EntryState readStored(RawReader& reader, const ZipEntry& entry, const Consumer& 
     return left == 0 ? EntryState::Whole : EntryState::Damaged;
 }
 
-struct InflateEnd {
-    void operator()(z_stream* stream) const { (void)inflateEnd(stream); }
-};
+/// The inflater of all entries, made ready for the next one; null without memory.
+z_stream* readyInflater()
+{
+    static z_stream stream = {};
+    static const int made = inflateInit2(&stream, RawDeflate);
+    stream.avail_in = 0;
+    return made == Z_OK && inflateReset(&stream) == Z_OK ? &stream : nullptr;
+}
 
 EntryState readDeflated(RawReader& reader, const ZipEntry& entry, const Consumer& consume)
 {
-    z_stream stream = {};
-    if (inflateInit2(&stream, RawDeflate) != Z_OK)
+    z_stream* const inflater = readyInflater();
+    if (inflater == nullptr)
         return EntryState::Damaged;
-    const std::unique_ptr<z_stream, InflateEnd> guard(&stream);
-    std::vector<char> output(BlockSize);
+    z_stream& stream = *inflater;
+    static std::vector<char> output(BlockSize);
     std::uint32_t left = entry.uncompressedSize;
     for (int result = Z_OK; result != Z_STREAM_END;) {
         if (stream.avail_in == 0) {
