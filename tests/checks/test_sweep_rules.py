@@ -235,7 +235,7 @@ OF_FAILED_CALLS = [
         ],
     ),
     (
-        "the index tells a removal what to delete",
+        "a removal deletes what the index lists",
         TOOL,
         failed(
             "remove",
