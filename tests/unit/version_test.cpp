@@ -94,6 +94,7 @@ TEST(BuildDateTest, TheDigitsOfADateAreItsNumber)
 {
     EXPECT_EQ(221202, buildDateNumber("22/12/02"));
     EXPECT_EQ(52307, buildDateNumber("05/23/07"));
+    EXPECT_EQ(1, buildDateNumber("00/00/01"));
 }
 
 TEST(BuildDateTest, AnyOtherTextIsZero)
