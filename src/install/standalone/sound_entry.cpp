@@ -95,13 +95,16 @@ bool beginsWithTinyBlocks(const unsigned char* packed)
 /// The content of `entry`, inflated in one call and confirmed by its size and its CRC-32; null when
 /// anything about it is unexpected. Valid until the next call.
 ///
-/// The stream is the definition of an entry's content, and its zlib refuses a few data that
-/// libdeflate accepts: more than 286 literal or 30 distance codes, the symbols 286 and 287 or the
-/// distances 30 and 31, a code without or with a single symbol where zlib wants a complete one, and
-/// (before libdeflate 1.19) a repeated code length that goes on past the last one. The stream would
-/// deliver a shorter entry then. No compressor writes such data, and finding it would take a second
-/// decoder. Where the content has the recorded size and CRC-32 all the same, it is what was packed,
-/// and nobody is served by less: such an entry counts as sound.
+/// The stream is the definition of an entry's content, and its zlib refuses some data that
+/// libdeflate (1.14) accepts:
+/// - more than 286 codes of literals and lengths or more than 30 of distances, and the length
+///   symbols 286 and 287 and the distance symbols 30 and 31 of the fixed code;
+/// - code lengths whose code is empty or has a single symbol, a use of a distance where the block
+///   has no distance code, and the unused half of a code with a single symbol;
+/// - a repeated code length that goes on past the last one.
+/// The stream would deliver a shorter entry then. No compressor writes such data, and recognising
+/// it would take a second decoder. Where the content has the recorded size and CRC-32 all the same,
+/// it is what was packed, and nobody is served by less: such an entry counts as sound.
 const unsigned char* inflateWhole(PackageWindow& package, const ZipEntry& entry)
 {
     static const std::unique_ptr<libdeflate_decompressor, void (*)(libdeflate_decompressor*)>
