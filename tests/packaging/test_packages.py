@@ -32,6 +32,7 @@ INSTALLED = """\
 
 SPB_INSTALLED = """\
 755 /usr/bin/spb
+644 /usr/share/bash-completion/completions/spb
 644 /usr/share/man/man1/spb.1.gz
 """
 
@@ -197,10 +198,10 @@ def test_the_packages_have_the_names_that_their_systems_expect(packages, names):
             f"wzorinst-spb-{VERSION}-linux-{processor}.tar.gz",
             f"wzorinst_{VERSION}-1_{debian}.deb",
             f"wzorinst-dbgsym_{VERSION}-1_{debian}.deb",
-            f"wzorinst-spb_{VERSION}-1_all.deb",
+            f"wzorinst-spb_{VERSION}-1_{debian}.deb",
             f"wzorinst-{VERSION}-1.{processor}.rpm",
             f"wzorinst-debuginfo-{VERSION}-1.{processor}.rpm",
-            f"wzorinst-spb-{VERSION}-1.noarch.rpm",
+            f"wzorinst-spb-{VERSION}-1.{processor}.rpm",
         ]
     )
 
@@ -286,19 +287,24 @@ def test_the_archive_unpacks_into_a_directory_of_its_name(packages, names):
     )
 
 
-def test_the_tool_for_spbs_is_a_deb_of_any_architecture_that_needs_python(packages, root):
-    deb = packages / f"wzorinst-spb_{VERSION}-1_all.deb"
+def test_the_tool_for_spbs_is_a_deb_that_needs_the_c_library_alone(packages, names, root):
+    deb = packages / f"wzorinst-spb_{VERSION}-1_{names['debian']}.deb"
 
     dpkg(root, "--install", deb)
 
     assert installed_files(root) == SPB_INSTALLED
-    assert (debian_fields(deb)["Architecture"], debian_fields(deb)["Depends"]) == ("all", "python3")
+    assert debian_fields(deb)["Depends"] == "libc6 (>= 2.34)"
+    shown = run_installed(root, "spb", "--version")
+    assert (shown.returncode, shown.stdout, shown.stderr) == (0, f"spb {VERSION}\n", "")
 
 
-def test_the_tool_for_spbs_is_an_rpm_of_any_architecture_that_needs_python(packages):
-    package = packages / f"wzorinst-spb-{VERSION}-1.noarch.rpm"
+def test_the_tool_for_spbs_is_an_rpm_that_needs_the_c_library_alone(packages, names):
+    package = packages / f"wzorinst-spb-{VERSION}-1.{names['processor']}.rpm"
 
-    assert "/usr/bin/python3" in rpm_query(package, "--requires").split()
+    needs = rpm_query(package, "--requires").splitlines()
+    assert names["library"] in needs
+    expected = ("libc.so.6", "ld-linux", "rtld(", "rpmlib(")
+    assert [need for need in needs if not need.startswith(expected)] == []
     assert rpm_query(package, "--list").split() == [
         line.split()[1] for line in SPB_INSTALLED.splitlines()
     ]

@@ -130,7 +130,7 @@ FAILS = {
     ),
     "a directory below a file": (
         with_entry("bin/trawlhw/x/", b""),
-        [("not-a-directory", "bin/trawlhw/x/")],
+        [("directory-stays", "bin/trawlhw/x/"), ("not-a-directory", "bin/trawlhw/x/")],
     ),
     "a file named as the directory itself": (
         with_entry("bin/."),
@@ -143,17 +143,19 @@ FAILS = {
     "a directory in the way of a backup": (
         spb_tool.archive().add(IMAGE_ROOT + "bin/trawlhw.bak/")
         .add(IMAGE_ROOT + "bin/trawlhw", b"data").content(),
-        [("backup-blocked", "bin/trawlhw")],
+        [("directory-stays", "bin/trawlhw.bak/"), ("backup-blocked", "bin/trawlhw")],
     ),
     "a directory in the way of a directory's backup": (
         spb_tool.archive().add(IMAGE_ROOT + "bin/x.bak/y/").add(IMAGE_ROOT + "bin/x/")
         .add(IMAGE_ROOT + "bin/x", b"x").content(),
-        [("backup-blocked", "bin/x")],
+        [("directory-stays", "bin/x.bak/y/"), ("directory-stays", "bin/x/"),
+         ("backup-blocked", "bin/x")],
     ),
     "a directory that became a backup and is in the way of another": (
         spb_tool.archive().add(IMAGE_ROOT + "bin/x/").add(IMAGE_ROOT + "bin/x", b"1")
         .add(IMAGE_ROOT + "bin/x", b"2").content(),
-        [("replaces-directory", "bin/x"), ("backup-blocked", "bin/x")],
+        [("directory-stays", "bin/x/"), ("replaces-directory", "bin/x"),
+         ("backup-blocked", "bin/x")],
     ),
     "a file over the directory of the second pass": (
         with_entry("config/xss"),
@@ -170,7 +172,8 @@ FAILS = {
     ),
     "a directory's name of 256 bytes": (
         with_entry("bin/" + "n" * 256 + "/", b""),
-        [("name-too-long", "bin/" + "n" * 256 + "/")],
+        [("directory-stays", "bin/" + "n" * 256 + "/"),
+         ("name-too-long", "bin/" + "n" * 256 + "/")],
     ),
     "a name without room for the backup of the second pass": (
         with_entry("config/xss/" + "n" * 252),
@@ -216,6 +219,10 @@ FAILS = {
     "more data than the entry's size": (
         with_entry("bin/x", b"x" * 100, DEFLATED, size=99),
         [("inflates-beyond-size", "bin/x")],
+    ),
+    "no name with its leading slash": (
+        spb_tool.archive().content().replace(IMAGE_ROOT.encode(), IMAGE_ROOT[1:].encode() + b"/"),
+        [("no-leading-slash", None)],
     ),
     "no scanner control": (
         package(without=["bin/trawlcfg"]),
@@ -297,7 +304,8 @@ SURPRISES = {
     "a file's path too long for the removal": (
         spb_tool.archive({name: b"" for name in LONG_DIRECTORIES})
         .add(IMAGE_ROOT + LONG_DIRECTORIES[-1] + "x", b"data").content(),
-        [("long-path", LONG_DIRECTORIES[-1] + "x")],
+        [*(("directory-stays", name) for name in LONG_DIRECTORIES),
+         ("long-path", LONG_DIRECTORIES[-1] + "x")],
     ),
     "a name without room for the backup of an upgrade": (
         with_entry("bin/" + "n" * 252),
@@ -313,12 +321,13 @@ SURPRISES = {
     ),
     "a file over a directory": (
         spb_tool.archive().add(IMAGE_ROOT + "bin/x/").add(IMAGE_ROOT + "bin/x", b"x").content(),
-        [("replaces-directory", "bin/x")],
+        [("directory-stays", "bin/x/"), ("replaces-directory", "bin/x")],
     ),
     "a file over a directory whose backup replaces an empty one": (
         spb_tool.archive().add(IMAGE_ROOT + "bin/x.bak/").add(IMAGE_ROOT + "bin/x/")
         .add(IMAGE_ROOT + "bin/x", b"x").content(),
-        [("replaces-directory", "bin/x")],
+        [("directory-stays", "bin/x.bak/"), ("directory-stays", "bin/x/"),
+         ("replaces-directory", "bin/x")],
     ),
     "a backup of a neighbour": (
         with_entry("bin/trawlhw.bak"),
@@ -368,6 +377,14 @@ SURPRISES = {
         with_entry("bin/x", size=2**31, packed_size=2**31),
         [("size-2-gib", "bin/x")],
     ),
+    "a directory that no removal deletes": (
+        with_entry("bin/tools/", b""),
+        [("directory-stays", "bin/tools/")],
+    ),
+    "a directory of scripts that no removal deletes": (
+        with_entry("install/tools/", b""),
+        [("directory-stays", "install/tools/")],
+    ),
     "an entry outside the image root": (
         spb_tool.archive().add("bin/x", b"data").content(),
         [("outside-image-root", "bin/x")],
@@ -416,6 +433,21 @@ SURPRISES = {
     ),
 }  # fmt: skip
 
+# It installs, but not what was packed.
+DAMAGED = {
+    case: SURPRISES.pop(case)
+    for case in (
+        "an encrypted entry",
+        "a wrong CRC",
+        "a deflated entry of less than its size",
+        "a deflated entry that is damaged",
+        "a deflated entry cut short",
+        "a stored entry of two sizes",
+        "a stored entry that reaches beyond the file",
+        "a stored entry of 2 GiB",
+    )
+}
+
 NOTHING = {
     "a sound package": package(),
     "a comment of the last file": spb_tool.archive()
@@ -426,6 +458,9 @@ NOTHING = {
     "an entry of exactly one block": with_entry("bin/x", bytes(8192), DEFLATED),
     "a name of 251 bytes": with_entry("bin/" + "n" * 251),
     "extra fields": with_entry("bin/x", local_extra=b"e" * 9, central_extra=b"e" * 5),
+    "directories that a removal deletes": spb_tool.archive(
+        {name: b"" for name in ("bin/plugins/", "bin/customscanners/", "bin/etc/",
+                                "bin/etc/trawlfs/", "config/any/", "properties/any/")}).content(),
     "a backup's name without a neighbour": with_entry("bin/x.bak"),
 }  # fmt: skip
 
@@ -474,6 +509,14 @@ def test_what_surprises_is_told_with_exit_status_1(spb, case):
     assert spb_tool.check(spb) == (1, told(findings, "surprises"))
 
 
+@pytest.mark.parametrize("case", DAMAGED)
+def test_damage_is_reported_with_exit_status_2(spb, case):
+    content, findings = DAMAGED[case]
+    spb.write_bytes(content)
+
+    assert spb_tool.check(spb) == (2, told(findings, "damaged"))
+
+
 @pytest.mark.parametrize("case", NOTHING)
 def test_a_package_with_nothing_to_tell_gives_exit_status_0(spb, case):
     spb.write_bytes(NOTHING[case])
@@ -484,6 +527,11 @@ def test_a_package_with_nothing_to_tell_gives_exit_status_0(spb, case):
 @pytest.mark.parametrize("case", FAILS)
 def test_the_installer_fails_where_the_check_says_so(empty_machine, case):
     assert install(empty_machine, FAILS[case][0]).status != 0
+
+
+@pytest.mark.parametrize("case", DAMAGED)
+def test_the_installer_installs_what_is_damaged(empty_machine, case):
+    assert install(empty_machine, DAMAGED[case][0]).status == 0
 
 
 @pytest.mark.parametrize("case", SURPRISES)
@@ -517,7 +565,8 @@ def test_check_and_installer_agree_on_a_damaged_package(empty_machine, seed):
 
     # What a damaged scanner control does when it is called cannot be predicted.
     if "bin/trawlcfg" not in [entry for _, _, entry in findings]:
-        assert (status == 2) == (outcome.status != 0), (findings, outcome.stdout)
+        fails = "fails" in [kind for kind, _, _ in findings]
+        assert fails == (outcome.status != 0), (status, findings, outcome.stdout)
 
 
 def test_the_packed_example_toolkit_has_nothing_to_tell_and_installs(empty_machine, tmp_path):
@@ -549,6 +598,65 @@ def test_nothing_to_tell_is_told_by_silence(spb):
     done = spb_tool.run("check", spb)
 
     assert (done.returncode, done.stdout, done.stderr) == (0, "", "")
+
+
+def test_only_directories_without_a_finding_are_gone_after_the_removal(empty_machine):
+    directories = ["bin/plugins/", "bin/customscanners/", "bin/etc/", "bin/etc/trawlfs/",
+                   "bin/etc/trawlhw/", "bin/etc/trawlsw/", "bin/etc/trawlvpd/", "config/any/",
+                   "properties/any/", "install/QMX_CLI/", "bin/tools/", "install/tools/"]  # fmt: skip
+    package_of_them = spb_tool.archive({name: b"" for name in directories}).content()
+    empty_machine.plant(SPB, package_of_them)
+    _, findings = spb_tool.check(empty_machine.at(SPB))
+    assert empty_machine.run("i", "ABC", "-s", SPB).status == 0
+
+    assert empty_machine.run("r", "ABC").status == 0
+
+    stay = [name for name in directories if empty_machine.exists("/opt/corvan/zor/" + name)]
+    assert stay == ["bin/tools/", "install/tools/"]
+    assert [entry for _, code, entry in findings if code == "directory-stays"] == stay
+    empty_machine.remove("/opt/corvan")
+
+
+def test_accepted_findings_are_not_reported(spb):
+    spb.write_bytes(SURPRISES["a symbolic link"][0])
+
+    done = spb_tool.run("check", "--accept", "symbolic-link", "--accept=long-path", spb)
+
+    assert (done.returncode, done.stdout, done.stderr) == (0, "", "")
+
+
+def test_a_code_that_there_is_not_cannot_be_accepted(spb):
+    done = spb_tool.run("check", "--accept", "no-such", spb)
+
+    assert (done.returncode, done.stdout) == (2, "")
+    assert done.stderr.endswith("spb check: error: --accept: there is no code no-such\n")
+
+
+def test_several_packages_are_checked_in_one_run(tmp_path):
+    one, two = tmp_path / "one.spb", tmp_path / "two.spb"
+    one.write_bytes(package())
+    two.write_bytes(with_comment(1))
+
+    text = spb_tool.run("check", one, two, tmp_path / "three.spb")
+    listed = spb_tool.run("check", "--json", one, two)
+
+    assert text.returncode == 2
+    assert text.stdout == (
+        f"{two}: surprises: archive-comment: the archive has a comment; the central directory is"
+        " not used, only the local headers are\n"
+    )
+    assert text.stderr == f"spb: {tmp_path}/three.spb: No such file or directory\n"
+    assert listed.returncode == 1
+    assert [(report["file"], len(report["findings"])) for report in json.loads(listed.stdout)] == [
+        (str(one), 0),
+        (str(two), 1),
+    ]
+
+
+def test_a_damaged_package_does_not_count_as_one_that_installs(spb):
+    spb.write_bytes(DAMAGED["a wrong CRC"][0])
+
+    assert json.loads(spb_tool.run("check", "--json", spb).stdout)["installs"] is False
 
 
 def test_json_tells_whether_the_package_installs(spb):
@@ -607,6 +715,8 @@ def test_every_code_has_a_case():
     met = {}
     for findings in [findings for _, findings in FAILS.values()]:
         met.update({code: kind for kind, code, _ in told(findings, "fails")})
+    for findings in [findings for _, findings in DAMAGED.values()]:
+        met.update({code: kind for kind, code, _ in told(findings, "damaged")})
     for findings in [findings for _, findings in SURPRISES.values()]:
         met.update({code: kind for kind, code, _ in told(findings, "surprises")})
 

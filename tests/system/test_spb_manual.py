@@ -10,6 +10,9 @@ from harness import REPOSITORY, spb_tool
 SOURCE = REPOSITORY / "docs" / "man" / "spb.1.scd"
 
 
+COMMANDS = ["pack", "list", "check", "info", "diff", "extract", "sbom", "sign", "verify"]
+
+
 @pytest.fixture(scope="module")
 def page():
     with SOURCE.open("rb") as source:
@@ -28,13 +31,14 @@ def test_the_manual_page_renders_without_a_warning(page):
     )
 
     assert (done.returncode, done.stderr) == (0, b"")
-    assert b"pack, list and check SPBs" in done.stdout
+    assert b"make, check, compare and sign SPBs" in done.stdout
 
 
 def test_the_manual_page_explains_every_code_under_its_kind():
     explained = {}
     for kind, title in [
         ("fails", "## Kind fails: an installation of this package fails"),
+        ("damaged", "## Kind damaged: it installs, but not what was packed"),
         ("surprises", "## Kind surprises: it installs, but not as its maker may think"),
     ]:
         codes = re.findall(r"^\*([a-z0-9-]+)\*\n\t\S", section(title), flags=re.MULTILINE)
@@ -44,7 +48,7 @@ def test_the_manual_page_explains_every_code_under_its_kind():
     assert explained == spb_tool.codes()
 
 
-@pytest.mark.parametrize("command", ["pack", "list", "check"])
+@pytest.mark.parametrize("command", COMMANDS)
 def test_the_manual_page_names_the_options_of_the_command(command):
     help_text = spb_tool.run(command, "--help").stdout
     synopsis = re.search(rf"^\*spb {command}\*.*", section("# SYNOPSIS"), re.MULTILINE)[0]
@@ -54,11 +58,7 @@ def test_the_manual_page_names_the_options_of_the_command(command):
 
 
 def test_the_help_of_the_tool_names_its_commands():
-    assert re.findall(r"^    ([a-z]+)  ", spb_tool.run("--help").stdout, re.MULTILINE) == [
-        "pack",
-        "list",
-        "check",
-    ]
+    assert re.findall(r"^    ([a-z]+)  ", spb_tool.run("--help").stdout, re.MULTILINE) == COMMANDS
 
 
 def test_no_command_is_a_usage_error():

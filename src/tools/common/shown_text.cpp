@@ -100,3 +100,14 @@ std::string shown(std::string_view bytes)
     }
     return text;
 }
+
+bool isUtf8(std::string_view bytes)
+{
+    while (!bytes.empty()) {
+        const Decoded next = decode(bytes);
+        if (next.size == 0)
+            return false;
+        bytes.remove_prefix(next.size);
+    }
+    return true;
+}

@@ -10,3 +10,6 @@
 /// "\x1b" and so on; characters that show nothing, change the direction of writing or are no
 /// characters become "\u202e" or "\U000e0001". Everything else, the backslash too, stays as it is.
 [[nodiscard]] std::string shown(std::string_view bytes);
+
+/// True when `bytes` are valid UTF-8 as a whole.
+[[nodiscard]] bool isUtf8(std::string_view bytes);

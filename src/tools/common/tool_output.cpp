@@ -30,12 +30,12 @@ void printJson(const Json& value)
 
 int finishOutput(int status, int trouble, std::string_view what)
 {
-    errno = 0;
     std::cout.flush();
-    const int error = errno;
     if (std::cout.good())
         return status;
+    // The stream has not kept what the system answered: it answers once more.
+    const int error = write(STDOUT_FILENO, "\n", 1) < 0 ? errno : EIO;
     if (error != EPIPE)
-        complainOf(what, error == 0 ? EIO : error);
+        complainOf(what, error);
     return trouble;
 }

@@ -1,6 +1,8 @@
 """Packing a tree into an SPB: the bytes of the archive, and what is refused."""
 
 import os
+import random
+import signal
 import struct
 import subprocess
 import zipfile
@@ -8,9 +10,8 @@ from pathlib import Path
 
 import pytest
 
-from harness import REPOSITORY, spb_tool
+from harness import spb_tool
 
-PACK_TOOLKIT = REPOSITORY / "scripts" / "pack_toolkit.py"
 ROOT = "/home/zorbuild/zor_src_dir/ZOR/zor_pkgs/images/linux-ix86/"
 
 
@@ -23,9 +24,23 @@ def plant(tree, files):
     return tree
 
 
+# What the small trees of these tests lack of a package that installs.
+ACCEPTED = [
+    f"--accept={code}"
+    for code in (
+        "directory-stays",
+        "missing-file-scanner",
+        "missing-placeholder",
+        "missing-property-file",
+        "missing-scanner-control",
+        "missing-script",
+    )
+]
+
+
 def pack(tree, output, *options, **environment):
     return subprocess.run(
-        [PACK_TOOLKIT, tree, "-o", output, *options],
+        [spb_tool.TOOL, "pack", tree, "-o", output, *ACCEPTED, *options],
         capture_output=True,
         text=True,
         check=False,
@@ -364,23 +379,23 @@ def test_a_directory_that_cannot_take_the_package_is_named(tree, tmp_path):
 
 
 def test_a_missing_output_file_is_a_usage_error(tree):
-    run = subprocess.run([PACK_TOOLKIT, tree], capture_output=True, text=True, check=False)
+    run = subprocess.run([spb_tool.TOOL, "pack", tree], capture_output=True, text=True, check=False)
 
     assert run.returncode == 2
-    assert run.stderr.startswith("usage: spb pack [-h] -o FILE [--stored] DIR\n")
+    assert run.stderr.startswith("usage: spb pack [-h] -o FILE [--stored] [--accept CODE] DIR\n")
 
 
 def test_a_large_tree_shows_its_progress_on_a_terminal(tree, spb):
     plant(tree, {f"bin/{number}": b"1" for number in range(1000)})
 
-    shown = spb_tool.shown_on_a_terminal("pack", tree, "-o", spb)
+    shown = spb_tool.shown_on_a_terminal("pack", tree, "-o", spb, *ACCEPTED)
 
     assert shown.startswith(b"\rspb: packing, ")
     assert shown.endswith(b" %\x1b[K\r\x1b[K")
 
 
 def test_a_small_tree_is_packed_in_silence_on_a_terminal(tree, spb):
-    assert spb_tool.shown_on_a_terminal("pack", tree, "-o", spb) == b""
+    assert spb_tool.shown_on_a_terminal("pack", tree, "-o", spb, *ACCEPTED) == b""
 
 
 def test_a_large_tree_shows_no_progress_without_a_terminal(tree, spb):
@@ -389,3 +404,69 @@ def test_a_large_tree_shows_no_progress_without_a_terminal(tree, spb):
     run = pack(tree, spb)
 
     assert (run.returncode, run.stdout, run.stderr) == (0, "", "")
+
+
+def test_files_of_many_chunks_are_joined_the_same_way_on_one_processor(tree, tmp_path):
+    dice = random.Random(1)
+    words = [bytes(dice.choices(range(97, 123), k=dice.randint(2, 9))) for _ in range(3000)]
+    contents = {
+        "words": b" ".join(dice.choices(words, k=1_000_000)),
+        "zeros": bytes(5_000_000),
+        "noise": dice.randbytes(4_500_000),
+        "mixed": b"".join(bytes(70_000) + dice.randbytes(50_000) for _ in range(60)),
+        "exact": dice.randbytes(2 << 20) + b"a" * (2 << 20),
+        "one-more": b"ab" * (1 << 20) + b"c",
+    }
+    plant(tree, {f"bin/{name}": content for name, content in contents.items()})
+    processors = os.sched_getaffinity(0)
+
+    assert pack(tree, tmp_path / "all.spb").returncode == 0
+    os.sched_setaffinity(0, {min(processors)})
+    try:
+        assert pack(tree, tmp_path / "one.spb").returncode == 0
+    finally:
+        os.sched_setaffinity(0, processors)
+
+    assert (tmp_path / "all.spb").read_bytes() == (tmp_path / "one.spb").read_bytes()
+    archive = zipfile.ZipFile(tmp_path / "all.spb")
+    for name, content in contents.items():
+        assert archive.read(ROOT + "bin/" + name) == content, name
+    assert archive.getinfo(ROOT + "bin/noise").compress_type == zipfile.ZIP_STORED
+
+
+def test_packing_ends_with_the_check_and_refuses_what_cannot_be_installed(tree, spb):
+    run = subprocess.run([spb_tool.TOOL, "pack", tree, "-o", spb, "--accept=missing-placeholder"],
+                         capture_output=True, text=True, check=False)
+
+    assert (run.returncode, run.stdout) == (1, "")
+    assert run.stderr == (
+        "spb: fails: missing-property-file: config/ZorTrace.properties: without this property file"
+        " an installation fails\n"
+        "spb: surprises: missing-file-scanner: bin/trawlfs: without the file-system scanner its"
+        " service cannot be stopped\n"
+        "spb: surprises: missing-script: install/rmdirs.sh: the installer looks for this script\n"
+    )
+    assert not spb.exists()
+
+
+def test_a_dash_packs_to_standard_output(tree, spb):
+    assert pack(tree, spb).returncode == 0
+
+    run = subprocess.run([spb_tool.TOOL, "pack", tree, "-o", "-", *ACCEPTED], capture_output=True,
+                         check=False)
+
+    assert (run.returncode, run.stdout, run.stderr) == (0, spb.read_bytes(), b"")
+
+
+@pytest.mark.parametrize("ending", [signal.SIGTERM, signal.SIGHUP, signal.SIGINT])
+def test_a_signal_leaves_no_temporary_file(tree, spb, ending):
+    os.truncate(plant(tree, {"bin/huge": b"1"}) / "bin" / "huge", 2**31 - 2**20)
+    before = set(spb.parent.iterdir())
+    with subprocess.Popen([spb_tool.TOOL, "pack", tree, "-o", spb, *ACCEPTED]) as process:
+        while set(spb.parent.iterdir()) == before:
+            assert process.poll() is None, "ended before it wrote anything"
+
+        process.send_signal(ending)
+
+        assert process.wait() == -ending
+    assert set(spb.parent.iterdir()) == before
