@@ -107,6 +107,14 @@ def extraction():
     }
 
 
+def spb():
+    paths = Archive()
+    for name in ("/bin/../../x", "/bin/..", "/bin/a/../../../x", "/bin/a\0b", "bin/relative",
+                 "/config/.", "/install/x\ny", "/bin/long" + "g" * 300):
+        paths.add(name, TEXT)
+    return {"paths": paths.content(), **extraction()}
+
+
 def entry(method, how, size, data, *, offset=0, packed_size=None):
     packed_size = len(data) if packed_size is None else packed_size
     head = struct.pack("<BBII", how << 1 | (method == DEFLATED), offset, packed_size, size)
@@ -199,6 +207,7 @@ def main():
         journal,
         property_file,
         registry,
+        spb,
         zip_directory,
     ):
         directory = os.path.join(sys.argv[1], target.__name__)

@@ -8,7 +8,6 @@ import pytest
 
 from harness.checks import printed
 from harness.machine import ANN, SPB
-from harness.scenarios import REPOSITORY
 from harness.zorctl import zorctl
 
 HOME = "/opt/corvan/zor"
@@ -20,7 +19,7 @@ def ready(machine):
     """A machine with the tools next to one another, and a place for locks and logs."""
     for path in ("/run", "/var/tmp", "/var/log"):
         machine.make_directory(path)
-    with open(os.path.join(REPOSITORY, "tools/spb"), "rb") as file:
+    with open(os.environ["SPB"], "rb") as file:
         machine.plant("/media/spb", file.read(), 0o755)
     return machine
 
