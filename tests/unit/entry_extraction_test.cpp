@@ -1,5 +1,4 @@
 #include "entry_extraction.h"
-
 #include "installer_fixtures.h"
 #include "process_limits.h"
 #include "safe_path.h"

@@ -9,6 +9,8 @@
 #include <algorithm>
 #include <filesystem>
 
+#include <fcntl.h>
+#include <sys/resource.h>
 #include <sys/stat.h>
 #include <sys/syscall.h>
 
@@ -301,6 +303,31 @@ TEST_F(RemoveTreeTest, FilesOfTheTopDirectoryAloneCanBeRemoved)
 TEST_F(RemoveTreeTest, RemovingFilesNeverFails)
 {
     EXPECT_EQ(0, removeFiles(dir / "missing", "", true));
+}
+
+TEST_F(RemoveTreeTest, ADeepTreeTakesFewDescriptorsAndLittleStack)
+{
+    constexpr int Levels = 2000;
+    const int top = open(dir.path().c_str(), O_RDONLY | O_DIRECTORY);
+    int level = top;
+    for (int depth = 0; depth < Levels; ++depth) {
+        ASSERT_EQ(0, mkdirat(level, "d", 0755));
+        const int below = openat(level, "d", O_RDONLY | O_DIRECTORY);
+        ASSERT_GE(below, 0);
+        (void)close(level);
+        level = below;
+    }
+    (void)close(level);
+
+    EXPECT_TRUE(passesInChild([&] {
+        const rlimit descriptors = {64, 64};
+        ASSERT_EQ(0, setrlimit(RLIMIT_NOFILE, &descriptors));
+        const rlimit stack = {128 * 1024, 128 * 1024};
+        ASSERT_EQ(0, setrlimit(RLIMIT_STACK, &stack));
+        ASSERT_TRUE(removeTree(dir / "d", true, false));
+    }));
+
+    EXPECT_FALSE(pathExists(dir / "d"));
 }
 
 } // namespace

@@ -7,12 +7,12 @@
 #include "text.h"
 
 #include <algorithm>
-#include <ext/stdio_filebuf.h>
 #include <iostream>
 #include <memory>
 #include <string_view>
 #include <utility>
 
+#include <ext/stdio_filebuf.h>
 #include <fcntl.h>
 
 namespace {
@@ -58,8 +58,8 @@ bool isDescriptorPath(std::string_view path)
 ScopedFd openLog(const std::string& path)
 {
     if (isDescriptorPath(path))
-        return ScopedFd(open(path.c_str(), O_WRONLY | O_CREAT | O_TRUNC | O_NOCTTY | O_CLOEXEC,
-                             LogFileMode));
+        return ScopedFd(
+            open(path.c_str(), O_WRONLY | O_CREAT | O_TRUNC | O_NOCTTY | O_CLOEXEC, LogFileMode));
     WritableFile file;
     (void)openForWriting(path, Existing::Truncate, LogFileMode, file); // see redirectLog()
     return std::move(file.fd);
@@ -69,7 +69,7 @@ ScopedFd openLog(const std::string& path)
 void redirectLog(const char* path)
 {
     using Buffer = __gnu_cxx::stdio_filebuf<char>;
-    static std::unique_ptr<Buffer> buffer;  // lives to the end of the process, which flushes it
+    static std::unique_ptr<Buffer> buffer; // lives to the end of the process, which flushes it
     static std::ostream stream(nullptr);
 
     stream.rdbuf(nullptr); // nothing is printed meanwhile

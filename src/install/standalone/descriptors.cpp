@@ -6,9 +6,8 @@
 
 #include <dirent.h>
 #include <fcntl.h>
-#include <unistd.h>
-
 #include <linux/close_range.h>
+#include <unistd.h>
 
 namespace {
 

@@ -23,7 +23,7 @@ constexpr mode_t ProbeFileMode = 0600;
 bool canCreateProbe(const std::string& home)
 {
     const std::string probe = joinPath(home, ProbeFileName);
-    if (!openStream(probe, Existing::TruncateUnlinked, ProbeFileMode))
+    if (!openStream(probe, Existing::Truncate, ProbeFileMode))
         return false;
     (void)unlinkPath(probe); // an empty file at the worst
     return true;

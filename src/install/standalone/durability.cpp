@@ -55,9 +55,10 @@ FileSystemSync::FileSystemSync(const std::vector<std::string>& directories)
 {
     for (const std::string& path : directories) {
         ScopedFd directory = openNearest(path);
-        const bool isKnown = std::any_of(
-            fileSystems_.begin(), fileSystems_.end(),
-            [&](const ScopedFd& known) { return areOnOneFileSystem(known, directory); });
+        const bool isKnown =
+            std::any_of(fileSystems_.begin(), fileSystems_.end(), [&](const ScopedFd& known) {
+                return areOnOneFileSystem(known, directory);
+            });
         if (directory.isOpen() && !isKnown)
             fileSystems_.push_back(std::move(directory));
     }

@@ -7,6 +7,7 @@
 #include "safe_path.h"
 #include "scoped.h"
 #include "settings.h"
+#include "shell_command.h"
 
 #include <cstdlib>
 #include <deque>
@@ -65,7 +66,7 @@ int runCommand(const std::string& program, const std::string& /*directory*/,
     // The command's own output, in debug mode, stands behind what was printed before it.
     std::cout.flush();
     logstream->flush();
-    const int status = std::system(command.c_str());
+    const int status = runShell(command);
     noteStatusOfCommand(status);
     *logstream << "Exec '" << command << "' returned " << status << '\n';
     return status;

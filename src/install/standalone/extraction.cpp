@@ -95,10 +95,9 @@ int extractDirs(FileTransaction& transaction, const ZipFile& archive, const std:
         const bool isConfig = step.subdir == spbCfgDir; // says so, and never traces
         if (isConfig)
             *logstream << "Extracting configs to '" << destination << "'\n" << std::flush;
-        const int code =
-            extractMatching(transaction, package, sourcePrefix(step.subdir), destination, step.mode,
-                            isConfig ? &step.skipList : nullptr, zor_file_handle,
-                            debugMode && !isConfig);
+        const int code = extractMatching(
+            transaction, package, sourcePrefix(step.subdir), destination, step.mode,
+            isConfig ? &step.skipList : nullptr, zor_file_handle, debugMode && !isConfig);
         if (code == FileOk)
             continue;
         if (step.subdir == spbBinDir)

@@ -144,8 +144,8 @@ int finish(const Place& place, ScopedFd& temporary, const ContentWriter& write,
         error = syncFile(temporary.get());
     if (error == 0 && close(temporary.release()) != 0)
         error = errno;
-    if (error == 0 && renameat(place.fd(), temporaryName(place).c_str(), place.fd(),
-                               place.name.c_str()) != 0)
+    if (error == 0 &&
+        renameat(place.fd(), temporaryName(place).c_str(), place.fd(), place.name.c_str()) != 0)
         error = errno;
     if (error != 0)
         deleteTemporary(place);

@@ -77,8 +77,7 @@ void openTransientIndex(FileTransaction& transaction, const std::string& path)
 {
     const ScopedUmask mask(globalFilesUmask);
     (void)createPath(transaction, path, IndexDirectoryMode); // if it fails, so does the open
-    zor_file_handle =
-        openStream(path, Existing::TruncateUnlinked, IndexFileMode, O_RDWR).release();
+    zor_file_handle = openStream(path, Existing::Truncate, IndexFileMode, O_RDWR).release();
     if (zor_file_handle == nullptr) {
         *logstream << "Warning! Failed to create install log file: " << path << '\n';
         return;

@@ -36,12 +36,12 @@ std::vector<std::string> writtenDirectories(const std::string& home, bool useCus
     if (useCustomPath)
         directories.push_back(customPath);
     else if (!localInstall)
-        directories.insert(directories.end(),
-                           {readCommonDirectory(true), commonSettingPath()});
+        directories.insert(directories.end(), {readCommonDirectory(true), commonSettingPath()});
     return directories;
 }
 
-/// Runs the fresh installation or the upgrade, which a signal can stop until all its steps are made.
+/// Runs the fresh installation or the upgrade, which a signal can stop until all its steps are
+/// made.
 int runProcedure(bool upgrade, FileTransaction& transaction, InstallRegistry& registry,
                  InstallRegistry& request, const std::string& indexPath, bool flag,
                  bool useCustomPath, const std::string& customPath)

@@ -9,6 +9,8 @@
 
 namespace {
 
+constexpr int ShellSignalBase = 128; // a shell's exit status for a command that a signal killed
+
 volatile std::sig_atomic_t noted = 0;
 bool interruptible = false;
 
@@ -28,7 +30,7 @@ void watchForSignals()
             continue;
         action = {};
         action.sa_handler = note;
-        action.sa_flags = SA_RESTART; // no step fails because of a signal
+        action.sa_flags = SA_RESTART;              // no step fails because of a signal
         (void)sigaction(signal, &action, nullptr); // cannot fail
     }
 }
@@ -50,8 +52,11 @@ bool isInterrupted()
 
 void noteStatusOfCommand(int status)
 {
-    if (WIFSIGNALED(status) && (WTERMSIG(status) == SIGINT || WTERMSIG(status) == SIGQUIT))
-        note(WTERMSIG(status));
+    for (const int signal : {SIGINT, SIGQUIT}) {
+        const bool killed = WIFSIGNALED(status) && WTERMSIG(status) == signal;
+        if (killed || (WIFEXITED(status) && WEXITSTATUS(status) == ShellSignalBase + signal))
+            note(signal);
+    }
 }
 
 void endBySignal()

@@ -23,8 +23,8 @@ public:
 /// True if a signal was noted and the run is interruptible: the caller's step is not made.
 [[nodiscard]] bool isInterrupted();
 
-/// Notes a signal if `status`, a raw status of system(), belongs to a command that was killed by
-/// INT or QUIT: while a command runs, these reach only the command.
+/// Notes a signal if `status`, the raw status of a command, says that INT or QUIT killed it, or
+/// that a shell reports so (exit status 130 or 131). The key for it was pressed to stop the run.
 void noteStatusOfCommand(int status);
 
 /// If a signal was noted, flushes all output and ends the process by that signal.

@@ -155,7 +155,7 @@ private:
         if (isLast && end != rest_.size() && !S_ISDIR(status.st_mode))
             return ENOTDIR;
         if (isLast)
-            return arriveAt(name); // without trailing slashes, which would follow a link
+            return arriveAt(name);         // without trailing slashes, which would follow a link
         directory_ = std::move(component); // if it is no directory, the next component fails
         rest_.erase(0, end);
         return 0;
@@ -272,15 +272,14 @@ int openExisting(const Place& place, Existing existing, int access, ScopedFd& fi
     ScopedFd fd = openPlace(place, access | (existing == Existing::Append ? O_APPEND : 0));
     if (!fd.isOpen())
         return errno;
-    if (existing != Existing::Append) {
-        struct stat status = {};
-        if (fstat(fd.get(), &status) != 0)
-            return errno;
-        if (existing == Existing::TruncateUnlinked && isPlantedHardLink(place, status))
-            return EPERM;
-        if (S_ISREG(status.st_mode) && status.st_size != 0 && ftruncate(fd.get(), 0) != 0)
-            return errno;
-    }
+    struct stat status = {};
+    if (fstat(fd.get(), &status) != 0)
+        return errno;
+    if (isPlantedHardLink(place, status))
+        return EPERM;
+    if (existing == Existing::Truncate && S_ISREG(status.st_mode) && status.st_size != 0 &&
+        ftruncate(fd.get(), 0) != 0)
+        return errno;
     file = std::move(fd);
     return 0;
 }

@@ -99,8 +99,6 @@ enum class Existing {
     Refuse,   ///< only a new file, also in place of a dangling link of ours
     Truncate, ///< as fopen() "w"
     Append,   ///< as fopen() "a"
-    /// As Truncate, but EPERM for a file with another name that someone else may have planted here.
-    TruncateUnlinked,
 };
 
 /// A file opened for writing.
@@ -111,7 +109,7 @@ struct WritableFile {
 
 /// Opens `path` for writing, with O_RDWR as `access` for reading as well, or, if it is missing,
 /// creates it with `mode` under the umask. Existing files are treated as for openPath(). Returns 0
-/// or an `errno`.
+/// or an `errno`, EPERM for a file with another name that someone else may have planted here.
 [[nodiscard]] int openForWriting(const std::string& path, Existing existing, mode_t mode,
                                  WritableFile& file, int access = O_WRONLY);
 

@@ -5,6 +5,7 @@
 #include "scoped.h"
 #include "settings.h"
 
+#include <algorithm>
 #include <climits>
 #include <cstddef>
 #include <cstdio>
@@ -28,26 +29,30 @@ bool isDotName(std::string_view name)
     return name == "." || name == "..";
 }
 
-/// The names in the directory `fd`, in the order in which the system returns them, each ended by a
-/// NUL. A failure ends the list.
-std::string namesIn(int fd)
+/// What all levels together may hold of their directories' names, in bytes. One level may always
+/// hold a block. A directory with more names is listed again once those that were held are gone.
+constexpr std::size_t NamesLimit = std::size_t{32} * 1024 * 1024;
+
+/// Adds names in the directory `fd` to `names`, in the order in which the system returns them, each
+/// ended by a NUL, until there are no more or `names` has `limit` bytes. Returns true if there may
+/// be more. A failure ends the list.
+bool listNames(int fd, std::size_t limit, std::string& names)
 {
     static char block[std::size_t{32} * 1024];
-    std::string names;
-    for (;;) {
+    do {
         const ssize_t size = getdents64(fd, block, sizeof block);
         if (size <= 0)
-            return names;
+            return false;
         for (ssize_t at = 0; at < size;) {
-            // The kernel aligns its records, but the block is only an array of characters.
-            dirent64 entry; // NOLINT(cppcoreguidelines-pro-type-member-init)
-            std::memcpy(&entry.d_reclen, block + at + offsetof(dirent64, d_reclen),
-                        sizeof entry.d_reclen);
+            // Copied: the compiler knows the block only as characters.
+            unsigned short length = 0;
+            std::memcpy(&length, block + at + offsetof(dirent64, d_reclen), sizeof length);
             names += block + at + offsetof(dirent64, d_name);
             names += '\0';
-            at += entry.d_reclen;
+            at += length;
         }
-    }
+    } while (names.size() < limit);
+    return true;
 }
 
 /// Deletes a tree. It goes down and up by descriptors, never by paths, so that nothing that is
@@ -68,6 +73,8 @@ public:
             Level& level = levels_.back();
             if (level.next < level.names.size())
                 removeNext(level);
+            else if (level.hasMore && level.hasDeleted)
+                listAgain(level);
             else if (levels_.size() > 1)
                 leave();
             else
@@ -81,9 +88,11 @@ private:
         std::string name; ///< in the level above
         dev_t device;
         ino_t inode;
-        std::size_t pathSize; ///< of the directory's own path
-        std::string names;    ///< what it held when it was entered; see namesIn()
-        std::size_t next = 0; ///< where the next name begins
+        std::size_t pathSize;    ///< of the directory's own path
+        std::string names;       ///< what it holds; see listNames()
+        std::size_t next = 0;    ///< where the next name begins
+        bool hasMore = false;    ///< it holds more than `names`
+        bool hasDeleted = false; ///< something in it was deleted since it was listed
         bool result = true;
     };
 
@@ -92,8 +101,25 @@ private:
         struct stat status = {};
         (void)fstat(directory.get(), &status); // if it fails, the way up will not match
         current_ = std::move(directory);
-        levels_.push_back({name, status.st_dev, status.st_ino, path_.size(),
-                           namesIn(current_.get())});
+        levels_.push_back({name, status.st_dev, status.st_ino, path_.size(), {}});
+        list(levels_.back());
+    }
+
+    void listAgain(Level& level)
+    {
+        (void)lseek(current_.get(), 0, SEEK_SET); // if it fails, the list is empty
+        list(level);
+    }
+
+    void list(Level& level)
+    {
+        held_ -= level.names.size();
+        level.names.clear();
+        level.next = 0;
+        level.hasDeleted = false;
+        level.hasMore =
+            listNames(current_.get(), NamesLimit - std::min(NamesLimit, held_), level.names);
+        held_ += level.names.size();
     }
 
     void removeNext(Level& level)
@@ -121,7 +147,9 @@ private:
         }
         if (!S_ISDIR(status.st_mode)) {
             *logstream << "DEL: " << path_ << '\n';
-            if (unlinkat(current_.get(), name.c_str(), 0) != 0)
+            if (unlinkat(current_.get(), name.c_str(), 0) == 0)
+                level.hasDeleted = true;
+            else
                 level.result = false;
             return false;
         }
@@ -139,6 +167,7 @@ private:
     {
         const Level child = std::move(levels_.back());
         levels_.pop_back();
+        held_ -= child.names.size();
         const bool isBack = goUp();
         bool result = child.result;
         if (!keepDirs_) {
@@ -147,6 +176,7 @@ private:
             if (isRemoved)
                 *logstream << "RMDIR: " << path_ << '\n';
             result = isRemoved && result;
+            levels_.back().hasDeleted = levels_.back().hasDeleted || isRemoved;
         }
         // Deliberate: a later success hides an earlier failure.
         Level& level = levels_.back();
@@ -164,6 +194,7 @@ private:
         if (descendAgain())
             return true;
         levels_.back().next = levels_.back().names.size();
+        levels_.back().hasMore = false;
         return false;
     }
 
@@ -195,6 +226,7 @@ private:
     ScopedFd current_{-1}; ///< the directory of the last level
     std::string path_;     ///< of what is being deleted, for messages
     std::vector<Level> levels_;
+    std::size_t held_ = 0; ///< bytes of names in all levels
 };
 
 /// Opens the directory at `place` or, through a link of ours, the one that `path` leads to.

@@ -52,7 +52,7 @@ std::size_t readUpTo(int fd, void* buffer, std::size_t size)
 
 ScopedFd openForReading(const char* path)
 {
-    return ScopedFd(::open(path, O_RDONLY | O_NOCTTY | O_CLOEXEC));
+    return ScopedFd(::open(path, O_RDONLY | O_NONBLOCK | O_NOCTTY | O_CLOEXEC));
 }
 
 /// Reads an archive's headers one after the other.
