@@ -97,6 +97,7 @@ TEST_F(PathIsMissingTest, WhatAFailingDiskDoesNotShowIsNotMissing)
 
         EXPECT_FALSE(pathIsMissing(dir / "file"));
     }));
+}
 
 using SafePathTest = InstallerTest;
 

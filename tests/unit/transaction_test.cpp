@@ -7,6 +7,7 @@
 
 #include <filesystem>
 
+#include <sys/stat.h>
 #include <unistd.h>
 
 namespace {
@@ -464,6 +465,68 @@ TEST_F(VariablesTest, TheSearchStartsAgainFromTheStartOfTheText)
     setVariable(transaction, "ab", "");
 
     EXPECT_EQ(Substituted("", 2), substituted("$a$abb"));
+}
+
+class ClaimTest : public InstallerTest {
+protected:
+    static FileIdentity identityAt(const std::string& path)
+    {
+        struct stat status = {};
+        EXPECT_EQ(0, statPath(path, status)) << path;
+        return identityOf(status);
+    }
+};
+
+TEST_F(ClaimTest, ARollbackDeletesAClaimedFileThatIsStillOurs)
+{
+    writeFile(dir / "zor.ini", "ours");
+    record(transaction, Created, dir / "zor.ini");
+    claim(transaction, dir / "zor.ini", identityAt(dir / "zor.ini"));
+
+    EXPECT_EQ(0, rollback(transaction));
+
+    EXPECT_FALSE(pathExists(dir / "zor.ini"));
+}
+
+TEST_F(ClaimTest, ARollbackLeavesTheFileThatAnotherRunPutThere)
+{
+    writeFile(dir / "zor.ini", "ours");
+    record(transaction, BackedUp, dir / "zor.ini");
+    record(transaction, Created, dir / "zor.ini");
+    claim(transaction, dir / "zor.ini", identityAt(dir / "zor.ini"));
+    writeFile(dir / "other", "theirs");
+    ASSERT_EQ(0, rename((dir / "other").c_str(), (dir / "zor.ini").c_str()));
+    writeFile(dir / "zor.ini.bak", "old");
+
+    EXPECT_EQ(0, rollback(transaction));
+
+    EXPECT_EQ("theirs", readFile(dir / "zor.ini"));
+}
+
+TEST_F(ClaimTest, AClaimedFileWhoseBackupIsGoneStays)
+{
+    writeFile(dir / "zor.ini", "ours");
+    record(transaction, BackedUp, dir / "zor.ini");
+    record(transaction, Created, dir / "zor.ini");
+    claim(transaction, dir / "zor.ini", identityAt(dir / "zor.ini"));
+
+    EXPECT_EQ(0, rollback(transaction));
+
+    EXPECT_EQ("ours", readFile(dir / "zor.ini")) << "another run has committed and deleted it";
+}
+
+TEST_F(ClaimTest, ARollbackReplacesAClaimedFileByItsBackup)
+{
+    writeFile(dir / "zor.ini", "ours");
+    writeFile(dir / "zor.ini.bak", "old");
+    record(transaction, BackedUp, dir / "zor.ini");
+    record(transaction, Created, dir / "zor.ini");
+    claim(transaction, dir / "zor.ini", identityAt(dir / "zor.ini"));
+
+    EXPECT_EQ(0, rollback(transaction));
+
+    EXPECT_EQ("old", readFile(dir / "zor.ini"));
+    EXPECT_FALSE(pathExists(dir / "zor.ini.bak"));
 }
 
 } // namespace

@@ -151,6 +151,8 @@ int updateCommonTracePath(FileTransaction& transaction, const std::string& home,
                << "' result=" << result << '\n';
 
     setLibraryPath(home);
+    if (isInterrupted())
+        return RunInterrupted; // what the command would change could not be undone
     const int status = runCommand(joinPath(home, trawlcfgExe), joinPath(home, spbBinDir),
                                   "-s common_trace_path " + quotedIfBlank(tracePath));
     *logstream << "Setting common trace path='" << tracePath << "' result=" << status << '\n';

@@ -43,6 +43,6 @@ int setupCommonLogDir(FileTransaction& transaction, const std::string& home, boo
 [[nodiscard]] std::string commonLogDir(const std::string& common);
 
 /// setupCommonLogDir(), then tells the toolkit where its trace files go. Returns the status of the
-/// scanner control program.
+/// scanner control program, or RunInterrupted (14).
 [[nodiscard]] int updateCommonTracePath(FileTransaction& transaction, const std::string& home,
                                         bool useCustomPath, const std::string& customPath);

@@ -11,6 +11,7 @@
 #include <vector>
 
 #include <fcntl.h>
+#include <sys/file.h>
 #include <sys/stat.h>
 #include <sys/xattr.h>
 #include <unistd.h>
@@ -20,6 +21,8 @@ const std::string TemporarySuffix = ".wzorinst-new";
 namespace {
 
 constexpr mode_t PrivateMode = 0600; // nobody else can open the file while it is being written
+constexpr int MaxTries = 1000;
+constexpr useconds_t PauseMicroseconds = 10000;
 constexpr const char* AccessList = "system.posix_acl_access";
 
 std::string temporaryName(const Place& place)
@@ -72,15 +75,50 @@ bool copyExtendedAttributes(int from, int to)
     return true;
 }
 
-/// Creates the temporary file of `place`, in place of one that a killed run left; returns 0 or an
-/// `errno`.
+/// True if `file` is what the temporary name of `place` leads to.
+bool isTemporary(const Place& place, const ScopedFd& file)
+{
+    struct stat open = {};
+    struct stat named = {};
+    return fstat(file.get(), &open) == 0 &&
+           fstatat(place.fd(), temporaryName(place).c_str(), &named, AT_SYMLINK_NOFOLLOW) == 0 &&
+           identityOf(open) == identityOf(named);
+}
+
+/// Waits until the run that is writing the temporary file of `place` has finished; deletes the file
+/// if that run was killed. Returns 0, or EAGAIN if it takes too long.
+int waitForOtherRun(const Place& place)
+{
+    const std::string name = temporaryName(place);
+    const ScopedFd other(openat(place.fd(), name.c_str(),
+                                O_RDONLY | O_NOFOLLOW | O_NONBLOCK | O_NOCTTY | O_CLOEXEC));
+    for (int tries = 0; other.isOpen() && flock(other.get(), LOCK_EX | LOCK_NB) != 0; ++tries) {
+        if (tries == MaxTries)
+            return EAGAIN;
+        (void)usleep(PauseMicroseconds);
+    }
+    if (!other.isOpen() || isTemporary(place, other))
+        (void)unlinkat(place.fd(), name.c_str(), 0); // if it remains, creating fails again
+    return 0;
+}
+
+/// Creates the temporary file of `place` and locks it, so that no other run takes it for that of a
+/// killed one. Returns 0 or an `errno`.
 int createTemporary(const Place& place, ScopedFd& file)
 {
     const std::string name = temporaryName(place);
-    (void)unlinkat(place.fd(), name.c_str(), 0); // if it remains, creating fails
-    file = ScopedFd(openat(place.fd(), name.c_str(),
-                           O_RDWR | O_CREAT | O_EXCL | O_NOFOLLOW | O_CLOEXEC, PrivateMode));
-    return file.isOpen() ? 0 : errno;
+    for (int tries = 0; tries < MaxTries; ++tries) {
+        file = ScopedFd(openat(place.fd(), name.c_str(),
+                               O_RDWR | O_CREAT | O_EXCL | O_NOFOLLOW | O_CLOEXEC, PrivateMode));
+        if (file.isOpen() && flock(file.get(), LOCK_EX | LOCK_NB) == 0 && isTemporary(place, file))
+            return 0;
+        if (!file.isOpen() && errno != EEXIST)
+            return errno;
+        const int error = file.isOpen() ? 0 : waitForOtherRun(place);
+        if (error != 0)
+            return error;
+    }
+    return EAGAIN;
 }
 
 void deleteTemporary(const Place& place)
@@ -113,6 +151,13 @@ int fill(int file, const ContentWriter& write)
     return std::fclose(stream.release()) == 0 && written ? 0 : error;
 }
 
+void noteIdentity(const ScopedFd& file, FileIdentity* identity)
+{
+    struct stat status = {};
+    if (identity != nullptr && fstat(file.get(), &status) == 0)
+        *identity = identityOf(status);
+}
+
 int truncated(int file)
 {
     struct stat status = {};
@@ -121,8 +166,9 @@ int truncated(int file)
     return 0;
 }
 
-int writeInPlace(ScopedFd& existing, const ContentWriter& write)
+int writeInPlace(ScopedFd& existing, const ContentWriter& write, FileIdentity* written)
 {
+    noteIdentity(existing, written);
     int error = truncated(existing.get());
     if (error == 0)
         error = fill(existing.get(), write);
@@ -135,13 +181,14 @@ constexpr int CannotPassOn = -1;
 /// Writes the temporary file and gives it its attributes, only then, since these may let others
 /// write to it; puts it in place. Returns 0, CannotPassOn (-1) or an `errno`.
 int finish(const Place& place, ScopedFd& temporary, const ContentWriter& write,
-           const std::function<bool(int)>& setAttributes)
+           const std::function<bool(int)>& setAttributes, FileIdentity* written)
 {
     int error = fill(temporary.get(), write);
     if (error == 0 && !setAttributes(temporary.get()))
         error = CannotPassOn;
     if (error == 0)
         error = syncFile(temporary.get());
+    const ScopedFd lock(fcntl(temporary.get(), F_DUPFD_CLOEXEC, 0)); // held until the renaming
     if (error == 0 && close(temporary.release()) != 0)
         error = errno;
     if (error == 0 &&
@@ -149,32 +196,40 @@ int finish(const Place& place, ScopedFd& temporary, const ContentWriter& write,
         error = errno;
     if (error != 0)
         deleteTemporary(place);
+    else
+        noteIdentity(lock, written);
     return error;
 }
 
-int createNew(const Place& place, mode_t mode, const ContentWriter& write)
+int createNew(const Place& place, mode_t mode, const ContentWriter& write, FileIdentity* written)
 {
     ScopedFd temporary(-1);
     if (createTemporary(place, temporary) != 0)
         return CannotOpenForWriting;
-    const int error = finish(place, temporary, write, [&](int file) {
-        (void)fchmod(file, underUmask(mode)); // the content is what counts
-        return true;
-    });
+    const int error = finish(
+        place, temporary, write,
+        [&](int file) {
+            (void)fchmod(file, underUmask(mode)); // the content is what counts
+            return true;
+        },
+        written);
     return error == 0 ? FileOk : writeErrorCode(error);
 }
 
-int replaceExisting(const Place& place, ScopedFd& existing, const ContentWriter& write)
+int replaceExisting(const Place& place, ScopedFd& existing, const ContentWriter& write,
+                    FileIdentity* written)
 {
     ScopedFd temporary(-1);
     int error = createTemporary(place, temporary);
     if (error != 0)
-        return needsWritingInPlace(error) ? writeInPlace(existing, write) : writeErrorCode(error);
+        return needsWritingInPlace(error) ? writeInPlace(existing, write, written)
+                                          : writeErrorCode(error);
 
-    error = finish(place, temporary, write,
-                   [&](int file) { return copyAttributes(existing.get(), file); });
+    error = finish(
+        place, temporary, write, [&](int file) { return copyAttributes(existing.get(), file); },
+        written);
     if (error == CannotPassOn || error == EBUSY) // EBUSY: something is mounted on it
-        return writeInPlace(existing, write);
+        return writeInPlace(existing, write, written);
     return error == 0 ? FileOk : writeErrorCode(error);
 }
 
@@ -193,7 +248,8 @@ bool copyAttributes(int from, int to)
     return fchmod(to, wanted.st_mode & ALLPERMS) == 0 && copyExtendedAttributes(from, to);
 }
 
-int replaceFile(const std::string& path, mode_t mode, const ContentWriter& write)
+int replaceFile(const std::string& path, mode_t mode, const ContentWriter& write,
+                FileIdentity* written)
 {
     Place place;
     const int found = findPlace(path, LastLink::Follow, place);
@@ -204,12 +260,12 @@ int replaceFile(const std::string& path, mode_t mode, const ContentWriter& write
 
     ScopedFd existing = openPlace(place, O_WRONLY);
     if (!existing.isOpen())
-        return errno == ENOENT ? createNew(place, mode, write) : CannotOpenForWriting;
+        return errno == ENOENT ? createNew(place, mode, write, written) : CannotOpenForWriting;
 
     struct stat status = {};
     if (fstat(existing.get(), &status) == 0 && S_ISREG(status.st_mode))
-        return replaceExisting(place, existing, write);
-    return writeInPlace(existing, write);
+        return replaceExisting(place, existing, write, written);
+    return writeInPlace(existing, write, written);
 }
 
 void deleteTemporaryFile(const std::string& path)

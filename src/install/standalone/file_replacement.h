@@ -9,6 +9,8 @@
 // cannot create files.
 #pragma once
 
+#include "safe_path.h"
+
 #include <cstdio>
 #include <functional>
 #include <string>
@@ -23,11 +25,13 @@ extern const std::string TemporarySuffix;
 using ContentWriter = std::function<void(std::FILE*)>;
 
 /// Replaces the content of `path` by what `write` writes. A new file gets `mode` under the umask.
+/// `written` (null: not wanted) becomes the identity of the file that holds the new content.
 ///
 /// Returns 0; CannotOpenForWriting (2), with the `errno` of the failed open, if the path cannot be
 /// opened for writing: nothing was changed and `write` was not called; or the code of a failed
 /// write (5, 6, 7): the old content is still there, unless the file had to be written in place.
-[[nodiscard]] int replaceFile(const std::string& path, mode_t mode, const ContentWriter& write);
+[[nodiscard]] int replaceFile(const std::string& path, mode_t mode, const ContentWriter& write,
+                              FileIdentity* written = nullptr);
 
 /// Deletes the temporary file that a killed run may have left for `path`.
 void deleteTemporaryFile(const std::string& path);

@@ -106,14 +106,17 @@ int writeRegistry(FileTransaction& transaction, const std::string& path,
     }
 
     const std::string text = registryText(registry);
-    const int code = replaceFile(path, RegistryFileMode, [&](std::FILE* file) {
-        (void)std::fwrite(text.data(), 1, text.size(), file);
-    });
-    if (code == CannotOpenForWriting)
-        return code;
-    if (!keepsBackup)
+    struct stat status = {};
+    FileIdentity written; // until the registry is replaced, that of the old one
+    if (statPath(path, status) == 0)
+        written = identityOf(status);
+    const int code = replaceFile(
+        path, RegistryFileMode,
+        [&](std::FILE* file) { (void)std::fwrite(text.data(), 1, text.size(), file); }, &written);
+    if (!keepsBackup && code != CannotOpenForWriting)
         record(transaction, Created, path);
-    return code == FileOk ? FileOk : CannotWrite;
+    claim(transaction, path, written);
+    return code == FileOk || code == CannotOpenForWriting ? code : CannotWrite;
 }
 
 int saveRegistry(FileTransaction& transaction, const InstallRegistry& registry)

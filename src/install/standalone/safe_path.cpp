@@ -334,6 +334,11 @@ ScopedDirectoryReuse::~ScopedDirectoryReuse()
         reuse().directory.reset();
 }
 
+FileIdentity identityOf(const struct stat& status)
+{
+    return {status.st_dev, status.st_ino};
+}
+
 bool isTrustedOwner(uid_t owner)
 {
     if (owner == 0)

@@ -47,6 +47,17 @@ enum class LastLink { Follow, Keep };
 /// Returns 0, StrangersLink (-1), or the `errno` of the component that could not be passed.
 [[nodiscard]] int findPlace(const std::string& path, LastLink lastLink, Place& place);
 
+/// Which file a path led to at some moment.
+struct FileIdentity {
+    dev_t device = 0;
+    ino_t inode = 0;
+
+    bool operator==(const FileIdentity&) const = default;
+};
+
+/// The identity of what `status` describes.
+[[nodiscard]] FileIdentity identityOf(const struct stat& status);
+
 /// While one of these lives, the directory of the last path stays open, so that many paths in one
 /// directory resolve it once. Only for stretches that neither run commands nor need a directory
 /// that they removed.

@@ -6,7 +6,6 @@
 #include "scoped.h"
 #include "text.h"
 
-#include <algorithm>
 #include <cstdio>
 
 namespace {
@@ -40,22 +39,34 @@ int kindOf(char letter)
     }
 }
 
-/// Renames the backup of `path` back. What cannot be renamed stays where it is.
-void restoreBackup(const std::string& path)
+/// True unless `entry` is claimed and another run has put a file of its own at its path.
+bool isOurs(const JournalEntry& entry)
+{
+    struct stat status = {};
+    return !entry.ours || statPath(entry.path, status) != 0 || identityOf(status) == *entry.ours;
+}
+
+/// Renames the backup back. What cannot be renamed stays where it is.
+void restoreBackup(const JournalEntry& entry)
 {
     Place place;
-    if (findPlace(path, LastLink::Keep, place) == 0)
+    if (isOurs(entry) && findPlace(entry.path, LastLink::Keep, place) == 0)
         (void)renameat(place.fd(), backupName(place.name).c_str(), place.fd(), place.name.c_str());
 }
 
-void undo(const JournalEntry& entry)
+/// Undoes `entry`; `previous` is the entry before it, null for the first.
+void undo(const JournalEntry& entry, const JournalEntry* previous)
 {
+    // A claimed file is replaced by its backup in one step, so that there is one at any time.
+    const bool isReplaced = entry.ours && previous != nullptr && previous->kind == BackedUp &&
+                            previous->path == entry.path;
     switch (entry.kind) {
     case BackedUp:
-        restoreBackup(entry.path);
+        restoreBackup(entry);
         break;
     case Created:
-        (void)unlinkPath(entry.path);
+        if (!isReplaced && isOurs(entry))
+            (void)unlinkPath(entry.path);
         break;
     case DirectoryCreated:
         (void)removeDirectoryPath(entry.path); // stays while it holds what no entry recorded
@@ -70,6 +81,14 @@ void undo(const JournalEntry& entry)
 void record(FileTransaction& transaction, int kind, const std::string& path)
 {
     transaction.journal.push_back({kind, path});
+}
+
+void claim(FileTransaction& transaction, const std::string& path, const FileIdentity& ours)
+{
+    for (JournalEntry& entry : transaction.journal) {
+        if (entry.path == path)
+            entry.ours = ours;
+    }
 }
 
 int commit(FileTransaction& transaction)
@@ -88,7 +107,8 @@ int rollback(FileTransaction& transaction)
 {
     const ScopedDirectoryReuse reuse;
     const auto& journal = transaction.journal;
-    std::for_each(journal.rbegin(), journal.rend(), undo);
+    for (std::size_t i = journal.size(); i-- != 0;)
+        undo(journal[i], i == 0 ? nullptr : &journal[i - 1]);
     transaction.journal.clear();
     return FileOk;
 }

@@ -6,6 +6,9 @@
 // in memory: when the process dies, the backups stay beside the files.
 #pragma once
 
+#include "safe_path.h"
+
+#include <optional>
 #include <string>
 #include <string_view>
 #include <utility>
@@ -21,6 +24,7 @@ enum JournalKind : int {
 struct JournalEntry {
     int kind = 0; ///< a JournalKind; others are skipped by commit and rollback
     std::string path;
+    std::optional<FileIdentity> ours = std::nullopt; ///< see claim()
 };
 
 /// The state of one run; owned by the driver, passed by reference to every file operation.
@@ -38,6 +42,10 @@ inline constexpr std::string_view VariablePrefix = "$";
 
 /// Appends an entry to the journal.
 void record(FileTransaction& transaction, int kind, const std::string& path);
+
+/// Notes which file this run put at `path`, for its entries in the journal. Another run may replace
+/// such a file meanwhile; a rollback then leaves its file alone.
+void claim(FileTransaction& transaction, const std::string& path, const FileIdentity& ours);
 
 /// Deletes every backup and empties the journal. Failures are ignored; returns 0.
 int commit(FileTransaction& transaction);
