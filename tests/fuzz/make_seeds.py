@@ -109,8 +109,16 @@ def extraction():
 
 def spb():
     paths = Archive()
-    for name in ("/bin/../../x", "/bin/..", "/bin/a/../../../x", "/bin/a\0b", "bin/relative",
-                 "/config/.", "/install/x\ny", "/bin/long" + "g" * 300):
+    for name in (
+        "/bin/../../x",
+        "/bin/..",
+        "/bin/a/../../../x",
+        "/bin/a\0b",
+        "bin/relative",
+        "/config/.",
+        "/install/x\ny",
+        "/bin/long" + "g" * 300,
+    ):
         paths.add(name, TEXT)
     return {"paths": paths.content(), **extraction()}
 

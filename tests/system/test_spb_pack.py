@@ -435,8 +435,12 @@ def test_files_of_many_chunks_are_joined_the_same_way_on_one_processor(tree, tmp
 
 
 def test_packing_ends_with_the_check_and_refuses_what_cannot_be_installed(tree, spb):
-    run = subprocess.run([spb_tool.TOOL, "pack", tree, "-o", spb, "--accept=missing-placeholder"],
-                         capture_output=True, text=True, check=False)
+    run = subprocess.run(
+        [spb_tool.TOOL, "pack", tree, "-o", spb, "--accept=missing-placeholder"],
+        capture_output=True,
+        text=True,
+        check=False,
+    )
 
     assert (run.returncode, run.stdout) == (1, "")
     assert run.stderr == (
@@ -452,8 +456,9 @@ def test_packing_ends_with_the_check_and_refuses_what_cannot_be_installed(tree, 
 def test_a_dash_packs_to_standard_output(tree, spb):
     assert pack(tree, spb).returncode == 0
 
-    run = subprocess.run([spb_tool.TOOL, "pack", tree, "-o", "-", *ACCEPTED], capture_output=True,
-                         check=False)
+    run = subprocess.run(
+        [spb_tool.TOOL, "pack", tree, "-o", "-", *ACCEPTED], capture_output=True, check=False
+    )
 
     assert (run.returncode, run.stdout, run.stderr) == (0, spb.read_bytes(), b"")
 

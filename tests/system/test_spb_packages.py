@@ -41,18 +41,32 @@ def test_info_shows_digests_and_what_an_upgrade_changes(spb):
     assert info["files"][0] == {"place": "bin/abc", "size": 3, "sha256": OF_ABC, "sound": True}
     assert info["upgrade_blanks"] == ["lsof.bin", "trawlnet.cputhreshold"]
     assert "hwscanner.changepriority=normal" in info["upgrade_adds"]
-    assert subprocess.run(["sha256sum", spb], capture_output=True, check=True
-                          ).stdout.decode().split()[0] == info["sha256"]
+    assert (
+        subprocess.run(["sha256sum", spb], capture_output=True, check=True)
+        .stdout.decode()
+        .split()[0]
+        == info["sha256"]
+    )
     lines = spb_tool.run("info", spb).stdout.splitlines()
     assert f"{OF_ABC}           3  bin/abc" in lines
     assert "upgrade blanks: lsof.bin" in lines
 
 
 def test_diff_reports_files_modes_and_keys(tmp_path):
-    one = planted(tmp_path / "one", ("bin/", b""), ("bin/gone", b"1"), ("bin/same", b"2"),
-                  ("config/a.properties", b"x=1\ny=2\n#z=3\n"))
-    two = planted(tmp_path / "two", ("bin/", b""), ("bin/new", b"1"), ("bin/same", b"2"),
-                  ("config/a.properties", b"x=5\nw=2\n"))
+    one = planted(
+        tmp_path / "one",
+        ("bin/", b""),
+        ("bin/gone", b"1"),
+        ("bin/same", b"2"),
+        ("config/a.properties", b"x=1\ny=2\n#z=3\n"),
+    )
+    two = planted(
+        tmp_path / "two",
+        ("bin/", b""),
+        ("bin/new", b"1"),
+        ("bin/same", b"2"),
+        ("config/a.properties", b"x=5\nw=2\n"),
+    )
 
     done = spb_tool.run("diff", one, two)
 
@@ -66,7 +80,11 @@ def test_diff_reports_files_modes_and_keys(tmp_path):
         "key-removed: config/a.properties: y=2\n"
     )
     assert json.loads(spb_tool.run("diff", "--json", one, two).stdout)["differences"][0] == {
-        "what": "removed", "place": "bin/gone", "from": "1", "to": ""}
+        "what": "removed",
+        "place": "bin/gone",
+        "from": "1",
+        "to": "",
+    }
     same = spb_tool.run("diff", one, one)
     assert (same.returncode, same.stdout, same.stderr) == (0, "", "")
     assert spb_tool.run("diff", one, tmp_path / "three").returncode == 2
@@ -76,18 +94,32 @@ def tree_of(directory):
     """Every path below `directory`, with its permissions and, for files, the content."""
     return {
         str(path.relative_to(directory)): (
-            path.stat().st_mode & 0o7777, path.read_bytes() if path.is_file() else None)
+            path.stat().st_mode & 0o7777,
+            path.read_bytes() if path.is_file() else None,
+        )
         for path in directory.rglob("*")
     }
 
 
 def test_extract_unpacks_what_the_installer_would_install(tmp_path, spb):
-    planted(spb, ("bin/", b""), ("bin//a", b"1"), ("bin/a", b"2"), ("install/x.sh", b"3"),
-            ("config/Zor.properties", b"4"), ("doc/no", b"5"))
+    planted(
+        spb,
+        ("bin/", b""),
+        ("bin//a", b"1"),
+        ("bin/a", b"2"),
+        ("install/x.sh", b"3"),
+        ("config/Zor.properties", b"4"),
+        ("doc/no", b"5"),
+    )
     target = tmp_path / "target"
 
-    done = subprocess.run([spb_tool.TOOL, "extract", spb, "-d", target], capture_output=True,
-                          text=True, check=False, umask=0o022)
+    done = subprocess.run(
+        [spb_tool.TOOL, "extract", spb, "-d", target],
+        capture_output=True,
+        text=True,
+        check=False,
+        umask=0o022,
+    )
 
     assert (done.returncode, done.stdout, done.stderr) == (0, "", "")
     assert tree_of(target) == {
@@ -143,12 +175,16 @@ def test_extract_follows_no_link_and_replaces_no_file(tmp_path, spb):
     assert (target / "config" / "b").read_bytes() == b"4"
 
 
-@pytest.mark.parametrize("method, fields, reason", [
-    (STORED, {"crc": 1}, "is damaged"),
-    (DEFLATED, {"size": 3}, "is damaged"),
-    (STORED, {"flags": 1}, "is encrypted"),
-    (12, {}, "cannot be opened"),
-], ids=["crc", "size", "encrypted", "method"])
+@pytest.mark.parametrize(
+    "method, fields, reason",
+    [
+        (STORED, {"crc": 1}, "is damaged"),
+        (DEFLATED, {"size": 3}, "is damaged"),
+        (STORED, {"flags": 1}, "is encrypted"),
+        (12, {}, "cannot be opened"),
+    ],
+    ids=["crc", "size", "encrypted", "method"],
+)
 def test_extract_leaves_nothing_of_a_damaged_entry(tmp_path, spb, method, fields, reason):
     spb.write_bytes(Archive().add(IMAGE_ROOT + "bin/a", b"data", method, **fields).content())
     target = tmp_path / "target"
@@ -165,9 +201,14 @@ def test_the_bill_of_materials_names_every_file_with_its_hash(spb):
     bill = json.loads(spb_tool.run("sbom", spb).stdout)
 
     assert (bill["bomFormat"], bill["specVersion"]) == ("CycloneDX", "1.5")
-    assert bill["components"] == [{
-        "type": "file", "bom-ref": "bin/abc", "name": "bin/abc",
-        "hashes": [{"alg": "SHA-256", "content": OF_ABC}]}]
+    assert bill["components"] == [
+        {
+            "type": "file",
+            "bom-ref": "bin/abc",
+            "name": "bin/abc",
+            "hashes": [{"alg": "SHA-256", "content": OF_ABC}],
+        }
+    ]
 
 
 def test_the_bill_of_materials_is_valid(spb):
@@ -178,9 +219,16 @@ def test_the_bill_of_materials_is_valid(spb):
     schemas = {path.name: json.loads(path.read_text()) for path in SCHEMAS.glob("*.json")}
     store = {schema["$id"]: schema for schema in schemas.values() if "$id" in schema}
     schema = schemas["bom-1.5.SNAPSHOT.schema.json"]
-    resolver = jsonschema.RefResolver.from_schema(schema, store={**store, **{
-        schema["$id"].rsplit("/", 1)[0] + "/" + name: content
-        for name, content in schemas.items()}})
+    resolver = jsonschema.RefResolver.from_schema(
+        schema,
+        store={
+            **store,
+            **{
+                schema["$id"].rsplit("/", 1)[0] + "/" + name: content
+                for name, content in schemas.items()
+            },
+        },
+    )
 
     bill = json.loads(spb_tool.run("sbom", spb).stdout)
 
@@ -194,8 +242,9 @@ def test_the_bill_of_materials_is_valid(spb):
 def fixture_signers(tmp_path):
     """The list of those who may sign; the key of the one is tmp_path/key."""
     for name in "key", "other":
-        subprocess.run(["ssh-keygen", "-q", "-t", "ed25519", "-N", "", "-f", tmp_path / name],
-                       check=True)
+        subprocess.run(
+            ["ssh-keygen", "-q", "-t", "ed25519", "-N", "", "-f", tmp_path / name], check=True
+        )
     signers = tmp_path / "signers"
     signers.write_text("maker@example.org " + (tmp_path / "key.pub").read_text())
     return signers
@@ -210,17 +259,36 @@ def test_a_signature_of_an_allowed_signer_is_good(tmp_path, spb, signers):
     assert (done.returncode, done.stderr) == (0, "")
     assert done.stdout == f"{spb}: signed by maker@example.org\n"
     assert json.loads(spb_tool.run("verify", "--json", spb, "-s", signers).stdout) == {
-        "file": str(spb), "signature": f"{spb}.sig", "good": True,
-        "principal": "maker@example.org"}
+        "file": str(spb),
+        "signature": f"{spb}.sig",
+        "good": True,
+        "principal": "maker@example.org",
+    }
     # As everybody can verify it without this tool, in the namespace "spb".
     with spb.open("rb") as file:
-        subprocess.run(["ssh-keygen", "-Y", "verify", "-f", signers, "-I", "maker@example.org",
-                        "-n", "spb", "-s", f"{spb}.sig"], stdin=file, check=True,
-                       stdout=subprocess.DEVNULL)
+        subprocess.run(
+            [
+                "ssh-keygen",
+                "-Y",
+                "verify",
+                "-f",
+                signers,
+                "-I",
+                "maker@example.org",
+                "-n",
+                "spb",
+                "-s",
+                f"{spb}.sig",
+            ],
+            stdin=file,
+            check=True,
+            stdout=subprocess.DEVNULL,
+        )
 
 
-@pytest.mark.parametrize("key, changed", [("key", True), ("other", False)],
-                         ids=["changed package", "other signer"])
+@pytest.mark.parametrize(
+    "key, changed", [("key", True), ("other", False)], ids=["changed package", "other signer"]
+)
 def test_another_signature_is_bad(tmp_path, spb, signers, key, changed):
     planted(spb, ("bin/a", b"1"))
     assert spb_tool.run("sign", spb, "-k", tmp_path / key).returncode == 0

@@ -94,6 +94,7 @@ NOT_OF_FILES = {
     "execve",
     "fcntl",
     "fcntl64",
+    "flock",
     "mmap",
     "mmap2",
     "pipe",

@@ -63,4 +63,6 @@ def shown_on_a_terminal(*arguments):
 def codes():
     """Every code that `spb check` can report, with its kind."""
     source = (REPOSITORY / "src/tools/spb/findings.cpp").read_text()
-    return {code: kind.lower() for code, kind in re.findall(r'{"([a-z0-9-]+)", Kind::(\w+)}', source)}
+    return {
+        code: kind.lower() for code, kind in re.findall(r'{"([a-z0-9-]+)", Kind::(\w+)}', source)
+    }
