@@ -1,7 +1,7 @@
 // The whole input is an index of installed files: it is read and written again, and a removal
 // deletes what it lists.
+#include "file_index.h"
 #include "fuzz_support.h"
-#include "install_log.h"
 #include "removal.h"
 
 #include <cstring>

@@ -18,6 +18,75 @@ using Lines = std::vector<std::string>;
 const std::string Home = "/opt/corvan/zor";
 const std::string Index = "/opt/corvan/zor/ZOR_files";
 
+using SubdirTest = InstallerTest;
+
+TEST_F(SubdirTest, IsCreatedWithWhatIsMissingAboveIt)
+{
+    EXPECT_EQ(0, makeSubdir(transaction, dir / "zor/bin", "etc", 0750));
+
+    const std::vector<std::string> expected = {"d 0750 zor", "d 0750 zor/bin",
+                                               "d 0750 zor/bin/etc"};
+    EXPECT_EQ(expected, treeOf(dir.path()));
+    EXPECT_EQ("4 " + dir / "zor" + "\n4 " + dir / "zor/bin" + "\n4 " + dir / "zor/bin/etc" + "\n",
+              journalText(transaction));
+    EXPECT_EQ("", log.text());
+}
+
+TEST_F(SubdirTest, ThatExistsIsLeftAsItIs)
+{
+    makeDirectories(dir / "etc");
+
+    EXPECT_EQ(0, makeSubdir(transaction, dir.path(), "etc", 0700));
+
+    EXPECT_EQ(0755U, modeOf(dir / "etc"));
+    EXPECT_TRUE(transaction.journal.empty());
+}
+
+TEST_F(SubdirTest, ThatCannotBeCreatedIsCode11AndIsLogged)
+{
+    writeFile(dir / "file", "");
+
+    EXPECT_EQ(11, makeSubdir(transaction, dir / "file", "etc", 0755));
+
+    EXPECT_EQ("Error creating dir etc in " + dir / "file" +
+                  " result=11 (Cannot create directory)\n",
+              log.text());
+}
+
+using InstallDirTest = InstallerTest;
+
+TEST_F(InstallDirTest, IsCreatedWithMode0750UnderTheInstallersUmask)
+{
+    (void)umask(077);
+
+    EXPECT_EQ(0, createInstallDir(transaction, dir.path()));
+
+    EXPECT_EQ(0750U, modeOf(dir / "install"));
+    EXPECT_EQ("4 " + dir / "install" + "\n", journalText(transaction));
+}
+
+TEST_F(InstallDirTest, FollowsTheInstallersUmaskAndRestoresThePreviousOne)
+{
+    globalFilesUmask = 0027;
+    (void)umask(003);
+
+    EXPECT_EQ(0, createInstallDir(transaction, dir.path()));
+
+    EXPECT_EQ(0750U, modeOf(dir / "install"));
+    EXPECT_EQ(003U, umask(022));
+}
+
+TEST_F(InstallDirTest, ThatCannotBeCreatedIsMinus1)
+{
+    writeFile(dir / "file", "");
+
+    EXPECT_EQ(-1, createInstallDir(transaction, dir / "file"));
+
+    EXPECT_EQ("Error creating dir install in " + dir / "file" +
+                  " result=11 (Cannot create directory)\n",
+              log.text());
+}
+
 /// Installs a small toolkit for the exploiter ABC to /opt/corvan/zor.
 class FreshInstallTest : public MachineTest {
 protected:

@@ -1,5 +1,6 @@
 #include "discovery.h"
 
+#include "file_index.h"
 #include "locations.h"
 #include "paths.h"
 #include "safe_path.h"
@@ -122,7 +123,7 @@ Discovery discoverInstallation(const CommandLine& commandLine, bool readOnly)
     found.upgradeNeeded =
         found.registryFound && isUpgradeNeeded(found.registry, commandLine.installer);
 
-    found.indexPath = home + "/" + ZOR_FILE_INDEX;
+    found.indexPath = fileIndexPath(home);
     *logstream << "Log file is: " << found.indexPath << '\n';
     found.currentZorHome = home;
     found.currentCfgHome = home;

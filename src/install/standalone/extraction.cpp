@@ -1,8 +1,8 @@
 #include "extraction.h"
 
 #include "entry_extraction.h"
+#include "file_index.h"
 #include "file_operations.h"
-#include "install_log.h"
 #include "interruption.h"
 #include "paths.h"
 #include "registry.h"

@@ -1,19 +1,21 @@
 #include "fresh_install.h"
 
 #include "common_directory.h"
-#include "environment.h"
 #include "extraction.h"
+#include "file_index.h"
 #include "file_operations.h"
 #include "file_replacement.h"
-#include "install_log.h"
 #include "interruption.h"
 #include "locations.h"
 #include "paths.h"
 #include "property_file.h"
 #include "registry.h"
 #include "scoped.h"
+#include "selinux.h"
 #include "settings.h"
+#include "single_user_mode.h"
 #include "template_variables.h"
+#include "trace_directory.h"
 
 #include <cstdio>
 #include <ostream>
@@ -21,11 +23,12 @@
 namespace {
 
 constexpr mode_t UserCacheDirMode = 0770;
+constexpr mode_t InstallDirMode = 0750;
 constexpr mode_t RegistryDirMode = 0755;
 constexpr mode_t NewFileMode = 0666;
 
-int makeSubdirOrSay(FileTransaction& transaction, const std::string& parent,
-                    const std::string& name, mode_t mode)
+int makeSubdirOrReport(FileTransaction& transaction, const std::string& parent,
+                       const std::string& name, mode_t mode)
 {
     const ScopedUmask mask(globalFilesUmask);
     const int code = makeSubdir(transaction, parent, name, mode);
@@ -38,9 +41,9 @@ int makeSubdirOrSay(FileTransaction& transaction, const std::string& parent,
 int createDirectories(FileTransaction& transaction, const std::string& home)
 {
     const mode_t cacheMode = isRoot() ? CacheDirRootMode : UserCacheDirMode;
-    int code = makeSubdirOrSay(transaction, home, cacheDir, cacheMode);
+    int code = makeSubdirOrReport(transaction, home, cacheDir, cacheMode);
     if (code == FileOk)
-        code = makeSubdirOrSay(transaction, joinPath(home, spbBinDir), etcDir, EtcDirMode);
+        code = makeSubdirOrReport(transaction, joinPath(home, spbBinDir), etcDir, EtcDirMode);
     if (code != FileOk)
         return code;
 
@@ -122,6 +125,22 @@ int installFiles(FileTransaction& transaction, InstallRegistry& registry,
 }
 
 } // namespace
+
+int makeSubdir(FileTransaction& transaction, const std::string& parent, const std::string& name,
+               mode_t mode)
+{
+    const int code = createPath(transaction, joinPath(parent, name + "/"), mode);
+    if (code != FileOk)
+        *logstream << "Error creating dir " << name << " in " << parent << " result=" << code
+                   << " (" << fileErrorText(static_cast<unsigned>(code)) << ")\n";
+    return code;
+}
+
+int createInstallDir(FileTransaction& transaction, const std::string& home)
+{
+    const ScopedUmask mask(globalFilesUmask);
+    return makeSubdir(transaction, home, auxDirInstall, InstallDirMode) == FileOk ? 0 : -1;
+}
 
 void fillMainProperties(PropertyFile& file, const std::string& home)
 {

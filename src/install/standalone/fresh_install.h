@@ -3,9 +3,20 @@
 
 #include <string>
 
+#include <sys/types.h>
+
 struct FileTransaction;
 struct InstallRegistry;
 struct PropertyFile;
+
+/// Creates and journals the directory `name` in `parent`, and what is missing above it. Returns 0
+/// or the code of createPath(), which is logged.
+[[nodiscard]] int makeSubdir(FileTransaction& transaction, const std::string& parent,
+                             const std::string& name, mode_t mode);
+
+/// Creates and journals the directory "install" in `home`, with mode 0750 under `globalFilesUmask`.
+/// Returns 0 or -1.
+[[nodiscard]] int createInstallDir(FileTransaction& transaction, const std::string& home);
 
 /// Fills the placeholders of a new "Zor.properties" in.
 void fillMainProperties(PropertyFile& file, const std::string& home);

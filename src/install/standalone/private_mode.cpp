@@ -1,5 +1,6 @@
 #include "private_mode.h"
 
+#include "file_index.h"
 #include "fresh_install.h"
 #include "registry.h"
 #include "scanner_control.h"
@@ -28,7 +29,7 @@ int installPrivately(const std::string& privatePath)
     InstallRegistry registry;
     registry.homeDirectory = privatePath;
     registry.configRootDirectory = privatePath;
-    const std::string indexPath = privatePath + "/" + ZOR_FILE_INDEX;
+    const std::string indexPath = fileIndexPath(privatePath);
 
     *logstream << "Performing private installation to " << privatePath << '\n';
     const int status = freshInstall(transaction, registry, &indexPath, false,

@@ -1,11 +1,11 @@
 #include "removal.h"
 
+#include "commands.h"
 #include "common_directory.h"
-#include "environment.h"
 #include "exploiters.h"
+#include "file_index.h"
 #include "file_operations.h"
 #include "file_replacement.h"
-#include "install_log.h"
 #include "locations.h"
 #include "paths.h"
 #include "registry.h"

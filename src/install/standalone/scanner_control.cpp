@@ -1,6 +1,6 @@
 #include "scanner_control.h"
 
-#include "environment.h"
+#include "commands.h"
 #include "interruption.h"
 #include "paths.h"
 #include "settings.h"

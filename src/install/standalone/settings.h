@@ -68,6 +68,7 @@ inline const std::string zorProps = "Zor.properties";
 inline const std::string traceProps = "ZorTrace.properties";
 inline const std::string installProps = "zor_install.properties";
 inline const std::string UninstallFileName = "_uninst";
+inline const std::string singleUserFlag = "config/SingleUserMode";
 inline const std::string ZOR_FILE_INDEX = "ZOR_files";
 
 /// Completes the layout names that depend on one another. To be called once, before any of them is

@@ -91,6 +91,11 @@ void claim(FileTransaction& transaction, const std::string& path, const FileIden
     }
 }
 
+std::size_t changeCount(const FileTransaction& transaction)
+{
+    return transaction.journal.size();
+}
+
 int commit(FileTransaction& transaction)
 {
     const ScopedDirectoryReuse reuse;

@@ -8,6 +8,7 @@
 
 #include "safe_path.h"
 
+#include <cstddef>
 #include <optional>
 #include <string>
 #include <string_view>
@@ -46,6 +47,9 @@ void record(FileTransaction& transaction, int kind, const std::string& path);
 /// Notes which file this run put at `path`, for its entries in the journal. Another run may replace
 /// such a file meanwhile; a rollback then leaves its file alone.
 void claim(FileTransaction& transaction, const std::string& path, const FileIdentity& ours);
+
+/// The number of changes in the journal.
+[[nodiscard]] std::size_t changeCount(const FileTransaction& transaction);
 
 /// Deletes every backup and empties the journal. Failures are ignored; returns 0.
 int commit(FileTransaction& transaction);

@@ -3,9 +3,9 @@
 #include "build_stamp.h"
 #include "discovery.h"
 #include "exit_status.h"
+#include "file_index.h"
 #include "fresh_install.h"
 #include "guarded_file.h"
-#include "install_log.h"
 #include "installation_lock.h"
 #include "json_report.h"
 #include "locations.h"
@@ -140,7 +140,7 @@ private:
 
     void readIndexOf(const std::string& home)
     {
-        index_ = joinPath(home, ZOR_FILE_INDEX);
+        index_ = fileIndexPath(home);
         const GuardedText text = readGuarded(index_, IndexLimit);
         if (text.state != ReadState::Read)
             return;

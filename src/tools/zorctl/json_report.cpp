@@ -1,9 +1,8 @@
 #include "json_report.h"
 
 #include "build_stamp.h"
+#include "file_index.h"
 #include "locations.h"
-#include "paths.h"
-#include "settings.h"
 #include "survey.h"
 #include "text_output.h"
 #include "version.h"
@@ -52,7 +51,7 @@ void addHome(Json& object, const Installation& found, const Json& none)
         return;
     }
     object["home_state"] = found.homeState;
-    object["index"] = {{"path", jsonText(joinPath(found.registry.homeDirectory, ZOR_FILE_INDEX))},
+    object["index"] = {{"path", jsonText(fileIndexPath(found.registry.homeDirectory))},
                        {"state", found.indexState},
                        {"files", found.indexedFiles ? Json(*found.indexedFiles) : Json(Unknown)}};
     object["recorded_type"] = found.recordedType;

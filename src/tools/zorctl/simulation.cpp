@@ -2,10 +2,9 @@
 
 #include "common_directory.h"
 #include "discovery.h"
-#include "environment.h"
 #include "exploiters.h"
+#include "file_index.h"
 #include "guarded_file.h"
-#include "install_log.h"
 #include "locations.h"
 #include "package_files.h"
 #include "paths.h"
@@ -13,7 +12,9 @@
 #include "removal.h"
 #include "safe_path.h"
 #include "settings.h"
+#include "single_user_mode.h"
 #include "template_variables.h"
+#include "trace_directory.h"
 #include "upgrade.h"
 #include "zip_file.h"
 
@@ -202,7 +203,7 @@ private:
             fail("the package " + spbPackage + " is not found or not valid");
             return;
         }
-        const std::string index = joinPath(home, ZOR_FILE_INDEX);
+        const std::string index = fileIndexPath(home);
         noteLoss(index);
         bool indexOpened = tree_.makePath(index) && tree_.canCreateIn(home);
         if (indexOpened)
@@ -331,7 +332,7 @@ private:
             return;
         writeOwnFile(singleUserFlagPath(home));
         if (tree_.exists(singleUserFlagPath(home)))
-            writeOwnFile(joinPath(home, ZOR_FILE_INDEX)); // where it is listed
+            writeOwnFile(fileIndexPath(home)); // where it is listed
     }
 
     /// The common directory; a missing setting is written unless traces go elsewhere.

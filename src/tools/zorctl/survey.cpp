@@ -1,12 +1,13 @@
 #include "survey.h"
 
+#include "file_index.h"
 #include "guarded_file.h"
-#include "install_log.h"
 #include "locations.h"
 #include "paths.h"
 #include "property_file.h"
 #include "scoped.h"
 #include "settings.h"
+#include "single_user_mode.h"
 
 #include <algorithm>
 #include <cerrno>
@@ -81,7 +82,7 @@ std::string homeStateOf(const Installation& found)
 std::set<std::string> readIndex(Installation& found)
 {
     std::set<std::string> files;
-    const std::string path = joinPath(found.registry.homeDirectory, ZOR_FILE_INDEX);
+    const std::string path = fileIndexPath(found.registry.homeDirectory);
     const GuardedText index = readGuarded(path, IndexLimit);
     found.indexState = readStateName(index.state);
     if (index.state != ReadState::Read)
@@ -149,7 +150,7 @@ void judgeHome(Installation& found)
 
 void judgeIndex(Installation& found)
 {
-    const std::string path = joinPath(found.registry.homeDirectory, ZOR_FILE_INDEX);
+    const std::string path = fileIndexPath(found.registry.homeDirectory);
     if (found.indexState == "interrupted")
         report(found, "index-interrupted",
                "an extraction was interrupted: " + path + " is not finished");

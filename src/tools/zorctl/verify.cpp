@@ -3,9 +3,9 @@
 #include "common_directory.h"
 #include "entry_content.h"
 #include "exit_status.h"
+#include "file_index.h"
 #include "fresh_install.h"
 #include "guarded_file.h"
-#include "install_log.h"
 #include "installation_lock.h"
 #include "json_report.h"
 #include "locations.h"
@@ -14,6 +14,7 @@
 #include "permissions.h"
 #include "property_file.h"
 #include "settings.h"
+#include "single_user_mode.h"
 #include "survey.h"
 #include "template_variables.h"
 #include "text.h"
@@ -112,8 +113,7 @@ private:
     std::set<std::string> indexedFiles() const
     {
         std::set<std::string> files;
-        const GuardedText index =
-            readGuarded(joinPath(home_, ZOR_FILE_INDEX), std::size_t{64} << 20);
+        const GuardedText index = readGuarded(fileIndexPath(home_), std::size_t{64} << 20);
         if (index.state == ReadState::Read)
             readFileIndex(MemoryFile(index.text).path(), files);
         return files;
@@ -402,7 +402,7 @@ private:
     {
         std::set<std::string> known;
         addInstallerFiles(found_.registry, known);
-        known.insert(joinPath(home_, ZOR_FILE_INDEX));
+        known.insert(joinPath(home_, ZOR_FILE_INDEX)); // as the search below finds it
         known.insert(joinPath(home_, joinPath(auxDirInstall, installProps)));
         known.insert(singleUserFlagPath(home_));
         for (const std::string& name : {cacheDir, logDir})
@@ -518,8 +518,8 @@ int verifyInstallation(const VerifyOptions& options)
     if (!options.spb.empty() && !verification.withPackage())
         return complain(options.spb + ": package not found or not valid", ExitCouldNotCheck);
     if (options.spb.empty() && !verification.withIndex())
-        return complain(joinPath(found.registry.homeDirectory, ZOR_FILE_INDEX) + ": " +
-                            found.indexState + "; name the package to compare with it",
+        return complain(fileIndexPath(found.registry.homeDirectory) + ": " + found.indexState +
+                            "; name the package to compare with it",
                         ExitCouldNotCheck);
 
     const int status = exitStatusOf(verification.differences(), options);

@@ -35,6 +35,12 @@ std::string scannerProgram(const std::string& log, const std::string& failing)
     return script + "exit 0\n";
 }
 
+void plantScript(const std::string& path, const std::string& commands)
+{
+    writeFile(path, "#!/bin/sh\n" + commands);
+    ASSERT_EQ(0, chmod(path.c_str(), 0755));
+}
+
 void plantScanners(const std::string& home, const std::string& log, const std::string& failing)
 {
     makeDirectories(home + "/bin");

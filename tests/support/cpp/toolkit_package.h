@@ -10,6 +10,9 @@
 /// with "/" is a directory.
 using PackageFiles = std::vector<std::pair<std::string, std::string>>;
 
+/// Writes an executable shell script with `commands` to `path`.
+void plantScript(const std::string& path, const std::string& commands);
+
 /// A scanner program (a shell script) that appends a line to the file `log` for each call: its
 /// name and, in brackets, each of its arguments, "trawlcfg [-disable] [all]".
 ///

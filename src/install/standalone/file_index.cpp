@@ -1,4 +1,4 @@
-#include "install_log.h"
+#include "file_index.h"
 
 #include "build_stamp.h"
 #include "file_operations.h"
@@ -16,12 +16,15 @@
 
 namespace {
 
-constexpr const char* SingleUserFlagName = "SingleUserMode";
-constexpr mode_t IndexDirectoryMode = 0755;
 constexpr mode_t IndexFileMode = 0644;
 constexpr mode_t NewFileMode = 0666;
 
 } // namespace
+
+std::string fileIndexPath(const std::string& home)
+{
+    return home + "/" + ZOR_FILE_INDEX; // also after a slash
+}
 
 void readFileIndex(const std::string& path, std::set<std::string>& files)
 {
@@ -40,7 +43,7 @@ void addInstallerFiles(const InstallRegistry& registry, std::set<std::string>& f
     const std::string& home = registry.homeDirectory;
     files.insert(joinPath(joinPath(home, spbBinDir), "libzor.so"));
     files.insert(joinPath(joinPath(home, spbCfgDir), "Zor.tmp"));
-    files.insert(singleUserFlagPath(home));
+    files.insert(joinPath(home, singleUserFlag));
     files.insert(joinPath(home, "zor.log"));
     files.insert(joinPath(home, "zor.log.bak"));
 }
@@ -91,35 +94,4 @@ void closeTransientIndex()
         return;
     (void)std::fclose(zor_file_handle); // the final index is written from what arrived
     zor_file_handle = nullptr;
-}
-
-std::string singleUserFlagPath(const std::string& home)
-{
-    return joinPath(joinPath(home, spbCfgDir), SingleUserFlagName);
-}
-
-void detectSingleUserMode(const std::string& home)
-{
-    const ScopedFile flag = openForReading(singleUserFlagPath(home));
-    if (!flag)
-        return;
-    *logstream << "Single user mode file found\n";
-    enterSingleUserMode();
-}
-
-void createSingleUserModeFlag(FileTransaction& transaction, const std::string& home,
-                              const std::string* indexPath)
-{
-    const ScopedUmask mask(globalFilesUmask);
-    const std::string path = singleUserFlagPath(home);
-    *logstream << "Creating single user mode flag file: " << path << '\n';
-    if (!openStream(path, Existing::Truncate, NewFileMode)) {
-        *logstream << "Unable to create single user mode flag file\n";
-        return;
-    }
-    if (indexPath == nullptr)
-        return;
-
-    (void)createPath(transaction, *indexPath, IndexDirectoryMode); // if it fails, so does the open
-    appendToFileIndex(*indexPath, path);
 }

@@ -1,4 +1,4 @@
-#include "install_log.h"
+#include "file_index.h"
 #include "installer_fixtures.h"
 #include "process_limits.h"
 #include "registry.h"
@@ -21,7 +21,7 @@ using Tree = std::vector<std::string>;
 
 const std::string HeaderStart = "# File created by ZOR: 22/12/02zor_9.2.30.0000 installed on ";
 
-class InstallLogTest : public InstallerTest {
+class FileIndexTest : public InstallerTest {
 protected:
     /// The lines behind the header of the index at `index`, whose header must be sound.
     std::string pathsOfIndex()
@@ -36,14 +36,15 @@ protected:
     std::string index = dir / "ZOR_files";
 };
 
-TEST_F(InstallLogTest, TheSingleUserFlagIsAFileOfTheConfiguration)
+TEST_F(FileIndexTest, IsAFileOfTheHomeDirectory)
 {
-    EXPECT_EQ("/opt/corvan/zor/config/SingleUserMode", singleUserFlagPath("/opt/corvan/zor"));
+    EXPECT_EQ("/opt/corvan/zor/ZOR_files", fileIndexPath("/opt/corvan/zor"));
+    EXPECT_EQ("/opt/zor//ZOR_files", fileIndexPath("/opt/zor/"));
 }
 
 // Reading.
 
-TEST_F(InstallLogTest, EmptyLinesAndCommentsAreNoFiles)
+TEST_F(FileIndexTest, EmptyLinesAndCommentsAreNoFiles)
 {
     writeFile(index, "# header\n/a/x\n#comment\n\n/a/b\n");
     Files files;
@@ -53,7 +54,7 @@ TEST_F(InstallLogTest, EmptyLinesAndCommentsAreNoFiles)
     EXPECT_EQ((Files{"/a/b", "/a/x"}), files);
 }
 
-TEST_F(InstallLogTest, AnyOtherLineIsAWholePath)
+TEST_F(FileIndexTest, AnyOtherLineIsAWholePath)
 {
     writeFile(index, " #a\n/a/b \n /a/b\n/a\tb\r\n" + std::string("/a\0b\n", 5) + "relative\n \n");
     Files files;
@@ -64,7 +65,7 @@ TEST_F(InstallLogTest, AnyOtherLineIsAWholePath)
               files);
 }
 
-TEST_F(InstallLogTest, ALastLineWithoutANewlineIsAPath)
+TEST_F(FileIndexTest, ALastLineWithoutANewlineIsAPath)
 {
     writeFile(index, "/a/x\n/a/b");
     Files files;
@@ -74,7 +75,7 @@ TEST_F(InstallLogTest, ALastLineWithoutANewlineIsAPath)
     EXPECT_EQ((Files{"/a/b", "/a/x"}), files);
 }
 
-TEST_F(InstallLogTest, ReadingAddsToTheSet)
+TEST_F(FileIndexTest, ReadingAddsToTheSet)
 {
     writeFile(index, "/b\n/a\n/b\n");
     Files files = {"/a", "/old"};
@@ -84,7 +85,7 @@ TEST_F(InstallLogTest, ReadingAddsToTheSet)
     EXPECT_EQ((Files{"/a", "/b", "/old"}), files);
 }
 
-TEST_F(InstallLogTest, AMissingIndexAddsNothingSilently)
+TEST_F(FileIndexTest, AMissingIndexAddsNothingSilently)
 {
     Files files = {"/old"};
 
@@ -96,7 +97,7 @@ TEST_F(InstallLogTest, AMissingIndexAddsNothingSilently)
 
 // The installer's own files.
 
-TEST_F(InstallLogTest, TheInstallerOwnsFiveFiles)
+TEST_F(FileIndexTest, TheInstallerOwnsFiveFiles)
 {
     InstallRegistry registry;
     registry.homeDirectory = "/opt/corvan/zor";
@@ -110,7 +111,7 @@ TEST_F(InstallLogTest, TheInstallerOwnsFiveFiles)
               files);
 }
 
-TEST_F(InstallLogTest, AHomeThatEndsWithASlashGetsNoSecondOne)
+TEST_F(FileIndexTest, AHomeThatEndsWithASlashGetsNoSecondOne)
 {
     InstallRegistry registry;
     registry.homeDirectory = "/opt/zor/";
@@ -125,28 +126,28 @@ TEST_F(InstallLogTest, AHomeThatEndsWithASlashGetsNoSecondOne)
 
 // Writing.
 
-TEST_F(InstallLogTest, TheIndexListsEachPathBehindItsHeader)
+TEST_F(FileIndexTest, TheIndexListsEachPathBehindItsHeader)
 {
     writeFileIndex(index, {"/a/x", "/a/b"});
 
     EXPECT_EQ("/a/b\n/a/x\n", pathsOfIndex());
 }
 
-TEST_F(InstallLogTest, PathsComeInTheOrderOfTheirBytes)
+TEST_F(FileIndexTest, PathsComeInTheOrderOfTheirBytes)
 {
     writeFileIndex(index, {"/\xC3\xA4", "/z", "/a", "/B", "/a/b", "/a.b", "/\x7F"});
 
     EXPECT_EQ("/B\n/a\n/a.b\n/a/b\n/z\n/\x7F\n/\xC3\xA4\n", pathsOfIndex());
 }
 
-TEST_F(InstallLogTest, PathsAreWrittenAsTheyAre)
+TEST_F(FileIndexTest, PathsAreWrittenAsTheyAre)
 {
     writeFileIndex(index, {"/a b ", "/a\tb", std::string("/a\0b", 4)});
 
     EXPECT_EQ(std::string("/a\0b\n", 5) + "/a\tb\n/a b \n", pathsOfIndex());
 }
 
-TEST_F(InstallLogTest, TheHeaderTellsTheLocalTime)
+TEST_F(FileIndexTest, TheHeaderTellsTheLocalTime)
 {
     const std::time_t before = std::time(nullptr);
     writeFileIndex(index, {});
@@ -161,7 +162,7 @@ TEST_F(InstallLogTest, TheHeaderTellsTheLocalTime)
     EXPECT_LE(written, after);
 }
 
-TEST_F(InstallLogTest, AnIndexOfBeforeIsReplaced)
+TEST_F(FileIndexTest, AnIndexOfBeforeIsReplaced)
 {
     writeFile(index, std::string(10000, 'x'));
 
@@ -170,7 +171,7 @@ TEST_F(InstallLogTest, AnIndexOfBeforeIsReplaced)
     EXPECT_EQ("/a\n", pathsOfIndex());
 }
 
-TEST_F(InstallLogTest, AnIndexThatCannotBeWrittenIsSkippedSilently)
+TEST_F(FileIndexTest, AnIndexThatCannotBeWrittenIsSkippedSilently)
 {
     writeFileIndex(dir / "missing/ZOR_files", {"/a"});
 
@@ -178,7 +179,7 @@ TEST_F(InstallLogTest, AnIndexThatCannotBeWrittenIsSkippedSilently)
     EXPECT_EQ("", log.text());
 }
 
-TEST_F(InstallLogTest, WhatWasReadIsWrittenBackSortedAndOnce)
+TEST_F(FileIndexTest, WhatWasReadIsWrittenBackSortedAndOnce)
 {
     writeFile(index, "/a/x\n#comment\n\n/a/b\n/a/x\n");
     Files files;
@@ -189,7 +190,7 @@ TEST_F(InstallLogTest, WhatWasReadIsWrittenBackSortedAndOnce)
     EXPECT_EQ("/a/b\n/a/x\n", pathsOfIndex());
 }
 
-TEST_F(InstallLogTest, ATrailingBlankMakesAnotherPath)
+TEST_F(FileIndexTest, ATrailingBlankMakesAnotherPath)
 {
     writeFile(index, "/a/b\n/a/b \n");
     Files files;
@@ -200,7 +201,7 @@ TEST_F(InstallLogTest, ATrailingBlankMakesAnotherPath)
     EXPECT_EQ("/a/b\n/a/b \n", pathsOfIndex());
 }
 
-TEST_F(InstallLogTest, ARefreshedIndexListsTheInstallersFilesToo)
+TEST_F(FileIndexTest, ARefreshedIndexListsTheInstallersFilesToo)
 {
     InstallRegistry registry;
     registry.homeDirectory = "/h";
@@ -213,7 +214,7 @@ TEST_F(InstallLogTest, ARefreshedIndexListsTheInstallersFilesToo)
               pathsOfIndex());
 }
 
-TEST_F(InstallLogTest, ARefreshMakesAMissingIndex)
+TEST_F(FileIndexTest, ARefreshMakesAMissingIndex)
 {
     InstallRegistry registry;
     registry.homeDirectory = "/h";
@@ -227,7 +228,7 @@ TEST_F(InstallLogTest, ARefreshMakesAMissingIndex)
 
 // The transient index.
 
-TEST_F(InstallLogTest, TheTransientIndexHasAHeaderWithoutATime)
+TEST_F(FileIndexTest, TheTransientIndexHasAHeaderWithoutATime)
 {
     openTransientIndex(transaction, index);
     ASSERT_NE(nullptr, zor_file_handle);
@@ -239,7 +240,7 @@ TEST_F(InstallLogTest, TheTransientIndexHasAHeaderWithoutATime)
     EXPECT_EQ("", log.text());
 }
 
-TEST_F(InstallLogTest, TheTransientIndexReplacesTheOldOne)
+TEST_F(FileIndexTest, TheTransientIndexReplacesTheOldOne)
 {
     writeFile(index, std::string(1000, 'x'));
 
@@ -249,7 +250,7 @@ TEST_F(InstallLogTest, TheTransientIndexReplacesTheOldOne)
     EXPECT_EQ("# File created by ZOR: 22/12/02zor_9.2.30.0000\n", readFile(index));
 }
 
-TEST_F(InstallLogTest, TheTransientIndexIsOpenForReadingToo)
+TEST_F(FileIndexTest, TheTransientIndexIsOpenForReadingToo)
 {
     openTransientIndex(transaction, index);
     const int flags = fcntl(fileno(zor_file_handle), F_GETFL);
@@ -258,7 +259,7 @@ TEST_F(InstallLogTest, TheTransientIndexIsOpenForReadingToo)
     EXPECT_EQ(O_RDWR, flags & O_ACCMODE);
 }
 
-TEST_F(InstallLogTest, TheTransientIndexIsReadAsFiles)
+TEST_F(FileIndexTest, TheTransientIndexIsReadAsFiles)
 {
     openTransientIndex(transaction, index);
     (void)std::fputs("/b\n/a\n/b\n", zor_file_handle);
@@ -270,7 +271,7 @@ TEST_F(InstallLogTest, TheTransientIndexIsReadAsFiles)
     EXPECT_EQ((Files{"/a", "/b"}), files);
 }
 
-TEST_F(InstallLogTest, DirectoriesAndIndexAreMadeUnderTheUmaskOfTheInstallation)
+TEST_F(FileIndexTest, DirectoriesAndIndexAreMadeUnderTheUmaskOfTheInstallation)
 {
     index = dir / "etc/zor/ZOR_files";
     const ScopedUmask strict(077);
@@ -283,7 +284,7 @@ TEST_F(InstallLogTest, DirectoriesAndIndexAreMadeUnderTheUmaskOfTheInstallation)
     EXPECT_EQ(077U, umask(077));
 }
 
-TEST_F(InstallLogTest, AStricterInstallationMakesAStricterIndex)
+TEST_F(FileIndexTest, AStricterInstallationMakesAStricterIndex)
 {
     index = dir / "etc/ZOR_files";
     globalFilesUmask = 027;
@@ -294,7 +295,7 @@ TEST_F(InstallLogTest, AStricterInstallationMakesAStricterIndex)
     EXPECT_EQ((Tree{"d 0750 etc", "f 0640 etc/ZOR_files"}), treeOf(dir.path()));
 }
 
-TEST_F(InstallLogTest, TheDirectoriesOfTheIndexAreJournalledAndTheIndexIsNot)
+TEST_F(FileIndexTest, TheDirectoriesOfTheIndexAreJournalledAndTheIndexIsNot)
 {
     index = dir / "etc/zor/ZOR_files";
 
@@ -304,7 +305,7 @@ TEST_F(InstallLogTest, TheDirectoriesOfTheIndexAreJournalledAndTheIndexIsNot)
     EXPECT_EQ("4 " + (dir / "etc") + "\n4 " + (dir / "etc/zor") + "\n", journalText(transaction));
 }
 
-TEST_F(InstallLogTest, AnIndexThatCannotBeOpenedIsWarnedOf)
+TEST_F(FileIndexTest, AnIndexThatCannotBeOpenedIsWarnedOf)
 {
     writeFile(dir / "file", "");
     index = dir / "file/ZOR_files";
@@ -315,152 +316,11 @@ TEST_F(InstallLogTest, AnIndexThatCannotBeOpenedIsWarnedOf)
     EXPECT_EQ("Warning! Failed to create install log file: " + index + "\n", log.text());
 }
 
-TEST_F(InstallLogTest, ClosingWhatIsNotOpenDoesNothing)
+TEST_F(FileIndexTest, ClosingWhatIsNotOpenDoesNothing)
 {
     closeTransientIndex();
 
     EXPECT_EQ(nullptr, zor_file_handle);
-}
-
-// The single-user flag.
-
-class SingleUserFlagTest : public InstallLogTest {
-protected:
-    SingleUserFlagTest() { makeDirectories(dir / "home/config"); }
-
-    std::string home = dir / "home";
-    std::string flag = dir / "home/config/SingleUserMode";
-};
-
-TEST_F(SingleUserFlagTest, AFlagTurnsSingleUserModeOn)
-{
-    writeFile(flag, "");
-
-    detectSingleUserMode(home);
-
-    EXPECT_EQ("Single user mode file found\n", log.text());
-    EXPECT_EQ(022U, globalFilesUmask);
-    EXPECT_EQ(0755U, LogDirMode);
-    EXPECT_EQ(0755U, CommonLogDirMode);
-    EXPECT_EQ(0755U, CacheDirRootMode);
-    EXPECT_EQ(0755U, EtcDirMode);
-    EXPECT_TRUE(applySingleUserMode);
-}
-
-TEST_F(SingleUserFlagTest, TheContentOfAFlagDoesNotMatter)
-{
-    writeFile(flag, "no");
-
-    detectSingleUserMode(home);
-
-    EXPECT_TRUE(applySingleUserMode);
-}
-
-TEST_F(SingleUserFlagTest, DetectionDoesNotAskForAFlag)
-{
-    writeFile(flag, "");
-
-    detectSingleUserMode(home);
-
-    EXPECT_FALSE(createSingleUserModeFile);
-}
-
-TEST_F(SingleUserFlagTest, WithoutAFlagNothingChanges)
-{
-    writeFile(home + "/SingleUserMode", "in the wrong directory");
-
-    detectSingleUserMode(home);
-
-    EXPECT_EQ("", log.text());
-    EXPECT_EQ(0U, globalFilesUmask);
-    EXPECT_EQ(0777U, LogDirMode);
-    EXPECT_EQ(0777U, CommonLogDirMode);
-    EXPECT_EQ(0777U, CacheDirRootMode);
-    EXPECT_EQ(0777U, EtcDirMode);
-    EXPECT_FALSE(applySingleUserMode);
-}
-
-TEST_F(SingleUserFlagTest, AFlagThatMayNotBeReadCountsAsNone)
-{
-    writeFile(flag, "");
-    ASSERT_EQ(0, chmod(flag.c_str(), 0));
-    const OrdinaryRights ordinary;
-
-    detectSingleUserMode(home);
-
-    EXPECT_FALSE(applySingleUserMode);
-}
-
-TEST_F(SingleUserFlagTest, TheFlagIsAnEmptyFile)
-{
-    writeFile(flag, "of before");
-
-    createSingleUserModeFlag(transaction, home, nullptr);
-
-    EXPECT_EQ("", readFile(flag));
-    EXPECT_EQ("Creating single user mode flag file: " + flag + "\n", log.text());
-}
-
-TEST_F(SingleUserFlagTest, TheFlagIsMadeUnderTheUmaskOfTheInstallation)
-{
-    const ScopedUmask strict(077);
-    globalFilesUmask = 022;
-
-    createSingleUserModeFlag(transaction, home, nullptr);
-
-    EXPECT_EQ(0644U, modeOf(flag));
-    EXPECT_EQ(077U, umask(077));
-}
-
-TEST_F(SingleUserFlagTest, TheFlagIsNotJournalled)
-{
-    createSingleUserModeFlag(transaction, home, nullptr);
-
-    EXPECT_EQ("", journalText(transaction));
-}
-
-TEST_F(SingleUserFlagTest, TheFlagIsAppendedToTheIndex)
-{
-    writeFile(index, "# header\n/z\n");
-
-    createSingleUserModeFlag(transaction, home, &index);
-
-    EXPECT_EQ("# header\n/z\n" + flag + "\n", readFile(index));
-}
-
-TEST_F(SingleUserFlagTest, AMissingIndexIsMadeWithItsDirectories)
-{
-    index = dir / "etc/zor/ZOR_files";
-    globalFilesUmask = 022;
-
-    createSingleUserModeFlag(transaction, home, &index);
-
-    EXPECT_EQ(flag + "\n", readFile(index));
-    EXPECT_EQ((Tree{"d 0755 zor", "f 0644 zor/ZOR_files"}), treeOf(dir / "etc"));
-    EXPECT_EQ("4 " + (dir / "etc") + "\n4 " + (dir / "etc/zor") + "\n", journalText(transaction));
-}
-
-TEST_F(SingleUserFlagTest, AnIndexThatCannotBeOpenedIsSkippedSilently)
-{
-    index = dir / "home"; // a directory
-
-    createSingleUserModeFlag(transaction, home, &index);
-
-    EXPECT_EQ("", readFile(flag));
-    EXPECT_EQ("Creating single user mode flag file: " + flag + "\n", log.text());
-}
-
-TEST_F(SingleUserFlagTest, AFlagThatCannotBeMadeIsLoggedAndNotListed)
-{
-    home = dir / "nowhere";
-    writeFile(index, "/z\n");
-
-    createSingleUserModeFlag(transaction, home, &index);
-
-    EXPECT_EQ("Creating single user mode flag file: " + home + "/config/SingleUserMode\n" +
-                  "Unable to create single user mode flag file\n",
-              log.text());
-    EXPECT_EQ("/z\n", readFile(index));
 }
 
 } // namespace
