@@ -7,6 +7,7 @@
 #include <string>
 #include <vector>
 
+#include <sys/stat.h>
 #include <unistd.h>
 
 namespace {
@@ -328,6 +329,60 @@ TEST_F(PropertyFileTest, ADumpPrintsTheLinesOnStandardOutput)
 
     EXPECT_EQ("a = 1\n\nb\n", testing::internal::GetCapturedStdout());
     EXPECT_EQ("", log.text());
+}
+
+TEST_F(PropertyFileTest, ALineOfAConstantFileCanBeFound)
+{
+    const PropertyFile file{{"x=1", "x=2"}};
+
+    EXPECT_EQ(&file.lines[1], file.findLine("x"));
+    EXPECT_EQ(nullptr, file.findLine("y"));
+}
+
+// Editing on the disk.
+
+TEST_F(PropertyFileTest, AnEditedFileIsSaved)
+{
+    writeFile(path, "a=1\n");
+
+    EXPECT_EQ(0, editPropertyFile(path, [](PropertyFile& file) { file.setValue("a", "2"); }));
+
+    EXPECT_EQ("a=2\n", readFile(path));
+    EXPECT_EQ("", log.text());
+}
+
+TEST_F(PropertyFileTest, AFileThatCannotBeLoadedIsNotEdited)
+{
+    EXPECT_EQ(2, editPropertyFile(path, [](PropertyFile&) { ADD_FAILURE(); }));
+
+    EXPECT_EQ("Loading file " + path +
+                  " error: 2 (No such file or directory)\nCould not load property file\n",
+              log.text());
+}
+
+TEST_F(PropertyFileTest, AnEditedFileThatCannotBeSavedIsLogged)
+{
+    writeFile(path, "a=1\n");
+    ASSERT_EQ(0, chmod(path.c_str(), 0444));
+    {
+        const OrdinaryRights rights;
+        EXPECT_EQ(13, editPropertyFile(path, [](PropertyFile& file) { file.setValue("a", "2"); }));
+    }
+
+    EXPECT_EQ("Saving file " + path +
+                  " error: 13 (Permission denied)\nCould not save property file\n",
+              log.text());
+    EXPECT_EQ("a=1\n", readFile(path));
+}
+
+TEST_F(PropertyFileTest, ACustomizationIsLogged)
+{
+    writeFile(path, "a=1\n");
+
+    EXPECT_EQ(0, customizePropertyFile(path, [](PropertyFile& file) { file.lines.clear(); }));
+
+    EXPECT_EQ("Customizing property file: " + path + "\n", log.text());
+    EXPECT_EQ("", readFile(path));
 }
 
 } // namespace

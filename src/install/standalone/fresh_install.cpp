@@ -53,33 +53,15 @@ int createDirectories(FileTransaction& transaction, const std::string& home)
     return code;
 }
 
-/// Loads the property file at `path`, lets `edit` change it and saves it; returns 0 or an `errno`.
-template <typename Edit>
-int customize(const std::string& path, Edit edit)
-{
-    *logstream << "Customizing property file: " << path << '\n';
-    PropertyFile file;
-    const int loaded = file.load(path);
-    if (loaded != 0) {
-        *logstream << "Could not load property file\n";
-        return loaded;
-    }
-    edit(file);
-    const int saved = file.save(path);
-    if (saved != 0)
-        *logstream << "Could not save property file\n";
-    return saved;
-}
-
 int customizeProperties(const std::string& home)
 {
     const std::string config = joinPath(home, spbCfgDir);
-    const int code = customize(joinPath(config, zorProps),
-                               [&](PropertyFile& file) { fillMainProperties(file, home); });
+    const int code = customizePropertyFile(
+        joinPath(config, zorProps), [&](PropertyFile& file) { fillMainProperties(file, home); });
     if (code != 0)
         return code;
-    return customize(joinPath(config, traceProps),
-                     [&](PropertyFile& file) { fillTraceProperties(file, home); });
+    return customizePropertyFile(joinPath(config, traceProps),
+                                 [&](PropertyFile& file) { fillTraceProperties(file, home); });
 }
 
 /// Completes the exploiter list and saves the registry.

@@ -11,6 +11,7 @@
 #include <cstdio>
 #include <cstring>
 #include <iostream>
+#include <utility>
 
 namespace {
 
@@ -80,13 +81,18 @@ std::string PropertyFile::getValue(const std::string& key) const
     return {};
 }
 
-std::string* PropertyFile::findLine(const std::string& key)
+const std::string* PropertyFile::findLine(const std::string& key) const
 {
     for (auto line = lines.rbegin(); line != lines.rend(); ++line) {
         if (keyOfLine(*line) == key)
             return &*line;
     }
     return nullptr;
+}
+
+std::string* PropertyFile::findLine(const std::string& key)
+{
+    return const_cast<std::string*>(std::as_const(*this).findLine(key)); // a line of this file
 }
 
 int PropertyFile::setValue(const std::string& key, const std::string& value)
@@ -138,4 +144,25 @@ void PropertyFile::dump() const
 {
     for (const std::string& line : lines)
         std::cout << line << '\n';
+}
+
+int editPropertyFile(const std::string& path, const PropertyEdit& edit)
+{
+    PropertyFile file;
+    const int loaded = file.load(path);
+    if (loaded != 0) {
+        *logstream << "Could not load property file\n";
+        return loaded;
+    }
+    edit(file);
+    const int saved = file.save(path);
+    if (saved != 0)
+        *logstream << "Could not save property file\n";
+    return saved;
+}
+
+int customizePropertyFile(const std::string& path, const PropertyEdit& edit)
+{
+    *logstream << "Customizing property file: " << path << '\n';
+    return editPropertyFile(path, edit);
 }

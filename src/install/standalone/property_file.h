@@ -7,6 +7,7 @@
 // lines, so every operation is a plain scan.
 #pragma once
 
+#include <functional>
 #include <string>
 #include <vector>
 
@@ -28,6 +29,7 @@ struct PropertyFile {
 
     /// The last line whose key is `key`, or null. It belongs to `lines`.
     [[nodiscard]] std::string* findLine(const std::string& key);
+    [[nodiscard]] const std::string* findLine(const std::string& key) const;
 
     /// Makes every line whose key is `key` into `key`=`value`; returns their number. A missing line
     /// is not added.
@@ -47,3 +49,14 @@ struct PropertyFile {
     /// Prints the lines on standard output. A diagnostic aid; no flow calls it.
     void dump() const;
 };
+
+/// Changes the lines of a property file.
+using PropertyEdit = std::function<void(PropertyFile&)>;
+
+/// Loads the property file at `path`, calls `edit` and saves the file. Returns 0 or the `errno` of
+/// what failed, which is logged: if loading failed, `edit` was not called; in both cases the file
+/// is unchanged.
+[[nodiscard]] int editPropertyFile(const std::string& path, const PropertyEdit& edit);
+
+/// editPropertyFile(), logged as a customization.
+[[nodiscard]] int customizePropertyFile(const std::string& path, const PropertyEdit& edit);

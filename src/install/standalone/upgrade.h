@@ -6,16 +6,6 @@
 
 struct FileTransaction;
 struct InstallRegistry;
-struct PropertyFile;
-
-/// A key of "Zor.properties" and the value that it gets when it is missing.
-struct PropertyDefault {
-    const char* key;
-    const char* value;
-};
-
-/// The keys that newer versions need, ended by a pair of nulls.
-extern const PropertyDefault ZorPropertiesUpdate[];
 
 /// Brings the installation of `registry` to the version of `request`, the installer's own record,
 /// whose exploiter list is the calling exploiter's identifier.
@@ -29,16 +19,6 @@ extern const PropertyDefault ZorPropertiesUpdate[];
 [[nodiscard]] int upgradeInstall(FileTransaction& transaction, InstallRegistry& registry,
                                  const InstallRegistry& request, const std::string* indexPath,
                                  bool disable, bool useCustomPath, const std::string& customPath);
-
-/// Edits the lines of the installed "Zor.properties", the user's settings among them, for the
-/// version of `package`. Doing it twice changes nothing more.
-void upgradeProperties(PropertyFile& file, const std::string& home, const InstallRegistry& package,
-                       const std::string& common);
-
-/// Customizes the property files and, of a shared installation, the scripts of the extracted
-/// package. Doing it twice changes nothing more. Returns 0 or the `errno` of a property file.
-[[nodiscard]] int customizeDeployment(const std::string& home, const InstallRegistry& package,
-                                      bool useCustomPath);
 
 /// Adds the calling exploiter of `package`, unless `skipExploiterRegistration`, and a later build
 /// date to `registry`; logs it. Returns true when that changed it.

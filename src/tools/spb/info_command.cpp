@@ -4,11 +4,11 @@
 #include "package_layout.h"
 #include "property_file.h"
 #include "registry.h"
+#include "settings_upgrade.h"
 #include "sha256.h"
 #include "shown_text.h"
 #include "text.h"
 #include "tool_output.h"
-#include "upgrade.h"
 
 #include <algorithm>
 #include <cerrno>

@@ -15,11 +15,11 @@
 #include "safe_path.h"
 #include "scanner_control.h"
 #include "settings.h"
+#include "settings_upgrade.h"
 #include "survey.h"
 #include "text_output.h"
 #include "transaction.h"
 #include "trusted_path.h"
-#include "upgrade.h"
 
 #include <algorithm>
 #include <cstdio>

@@ -14,12 +14,12 @@
 #include "permissions.h"
 #include "property_file.h"
 #include "settings.h"
+#include "settings_upgrade.h"
 #include "single_user_mode.h"
 #include "survey.h"
 #include "template_variables.h"
 #include "text.h"
 #include "text_output.h"
-#include "upgrade.h"
 #include "zip_file.h"
 
 #include <algorithm>
