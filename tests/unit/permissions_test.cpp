@@ -53,7 +53,7 @@ protected:
 
 TEST_F(PermissionsTest, EverythingOfASharedInstallationGetsItsMode)
 {
-    applyPermissions(transaction, found);
+    applyPermissions(found);
 
     EXPECT_EQ(Lines({"d 0750 _uninst",
                      "d 0755 bin",
@@ -86,7 +86,7 @@ TEST_F(PermissionsTest, EverythingOfASharedInstallationGetsItsMode)
 
 TEST_F(PermissionsTest, TheRegistryAndItsDirectoryGetTheirModes)
 {
-    applyPermissions(transaction, found);
+    applyPermissions(found);
 
     EXPECT_EQ(0755U, modeOf("/etc/zor"));
     EXPECT_EQ(0644U, modeOf("/etc/zor/zor.ini"));
@@ -98,7 +98,7 @@ TEST_F(PermissionsTest, ThePerUserRegistryIsTheOneOfAPerUserInstallation)
     makeDirectories("/root/.zor");
     writeFile("/root/.zor/zor.ini", "");
 
-    applyPermissions(transaction, found);
+    applyPermissions(found);
 
     EXPECT_EQ(0755U, modeOf("/root/.zor"));
     EXPECT_EQ(0644U, modeOf("/root/.zor/zor.ini"));
@@ -109,7 +109,7 @@ TEST_F(PermissionsTest, TheCacheOfAPerUserInstallationIsClosedToOthers)
 {
     localInstall = true;
 
-    applyPermissions(transaction, found);
+    applyPermissions(found);
 
     EXPECT_EQ(0770U, modeOf(home + "/cache_data"));
     EXPECT_EQ(0777U, modeOf(home + "/bin/etc"));
@@ -119,7 +119,7 @@ TEST_F(PermissionsTest, SingleUserModeLowersTheModesOfDirectories)
 {
     enterSingleUserMode();
 
-    applyPermissions(transaction, found);
+    applyPermissions(found);
 
     for (const char* const name :
          {"cache_data", "logs", "bin/customscanners", "bin/etc", "bin/etc/trawlfs",
@@ -132,14 +132,14 @@ TEST_F(PermissionsTest, TheCacheOfAPerUserInstallationHas0770InSingleUserModeToo
     enterSingleUserMode();
     localInstall = true;
 
-    applyPermissions(transaction, found);
+    applyPermissions(found);
 
     EXPECT_EQ(0770U, modeOf(home + "/cache_data"));
 }
 
 TEST_F(PermissionsTest, AHomeThatWasThereKeepsItsMode)
 {
-    applyPermissions(transaction, found);
+    applyPermissions(found);
 
     EXPECT_EQ(0700U, modeOf(home));
 }
@@ -148,7 +148,7 @@ TEST_F(PermissionsTest, AHomeThatThisRunMadeIsOpened)
 {
     found.homeExists = false;
 
-    applyPermissions(transaction, found);
+    applyPermissions(found);
 
     EXPECT_EQ(0755U, modeOf(home));
 }
@@ -157,7 +157,7 @@ TEST_F(PermissionsTest, TheHomeOfASharedInstallationIsOpenedInSingleUserMode)
 {
     enterSingleUserMode();
 
-    applyPermissions(transaction, found);
+    applyPermissions(found);
 
     EXPECT_EQ(0755U, modeOf(home));
 }
@@ -167,7 +167,7 @@ TEST_F(PermissionsTest, TheHomeOfAPerUserInstallationIsNotOpenedInSingleUserMode
     enterSingleUserMode();
     localInstall = true;
 
-    applyPermissions(transaction, found);
+    applyPermissions(found);
 
     EXPECT_EQ(0700U, modeOf(home));
 }
@@ -178,7 +178,7 @@ TEST_F(PermissionsTest, WhatDoesNotExistIsPassedOverSilently)
     std::filesystem::remove_all(home + "/config/xss");
     std::filesystem::remove_all("/etc/zor");
 
-    applyPermissions(transaction, found);
+    applyPermissions(found);
 
     EXPECT_EQ("", log.text());
     EXPECT_EQ(0750U, modeOf(home + "/_uninst"));
@@ -194,7 +194,7 @@ TEST_F(PermissionsTest, AModeThatCannotBeSetIsLoggedAndTheWalkGoesOn)
     EXPECT_TRUE(passesInChild([&] {
         failSystemCall(SYS_chmod, EPERM);
 
-        applyPermissions(transaction, found);
+        applyPermissions(found);
 
         EXPECT_EQ("Unable to change permissions to '" + home + "/' file/directory\n" +
                       "Unable to change permissions to '" + home + "/config' file/directory\n" +
@@ -209,25 +209,16 @@ TEST_F(PermissionsTest, TheProcessUmaskIsRestored)
 {
     globalFilesUmask = 022;
 
-    applyPermissions(transaction, found);
+    applyPermissions(found);
 
     EXPECT_EQ(077U, umask(022));
 }
 
-TEST_F(PermissionsTest, AnUpgradeStartsWithoutAScannerCache)
+TEST_F(PermissionsTest, TheScannerCacheOfAnUpgradeIsNotDeletedHere)
 {
     found.upgradeNeeded = true;
 
-    applyPermissions(transaction, found);
-
-    EXPECT_FALSE(pathExists(home + "/cache_data"));
-    EXPECT_EQ("DEL: " + home + "/cache_data/file\nRMDIR: " + home + "/cache_data\n", log.text());
-    EXPECT_TRUE(transaction.journal.empty());
-}
-
-TEST_F(PermissionsTest, WithoutAnUpgradeTheScannerCacheStays)
-{
-    applyPermissions(transaction, found);
+    applyPermissions(found);
 
     EXPECT_TRUE(pathExists(home + "/cache_data/file"));
 }

@@ -1,6 +1,7 @@
 #include "common_directory.h"
 
 #include "file_operations.h"
+#include "file_reading.h"
 #include "file_replacement.h"
 #include "paths.h"
 #include "safe_path.h"

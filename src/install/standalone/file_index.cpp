@@ -2,13 +2,13 @@
 
 #include "build_stamp.h"
 #include "file_operations.h"
+#include "file_reading.h"
 #include "file_replacement.h"
 #include "paths.h"
 #include "registry.h"
 #include "safe_path.h"
 #include "scoped.h"
 #include "settings.h"
-#include "text.h"
 #include "time_stamps.h"
 
 #include <cstdio>

@@ -5,19 +5,22 @@
 #include "safe_path.h"
 #include "scoped.h"
 #include "settings.h"
-#include "tree_removal.h"
 
+#include <iterator>
 #include <ostream>
 #include <string>
 #include <vector>
 
 namespace {
 
+const std::string AllScopes = "all";
+
+/// One row of the permission table.
 struct Row {
     std::string base;
-    std::string relativePath;
+    std::string path; ///< relative to `base`; empty for `base` itself
     mode_t mode;
-    std::string scope; ///< "all", or the install type that it is for
+    std::string scope; ///< AllScopes, or the install type that the row is for
 };
 
 std::vector<Row> rowsOf(const Discovery& found)
@@ -28,31 +31,31 @@ std::vector<Row> rowsOf(const Discovery& found)
 
     std::vector<Row> table;
     if (!found.homeExists || (applySingleUserMode && !localInstall))
-        table.push_back({home, "", 0755, "all"});
+        table.push_back({home, "", 0755, AllScopes});
     const Row fixed[] = {
-        {cfg, "cache_data", CacheDirRootMode, "global"},
-        {cfg, "cache_data", 0770, "local"},
-        {cfg, "config", 0755, "all"},
-        {cfg, "config/xss", 0755, "all"},
-        {cfg, "config/Zor.properties", 0644, "all"},
-        {cfg, "config/ZorTrace.properties", 0644, "all"},
-        {cfg, "config/ZorHWConfig.xml", 0644, "all"},
-        {home, "bin", 0755, "all"},
-        {home, "bin/customscanners", EtcDirMode, "all"},
-        {home, "bin/etc", EtcDirMode, "all"},
-        {home, "bin/etc/trawlfs", EtcDirMode, "all"},
-        {home, "bin/etc/trawlhw", EtcDirMode, "all"},
-        {home, "bin/etc/trawlvpd", EtcDirMode, "all"},
-        {home, "bin/etc/trawlsw", EtcDirMode, "all"},
-        {home, "bin/etc/trawlcfg", EtcDirMode, "all"},
-        {home, "bin/plugins", 0755, "all"},
-        {home, "install", 0750, "all"},
-        {home, "install/zor_install.properties", 0640, "all"},
-        {home, "install/trawlcfg.sh", 0750, "all"},
-        {home, "logs", LogDirMode, "all"},
-        {home, "_uninst", 0750, "all"},
-        {reg, "", 0755, "all"},
-        {reg, "zor.ini", 0644, "all"},
+        {cfg, cacheDir, CacheDirRootMode, valueInstallGlobal},
+        {cfg, cacheDir, 0770, valueInstallLocal},
+        {cfg, spbCfgDir, 0755, AllScopes},
+        {cfg, joinPath(spbCfgDir, spbCfgXssDir), 0755, AllScopes},
+        {cfg, joinPath(spbCfgDir, zorProps), 0644, AllScopes},
+        {cfg, joinPath(spbCfgDir, traceProps), 0644, AllScopes},
+        {cfg, joinPath(spbCfgDir, "ZorHWConfig.xml"), 0644, AllScopes},
+        {home, spbBinDir, 0755, AllScopes},
+        {home, joinPath(spbBinDir, spbBinCustomScannersDir), EtcDirMode, AllScopes},
+        {home, binEtcDir, EtcDirMode, AllScopes},
+        {home, joinPath(binEtcDir, "trawlfs"), EtcDirMode, AllScopes},
+        {home, joinPath(binEtcDir, "trawlhw"), EtcDirMode, AllScopes},
+        {home, joinPath(binEtcDir, "trawlvpd"), EtcDirMode, AllScopes},
+        {home, joinPath(binEtcDir, "trawlsw"), EtcDirMode, AllScopes},
+        {home, joinPath(binEtcDir, "trawlcfg"), EtcDirMode, AllScopes},
+        {home, joinPath(spbBinDir, spbBinPluginsDir), 0755, AllScopes},
+        {home, auxDirInstall, 0750, AllScopes},
+        {home, joinPath(auxDirInstall, installProps), 0640, AllScopes},
+        {home, joinPath(auxDirInstall, "trawlcfg.sh"), 0750, AllScopes},
+        {home, logDir, LogDirMode, AllScopes},
+        {home, UninstallFileName, 0750, AllScopes},
+        {reg, "", 0755, AllScopes},
+        {reg, ZorIniName, 0644, AllScopes},
     };
     table.insert(table.end(), std::begin(fixed), std::end(fixed));
     return table;
@@ -71,19 +74,15 @@ std::vector<Permission> permissionTable(const Discovery& found)
 {
     std::vector<Permission> table;
     for (const Row& row : rowsOf(found)) {
-        if (row.scope == installTypeName(localInstall) || row.scope == "all")
-            table.push_back({joinPath(row.base, row.relativePath), row.mode});
+        if (row.scope == installTypeName(localInstall) || row.scope == AllScopes)
+            table.push_back({joinPath(row.base, row.path), row.mode});
     }
     return table;
 }
 
-void applyPermissions(FileTransaction& transaction, const Discovery& found)
+void applyPermissions(const Discovery& found)
 {
-    {
-        const ScopedUmask mask(globalFilesUmask);
-        for (const Permission& permission : permissionTable(found))
-            apply(permission);
-    }
-    if (found.upgradeNeeded)
-        (void)removeDir(transaction, found.currentZorHome, cacheDir, true);
+    const ScopedUmask mask(globalFilesUmask);
+    for (const Permission& permission : permissionTable(found))
+        apply(permission);
 }

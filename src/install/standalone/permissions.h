@@ -17,7 +17,6 @@ struct Permission {
 /// What the permission pass sets for this run's install type, in its order.
 [[nodiscard]] std::vector<Permission> permissionTable(const Discovery& found);
 
-/// Sets the mode of everything in the installation and its registry that has a fixed one; what does
-/// not exist is passed over, a failure is logged only. Then an upgrade starts with an empty scanner
-/// cache: its directory is removed through `transaction`.
-void applyPermissions(FileTransaction& transaction, const Discovery& found);
+/// Sets the mode of everything in the installation and its registry that has a fixed one. What does
+/// not exist is skipped; a failure is only logged.
+void applyPermissions(const Discovery& found);

@@ -1,6 +1,7 @@
 #include "property_file.h"
 
 #include "file_codes.h"
+#include "file_reading.h"
 #include "file_replacement.h"
 #include "safe_path.h"
 #include "scoped.h"

@@ -2,6 +2,7 @@
 
 #include "file_codes.h"
 #include "file_operations.h"
+#include "file_reading.h"
 #include "file_replacement.h"
 #include "locations.h"
 #include "paths.h"

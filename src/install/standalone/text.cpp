@@ -4,10 +4,7 @@ namespace {
 
 std::string framed(std::string_view name)
 {
-    std::string text(ListSeparator);
-    text += name;
-    text += ListSeparator;
-    return text;
+    return ListSeparator + std::string(name) + ListSeparator;
 }
 
 } // namespace
@@ -34,17 +31,6 @@ void appendToNameList(std::string& list, std::string_view name)
 bool nameListContains(std::string_view list, std::string_view name)
 {
     return list.find(framed(name)) != std::string_view::npos;
-}
-
-bool readLine(std::FILE* file, std::string& line)
-{
-    line.clear();
-    int c = getc_unlocked(file);
-    if (c == EOF)
-        return false;
-    for (; c != EOF && c != '\n'; c = getc_unlocked(file))
-        line += static_cast<char>(c);
-    return std::ferror(file) == 0;
 }
 
 std::string keyOfLine(const std::string& line)

@@ -4,15 +4,14 @@
 // so a name that itself holds "|" can match across two names.
 #pragma once
 
-#include <cstdio>
 #include <string>
 #include <string_view>
 
 /// The characters cut from keys and values: blank, tab, newline, carriage return.
-inline constexpr std::string_view Blanks = " \t\n\r";
+inline const std::string Blanks = " \t\n\r";
 
 /// Stands before and after every name of a name list.
-inline constexpr std::string_view ListSeparator = "|";
+inline const std::string ListSeparator = "|";
 
 /// Cuts every leading and trailing character of Blanks, in place.
 ///
@@ -28,12 +27,6 @@ void appendToNameList(std::string& list, std::string_view name);
 
 /// True when `name` in its frame occurs in `list`.
 [[nodiscard]] bool nameListContains(std::string_view list, std::string_view name);
-
-/// Reads one line of `file` into `line`, without its newline. NUL is an ordinary byte.
-///
-/// A last line without a newline counts. Returns false at the end of the file or when reading
-/// fails (ferror() tells which); a line cut short by a failure is not delivered.
-[[nodiscard]] bool readLine(std::FILE* file, std::string& line);
 
 /// What `line` holds before its first "=", trimmed; the whole line, trimmed, without one.
 [[nodiscard]] std::string keyOfLine(const std::string& line);

@@ -1,6 +1,7 @@
 #include "transaction.h"
 
 #include "file_codes.h"
+#include "file_reading.h"
 #include "paths.h"
 #include "safe_path.h"
 #include "scoped.h"

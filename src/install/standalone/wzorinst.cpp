@@ -14,6 +14,7 @@
 #include "settings.h"
 #include "status_report.h"
 #include "transaction.h"
+#include "tree_removal.h"
 
 #include <clocale>
 #include <csignal>
@@ -64,6 +65,14 @@ int removeRegistered(Discovery& found, const InstallRegistry& request)
     return status;
 }
 
+/// What follows a successful installation: the modes, and an upgrade's empty scanner cache.
+void finishInstallation(FileTransaction& transaction, const Discovery& found)
+{
+    applyPermissions(found);
+    if (found.upgradeNeeded)
+        (void)removeDir(transaction, found.currentZorHome, cacheDir, true); // always 0
+}
+
 int installOrUpgrade(Discovery& found, InstallRegistry& request)
 {
     if (!checkInstallTypeCompatibility(localInstall, request.homeDirectory))
@@ -73,7 +82,7 @@ int installOrUpgrade(Discovery& found, InstallRegistry& request)
         installWithTransaction(found.registryFound, transaction, found.registry, request,
                                found.indexPath, true, custom_log_path_available, new_log_path);
     if (status == 0)
-        applyPermissions(transaction, found);
+        finishInstallation(transaction, found);
     return status;
 }
 

@@ -369,12 +369,11 @@ private:
     void setModes()
     {
         add("set-modes", home_, [this] {
-            FileTransaction transaction;
             Discovery place;
             place.registry = found_.registry;
             place.homeExists = true;
             place.currentZorHome = place.currentCfgHome = home_;
-            applyPermissions(transaction, place);
+            applyPermissions(place);
             return true;
         });
     }
