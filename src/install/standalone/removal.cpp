@@ -8,107 +8,74 @@
 #include "file_replacement.h"
 #include "locations.h"
 #include "paths.h"
-#include "registry.h"
 #include "safe_path.h"
 #include "scanner_control.h"
 #include "scoped.h"
 #include "settings.h"
-#include "tree_removal.h"
+#include "trace_directory.h"
 
 #include <cstdio>
 #include <cstring>
-#include <iterator>
+#include <optional>
 #include <ostream>
 
 namespace {
 
-constexpr const char* ScannerDirs[] = {
-    "trawlhw", "trawluse", "trawlnet", "trawlfs", "trawlsw", "trawlvpd",
+/// One row of the table of directories, deepest first.
+struct Row {
+    std::string path;
+    std::optional<RemovalKind> afterIndex; ///< once the files of an index are deleted; may be left
+    RemovalKind withoutIndex;
 };
 
-/// The directories of the command line client, relative to the installation.
-struct ClientDirs {
-    std::string client = joinPath(auxDirInstall, "QMX_CLI");
-    std::string platform = joinPath(client, interp);
-    std::string catalogues = joinPath(platform, "msg_cat");
-    std::string platformBin = joinPath(platform, "bin");
-    std::string platformLib = joinPath(platform, "lib");
-    std::string catalogueC = joinPath(catalogues, "C");
-};
-
-/// The steps for the directories of the scanners, in "bin/etc", and for that directory.
-void addScannerDirs(std::vector<RemovalStep>& steps)
+std::vector<Row> directoryTable()
 {
-    const std::string binEtc = joinPath(spbBinDir, etcDir);
-    for (const char* const name : ScannerDirs)
-        steps.push_back({WithFiles, joinPath(binEtc, name)});
-    steps.push_back({WithFiles, binEtc});
+    const std::string client = joinPath(auxDirInstall, "QMX_CLI"); // the command line client
+    const std::string platform = joinPath(client, interp);
+    const std::string catalogues = joinPath(platform, "msg_cat");
+    return {
+        {UninstallFileName, WithFiles, WithFiles},
+        {joinPath(platform, "bin"), IfEmpty, WithFiles},
+        {joinPath(platform, "lib"), IfEmpty, WithFiles},
+        {joinPath(catalogues, "C"), IfEmpty, WithFiles},
+        {catalogues, WithFiles, WithFiles},
+        {platform, WithFiles, WithFiles},
+        {client, WithFiles, WithFiles},
+        {auxDirInstall, WithFiles, WithFiles},
+        {joinPath(binEtcDir, "trawlhw"), WithFiles, WithFiles},
+        {joinPath(binEtcDir, "trawluse"), WithFiles, WithFiles},
+        {joinPath(binEtcDir, "trawlnet"), WithFiles, WithFiles},
+        {joinPath(binEtcDir, "trawlfs"), WithFiles, WithFiles},
+        {joinPath(binEtcDir, "trawlsw"), WithFiles, WithFiles},
+        {joinPath(binEtcDir, "trawlvpd"), WithFiles, WithFiles},
+        {binEtcDir, WithFiles, WithFiles},
+        {joinPath(spbBinDir, spbBinPluginsDir), IfEmpty, WithFiles},
+        {joinPath(spbBinDir, spbBinCustomScannersDir), IfEmpty, WithFiles},
+        {spbBinDir, IfEmpty, WithFiles},
+        {spbPropertiesDir, WithEverything, WithEverything},
+        {joinPath(spbCfgDir, spbCfgXssDir), std::nullopt, WithFiles},
+        {spbCfgDir, WithEverything, WithEverything},
+        {logDir, WithFiles, WithFiles},
+        {cacheDir, WithEverything, WithEverything},
+        {"", IfEmpty, WithFiles},
+    };
 }
 
-/// After the listed files: what is left of the directories.
-std::vector<RemovalStep> leftovers()
+void perform(const std::string& home, const RemovalStep& step)
 {
-    const ClientDirs dirs;
-    std::vector<RemovalStep> steps = {
-        {WithFiles, UninstallFileName}, {IfEmpty, dirs.platformBin},  {IfEmpty, dirs.platformLib},
-        {IfEmpty, dirs.catalogueC},     {WithFiles, dirs.catalogues}, {WithFiles, dirs.platform},
-        {WithFiles, dirs.client},       {WithFiles, auxDirInstall},
-    };
-    addScannerDirs(steps);
-    const RemovalStep rest[] = {
-        {IfEmpty, joinPath(spbBinDir, spbBinPluginsDir)},
-        {IfEmpty, joinPath(spbBinDir, spbBinCustomScannersDir)},
-        {IfEmpty, spbBinDir},
-        {WithEverything, spbPropertiesDir},
-        {WithEverything, spbCfgDir},
-        {WithFiles, logDir},
-        {WithEverything, cacheDir},
-        {IfEmpty, ""},
-    };
-    steps.insert(steps.end(), std::begin(rest), std::end(rest));
-    return steps;
-}
-
-/// Without a list of files: everything at its known place.
-std::vector<RemovalStep> knownPlaces()
-{
-    const ClientDirs dirs;
-    std::vector<RemovalStep> steps = {
-        {WithFiles, UninstallFileName}, {WithFiles, dirs.platformBin},
-        {WithFiles, dirs.platformLib},  {WithFiles, dirs.catalogueC},
-        {WithFiles, dirs.catalogues},   {WithFiles, dirs.platform},
-        {WithFiles, dirs.client},       {WithFiles, auxDirInstall},
-    };
-    addScannerDirs(steps);
-    const RemovalStep rest[] = {
-        {WithFiles, joinPath(spbBinDir, spbBinPluginsDir)},
-        {WithFiles, joinPath(spbBinDir, spbBinCustomScannersDir)},
-        {WithFiles, spbBinDir},
-        {WithEverything, spbPropertiesDir},
-        {WithFiles, joinPath(spbCfgDir, spbCfgXssDir)},
-        {WithEverything, spbCfgDir},
-        {WithFiles, logDir},
-        {WithEverything, cacheDir},
-        {WithFiles, ""},
-    };
-    steps.insert(steps.end(), std::begin(rest), std::end(rest));
-    return steps;
-}
-
-void perform(FileTransaction& transaction, const std::string& home, const RemovalStep& step)
-{
+    const std::string path = joinPathOptional(home, step.path);
     if (step.kind == IfEmpty)
-        (void)removeDirectory(joinPathOptional(home, step.path)); // stays otherwise
+        (void)removeDirectory(path); // stays otherwise
     else
-        (void)removeDir(transaction, home, step.path, step.kind == WithEverything);
+        (void)removeTree(path, step.kind == WithEverything, false); // best effort
 }
 
-void removeCommonLogDir(FileTransaction& transaction)
+void removeCommonLogDir()
 {
     const std::string common = readCommonDirectory(true);
     deleteTemporaryFile(commonSettingPath());
-    (void)removeDir(transaction, common, joinPath(zorCommonDir, logDir), false);
-    (void)removeDir(transaction, common, zorCommonDir, false);
+    (void)removeTree(commonLogDir(common), false, false);           // best effort
+    (void)removeTree(joinPath(common, zorCommonDir), false, false); // best effort
 }
 
 void removeRegistry()
@@ -121,8 +88,7 @@ void removeRegistry()
 }
 
 /// Deletes the installation, for which no exploiter is left.
-int removeToolkit(FileTransaction& transaction, const InstallRegistry& registry,
-                  const std::string* logPath)
+int removeToolkit(const InstallRegistry& registry, const std::string* indexPath)
 {
     const std::string& home = registry.homeDirectory;
     setLibraryPath(home);
@@ -132,16 +98,16 @@ int removeToolkit(FileTransaction& transaction, const InstallRegistry& registry,
         return stopped;
     }
 
-    if (logPath != nullptr) {
-        refreshFileIndex(registry, *logPath);
-        deleteTemporaryFile(*logPath); // of a run that was killed
+    if (indexPath != nullptr) {
+        refreshFileIndex(registry, *indexPath);
+        deleteTemporaryFile(*indexPath); // of a run that was killed
     }
-    const bool listed = removeListedFiles(logPath);
+    const bool listed = removeListedFiles(indexPath);
     for (const RemovalStep& step : removalSteps(listed))
-        perform(transaction, home, step);
+        perform(home, step);
 
     if (!localInstall)
-        removeCommonLogDir(transaction);
+        removeCommonLogDir();
     removeRegistry();
     return 0;
 }
@@ -150,11 +116,17 @@ int removeToolkit(FileTransaction& transaction, const InstallRegistry& registry,
 
 std::vector<RemovalStep> removalSteps(bool listed)
 {
-    return listed ? leftovers() : knownPlaces();
+    std::vector<RemovalStep> steps;
+    for (const Row& row : directoryTable()) {
+        const std::optional<RemovalKind> kind = listed ? row.afterIndex : row.withoutIndex;
+        if (kind)
+            steps.push_back({*kind, row.path});
+    }
+    return steps;
 }
 
 int removeInstallation(FileTransaction& transaction, InstallRegistry& registry,
-                       const InstallRegistry& request, const std::string* logPath)
+                       const InstallRegistry& request, const std::string* indexPath)
 {
     const std::string& exploiter = request.exploiters;
     if (!isExploiterRegistered(registry, exploiter)) {
@@ -168,14 +140,14 @@ int removeInstallation(FileTransaction& transaction, InstallRegistry& registry,
         *logstream << "Exploiter list not empty, updating INI file only\n";
         return saveRegistry(transaction, registry);
     }
-    return removeToolkit(transaction, registry, logPath);
+    return removeToolkit(registry, indexPath);
 }
 
-bool removeListedFiles(const std::string* logPath)
+bool removeListedFiles(const std::string* indexPath)
 {
-    if (logPath == nullptr)
+    if (indexPath == nullptr)
         return false;
-    const ScopedFile index = openForReading(*logPath);
+    const ScopedFile index = openForReading(*indexPath);
     if (!index)
         return false;
 
@@ -191,6 +163,6 @@ bool removeListedFiles(const std::string* logPath)
         anyListed = true;
     }
     if (anyListed)
-        (void)unlinkPath(*logPath); // best effort
+        (void)unlinkPath(*indexPath); // best effort
     return anyListed;
 }
