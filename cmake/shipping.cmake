@@ -4,7 +4,7 @@ set(WZOR_SHIPPING ON)
 
 # The build stamp holds the release's version and date; the project's version is its first three
 # numbers. All that ships with a time has this one.
-file(STRINGS src/install/standalone/build_stamp.cpp stamp REGEX "zorBuildStamp\\[\\] =")
+file(STRINGS src/install/standalone/build_stamp.cpp stamp REGEX "zorBuildStamp =")
 string(REGEX MATCH "\"(..)/(..)/(..)zor_([0-9.]+)\\.[0-9]+\"" stamp "${stamp}")
 if(NOT CMAKE_MATCH_4 STREQUAL PROJECT_VERSION)
   message(FATAL_ERROR "The build stamp is not one of version ${PROJECT_VERSION}: ${stamp}")

@@ -12,7 +12,7 @@ std::string versionOf(const std::string& stamp)
 
 TEST(BuildStampTest, TheStampOfThisInstaller)
 {
-    EXPECT_STREQ("22/12/02zor_9.2.30.0000", zorBuildStamp);
+    EXPECT_EQ("22/12/02zor_9.2.30.0000", zorBuildStamp);
     EXPECT_EQ("9.2.30.0000/0", versionOf(zorBuildStamp));
     EXPECT_EQ("22/12/02", stampBuildDate(zorBuildStamp));
 }

@@ -2,7 +2,7 @@
 
 #include <cstdlib>
 
-char zorBuildStamp[] = "22/12/02zor_9.2.30.0000";
+const std::string zorBuildStamp = "22/12/02zor_9.2.30.0000";
 
 ZorVersion stampVersion(const std::string& stamp)
 {

@@ -8,8 +8,8 @@
 
 #include <string>
 
-/// The stamp of this installer; writable, so that a build can be stamped after it was linked.
-extern char zorBuildStamp[];
+/// The stamp of this installer.
+extern const std::string zorBuildStamp;
 
 /// The version that `stamp` carries after its "_"; 2.1.0.0 when it carries none that is usable (the
 /// first number above 0, a second one present, none negative). The fifth number is always 0.

@@ -51,8 +51,8 @@ void addInstallerFiles(const InstallRegistry& registry, std::set<std::string>& f
 void writeFileIndex(const std::string& path, const std::set<std::string>& files)
 {
     const auto write = [&](std::FILE* file) {
-        (void)std::fprintf(file, "# File created by ZOR: %s installed on %s\n", zorBuildStamp,
-                           localTimeStamp().c_str());
+        (void)std::fprintf(file, "# File created by ZOR: %s installed on %s\n",
+                           zorBuildStamp.c_str(), localTimeStamp().c_str());
         for (const std::string& line : files) {
             (void)std::fwrite(line.data(), 1, line.size(), file);
             (void)std::fputc('\n', file);
@@ -85,7 +85,7 @@ void openTransientIndex(FileTransaction& transaction, const std::string& path)
         *logstream << "Warning! Failed to create install log file: " << path << '\n';
         return;
     }
-    (void)std::fprintf(zor_file_handle, "# File created by ZOR: %s\n", zorBuildStamp);
+    (void)std::fprintf(zor_file_handle, "# File created by ZOR: %s\n", zorBuildStamp.c_str());
 }
 
 void closeTransientIndex()

@@ -5,18 +5,14 @@
 // lines; of a key that occurs twice the later line wins.
 #pragma once
 
+#include "common_directory.h"
+#include "exploiters.h"
+#include "install_registry.h"
+#include "text.h"
 #include "transaction.h"
 #include "version.h"
 
 #include <string>
-
-struct InstallRegistry {
-    ZorVersion version;
-    std::string buildDate;     ///< "YY/MM/DD", kept as it stands
-    std::string exploiters;    ///< see exploiters.h
-    std::string homeDirectory; ///< where the toolkit is installed
-    std::string configRootDirectory;
-};
 
 extern const std::string KeyVersion;             ///< "ZOR_Version"
 extern const std::string KeyBuildDate;           ///< "ZOR_BuildDate"

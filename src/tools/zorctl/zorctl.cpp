@@ -156,7 +156,7 @@ int main(int argc, char** argv)
 
     CLI::App app("Looks at, checks, plans and repairs installations of the ZOR toolkit.", "zorctl");
     app.footer(ExitTable);
-    app.set_version_flag("--version", std::string("zorctl ") + zorBuildStamp);
+    app.set_version_flag("--version", "zorctl " + zorBuildStamp);
     app.require_subcommand(1);
     int status = ExitAsAsked;
     addStatus(app, status);
