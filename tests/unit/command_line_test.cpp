@@ -90,7 +90,7 @@ TEST_F(CommandLineTest, TakesTheActionAndTheExploiter)
     EXPECT_EQ(0, parse({"r", "ABC"}));
 
     EXPECT_EQ('r', commandLine.action);
-    EXPECT_EQ("ABC", commandLine.exploiter);
+    EXPECT_EQ("ABC", commandLine.request.exploiters);
     EXPECT_EQ("", commandLine.destDir);
     EXPECT_EQ("", commandLine.privatePath);
     EXPECT_EQ(' ', commandLine.privateAction);
@@ -101,9 +101,8 @@ TEST_F(CommandLineTest, KnowsTheVersionAndBuildDateOfThisInstaller)
 {
     EXPECT_EQ(0, parse({"r", "ABC"}));
 
-    EXPECT_EQ("9.2.30.0000", formatVersion(commandLine.installer.version));
-    EXPECT_EQ("22/12/02", commandLine.installer.buildDate);
-    EXPECT_EQ("", commandLine.installer.exploiters);
+    EXPECT_EQ("9.2.30.0000", formatVersion(commandLine.request.version));
+    EXPECT_EQ("22/12/02", commandLine.request.buildDate);
 }
 
 TEST_F(CommandLineTest, AColonInTheExploiterEndsTheRunWithoutTheUsage)

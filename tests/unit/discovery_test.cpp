@@ -20,10 +20,10 @@ protected:
     {
         useCompleteLayoutNames();
         commandLine.action = 'i';
-        commandLine.exploiter = "ABC";
+        commandLine.request.exploiters = "ABC";
         commandLine.destDir = "/opt/elsewhere";
-        commandLine.installer.version = {9, 2, 30, 4, 0};
-        commandLine.installer.buildDate = "22/12/02";
+        commandLine.request.version = {9, 2, 30, 4, 0};
+        commandLine.request.buildDate = "22/12/02";
     }
 
     /// Writes a registry of /opt/corvan/zor with this version and build date.
@@ -252,7 +252,7 @@ TEST_F(DiscoveryTest, ABrokenInstallationIsRepairedAsAnOlderOne)
 
 TEST_F(DiscoveryTest, ALevelOf0IsNotLoweredForARepair)
 {
-    commandLine.installer.version = {9, 2, 30, 0, 0};
+    commandLine.request.version = {9, 2, 30, 0, 0};
     plantRegistry("9.9.9.9999", "22/12/03");
     makeDirectories(Home);
 

@@ -49,7 +49,16 @@ TEST(PathsTest, APathEndsWithASlashWhenItsLastCharacterIsOne)
     EXPECT_FALSE(endsWithSlash(""));
 }
 
-TEST(PathsTest, ABackupLiesBesideItsFile)
+TEST(PathsTest, TheParentIsTheDirectoryThatHoldsThePath)
+{
+    EXPECT_EQ("/a", parentOf("/a/b"));
+    EXPECT_EQ("/a", parentOf("/a/b/"));
+    EXPECT_EQ("/", parentOf("/a"));
+    EXPECT_EQ("/", parentOf("/"));
+    EXPECT_EQ(".", parentOf("a"));
+}
+
+TEST(PathsTest, ABackupIsNextToItsFile)
 {
     EXPECT_EQ("/opt/corvan/zor/bin/trawlhw.bak", backupName("/opt/corvan/zor/bin/trawlhw"));
     EXPECT_EQ("zor.log.bak", backupName("zor.log"));

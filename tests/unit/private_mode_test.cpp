@@ -13,9 +13,9 @@ class PrivateModeTest : public MachineTest {
 protected:
     PrivateModeTest()
     {
-        commandLine.exploiter = "ABC";
+        commandLine.request.exploiters = "ABC";
         commandLine.privatePath = home;
-        commandLine.installer.version = {9, 2, 30, 0, 0};
+        commandLine.request.version = {9, 2, 30, 0, 0};
     }
 
     int perform(char action, int status = -1)

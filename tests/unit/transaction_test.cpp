@@ -1,11 +1,14 @@
 #include "installer_fixtures.h"
 #include "paths.h"
+#include "process_limits.h"
 #include "safe_path.h"
 #include "transaction.h"
 
 #include <gtest/gtest.h>
 
 #include <filesystem>
+#include <string>
+#include <vector>
 
 #include <sys/stat.h>
 #include <unistd.h>
@@ -29,6 +32,39 @@ TEST_F(TransactionTest, RecordAppendsAtTheEnd)
     record(transaction, Created, "/a/b");
 
     EXPECT_EQ("4 /a\n1 /a/b\n2 /a/b\n", journalText(transaction));
+}
+
+TEST_F(TransactionTest, ChangesAreCounted)
+{
+    EXPECT_EQ(0U, changeCount(transaction));
+
+    record(transaction, BackedUp, "/a/b");
+    record(transaction, Created, "/a/b");
+
+    EXPECT_EQ(2U, changeCount(transaction));
+}
+
+TEST_F(TransactionTest, AFileThatFollowsItsBackupReplacedAnother)
+{
+    EXPECT_FALSE(lastFileReplacedAnother(transaction));
+    record(transaction, Created, "/a");
+    EXPECT_FALSE(lastFileReplacedAnother(transaction));
+    record(transaction, BackedUp, "/b");
+    record(transaction, Created, "/b");
+    EXPECT_TRUE(lastFileReplacedAnother(transaction));
+    record(transaction, Created, "/c");
+    EXPECT_FALSE(lastFileReplacedAnother(transaction));
+}
+
+TEST_F(TransactionTest, ChangedDirectoriesComeInTheOrderOfTheChanges)
+{
+    record(transaction, DirectoryCreated, "/a/b");
+    record(transaction, Created, "/a/b/x");
+    record(transaction, Created, "/a/b/y");
+    record(transaction, Created, "/a/z");
+    record(transaction, Created, "relative");
+
+    EXPECT_EQ((std::vector<std::string>{"/a", "/a/b", "/a", "."}), changedDirectories(transaction));
 }
 
 TEST_F(TransactionTest, ATransactionThatIsDroppedLeavesTheDiskAsItIs)
@@ -527,6 +563,105 @@ TEST_F(ClaimTest, ARollbackReplacesAClaimedFileByItsBackup)
 
     EXPECT_EQ("old", readFile(dir / "zor.ini"));
     EXPECT_FALSE(pathExists(dir / "zor.ini.bak"));
+}
+
+using BackupFileTest = InstallerTest;
+
+TEST_F(BackupFileTest, MovesTheFileToItsBackupNameAndRecordsThat)
+{
+    writeFile(dir / "file", "old");
+
+    EXPECT_EQ(0, backupFile(transaction, dir / "file"));
+
+    EXPECT_FALSE(pathExists(dir / "file"));
+    EXPECT_EQ("old", readFile(dir / "file.bak"));
+    EXPECT_EQ("1 " + dir / "file" + "\n", journalText(transaction));
+}
+
+TEST_F(BackupFileTest, AMissingFileNeedsNoBackup)
+{
+    EXPECT_EQ(0, backupFile(transaction, dir / "missing"));
+
+    EXPECT_TRUE(transaction.journal.empty());
+    EXPECT_TRUE(treeOf(dir.path()).empty());
+}
+
+TEST_F(BackupFileTest, AnOlderBackupOfAMissingFileStays)
+{
+    writeFile(dir / "file.bak", "of an older run");
+
+    EXPECT_EQ(0, backupFile(transaction, dir / "file"));
+
+    EXPECT_EQ("of an older run", readFile(dir / "file.bak"));
+}
+
+TEST_F(BackupFileTest, DoesNothingInATransactionWithoutBackups)
+{
+    transaction.backup = false;
+    writeFile(dir / "file", "old");
+    writeFile(dir / "file.bak", "older");
+
+    EXPECT_EQ(0, backupFile(transaction, dir / "file"));
+
+    EXPECT_EQ("old", readFile(dir / "file"));
+    EXPECT_EQ("older", readFile(dir / "file.bak"));
+    EXPECT_TRUE(transaction.journal.empty());
+}
+
+TEST_F(BackupFileTest, ReplacesAnOlderBackup)
+{
+    writeFile(dir / "file", "old");
+    writeFile(dir / "file.bak", "older");
+
+    EXPECT_EQ(0, backupFile(transaction, dir / "file"));
+
+    EXPECT_EQ("old", readFile(dir / "file.bak"));
+    EXPECT_FALSE(pathExists(dir / "file"));
+}
+
+TEST_F(BackupFileTest, AnOlderBackupThatIsTheSameFileDoesNotKeepItInPlace)
+{
+    const std::string path = dir / "file";
+    writeFile(path, "old");
+    ASSERT_EQ(0, link(path.c_str(), (path + ".bak").c_str()));
+
+    EXPECT_EQ(0, backupFile(transaction, path));
+
+    EXPECT_FALSE(pathExists(path));
+    EXPECT_EQ("old", readFile(path + ".bak"));
+}
+
+TEST_F(BackupFileTest, AFileThatCannotBeMovedIsCode9AndHasNoEntry)
+{
+    writeFile(dir / "file", "old");
+    makeDirectories(dir / "file.bak");
+
+    EXPECT_EQ(9, backupFile(transaction, dir / "file"));
+
+    EXPECT_EQ("old", readFile(dir / "file"));
+    EXPECT_TRUE(transaction.journal.empty());
+}
+
+TEST_F(BackupFileTest, ADirectoryThatCannotBeWrittenIsCode9)
+{
+    makeDirectories(dir / "closed");
+    writeFile(dir / "closed/file", "old");
+    ASSERT_EQ(0, chmod((dir / "closed").c_str(), 0555));
+    const OrdinaryRights rights;
+
+    EXPECT_EQ(9, backupFile(transaction, dir / "closed/file"));
+
+    EXPECT_EQ("old", readFile(dir / "closed/file"));
+}
+
+TEST_F(BackupFileTest, ALinkThatLeadsNowhereCountsAsMissing)
+{
+    std::filesystem::create_symlink("nowhere", dir / "link");
+
+    EXPECT_EQ(0, backupFile(transaction, dir / "link"));
+
+    EXPECT_TRUE(std::filesystem::is_symlink(dir / "link"));
+    EXPECT_TRUE(transaction.journal.empty());
 }
 
 } // namespace

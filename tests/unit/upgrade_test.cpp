@@ -36,10 +36,10 @@ protected:
         installed.exploiters = "ABC:";
         installed.homeDirectory = Home;
         installed.configRootDirectory = Home;
-        package.version = {9, 2, 30, 0, 0};
-        package.buildDate = "22/12/02";
-        package.exploiters = "XYZ";
-        package.homeDirectory = "/the/home/of/the/request/is/not/used";
+        request.version = {9, 2, 30, 0, 0};
+        request.buildDate = "22/12/02";
+        request.exploiters = "XYZ";
+        request.homeDirectory = "/the/home/of/the/request/is/not/used";
     }
 
     void SetUp() override
@@ -56,8 +56,9 @@ protected:
     int upgrade(bool disable = true, bool useCustomPath = false)
     {
         usePackage(dir / "package.spb", toolkit);
-        return upgradeInstall(transaction, installed, package, &Index, disable, useCustomPath,
-                              dir / "traces");
+        const bool deploys = isUpgradeNeeded(installed, request);
+        return upgradeInstall(transaction, installed, request, &Index, deploys, disable,
+                              useCustomPath, dir / "traces");
     }
 
     [[nodiscard]] bool logHolds(const std::string& text) const
@@ -71,7 +72,7 @@ protected:
     }
 
     InstallRegistry installed;
-    InstallRegistry package;
+    InstallRegistry request;
     PackageFiles toolkit = toolkitFiles(dir / "calls");
 };
 
@@ -188,7 +189,7 @@ TEST_F(RegistrationOnlyTest, AddsTheExploiterAndSavesTheRegistry)
 
 TEST_F(RegistrationOnlyTest, AKnownExploiterChangesNothing)
 {
-    package.exploiters = "ABC";
+    request.exploiters = "ABC";
 
     EXPECT_EQ(0, upgrade());
 
@@ -210,7 +211,7 @@ TEST_F(RegistrationOnlyTest, ASkippedRegistrationIsLoggedAndChangesNothing)
 TEST_F(RegistrationOnlyTest, TheSkippedRegistrationOfAKnownExploiterIsNotLogged)
 {
     skipExploiterRegistration = true;
-    package.exploiters = "ABC";
+    request.exploiters = "ABC";
 
     EXPECT_EQ(0, upgrade());
 
@@ -220,7 +221,7 @@ TEST_F(RegistrationOnlyTest, TheSkippedRegistrationOfAKnownExploiterIsNotLogged)
 TEST_F(RegistrationOnlyTest, ALaterBuildDateOfThePackageIsStored)
 {
     installed.buildDate = "22/12/01";
-    package.exploiters = "ABC";
+    request.exploiters = "ABC";
 
     EXPECT_EQ(0, upgrade());
 
@@ -314,8 +315,8 @@ TEST_F(DeploymentTest, ABuildDateThatIsNotLaterIsKeptWithTheNewVersion)
 
 TEST_F(DeploymentTest, SavesTheRegistryAlsoForAKnownExploiter)
 {
-    package.exploiters = "ABC";
-    package.buildDate = installed.buildDate;
+    request.exploiters = "ABC";
+    request.buildDate = installed.buildDate;
 
     EXPECT_EQ(0, upgrade());
 
@@ -447,7 +448,7 @@ TEST_F(DeploymentTest, WorksWithoutAnIndex)
     usePackage(dir / "package.spb", toolkit);
     createSingleUserModeFile = true;
 
-    EXPECT_EQ(0, upgradeInstall(transaction, installed, package, nullptr, true, false, ""));
+    EXPECT_EQ(0, upgradeInstall(transaction, installed, request, nullptr, true, true, false, ""));
 
     EXPECT_FALSE(pathExists(Index));
     EXPECT_EQ("hardware scanner\n", readFile(Home + "/bin/trawlhw"));

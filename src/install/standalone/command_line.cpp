@@ -183,9 +183,11 @@ private:
             custom_log_path_available = true;
             *logstream << "ZOR custom trace path: " << value << '\n';
             return 0;
-        default: // 'o'
+        case 'o':
             redirectLog(value);
             return 0;
+        default: // rejected by takeOptionWithArgument()
+            return 1;
         }
     }
 
@@ -239,11 +241,12 @@ int parseCommandLine(int argc, char** argv, CommandLine& commandLine)
         return printUsage();
     }
     commandLine.action = action[0];
-    commandLine.exploiter = argv[2];
-    commandLine.installer.version = stampVersion(zorBuildStamp);
-    commandLine.installer.buildDate = stampBuildDate(zorBuildStamp);
+    InstallRegistry& request = commandLine.request;
+    request.exploiters = argv[2];
+    request.version = stampVersion(zorBuildStamp);
+    request.buildDate = stampBuildDate(zorBuildStamp);
 
-    if (commandLine.exploiter.find(':') != std::string::npos) {
+    if (request.exploiters.find(':') != std::string::npos) {
         std::cerr << "Exploiter name must not contain ':'\n";
         return 1;
     }
@@ -264,16 +267,9 @@ int fixDestination(CommandLine& commandLine, const std::string& defaultDir)
     }
     if (destDir.back() == '/')
         destDir.pop_back();
+    commandLine.request.homeDirectory = destDir;
+    commandLine.request.configRootDirectory = destDir;
     return 0;
-}
-
-InstallRegistry requestOf(const CommandLine& commandLine)
-{
-    InstallRegistry request = commandLine.installer;
-    request.exploiters = commandLine.exploiter;
-    request.homeDirectory = commandLine.destDir;
-    request.configRootDirectory = commandLine.destDir;
-    return request;
 }
 
 int printUsage()

@@ -10,12 +10,14 @@
 
 /// What one run was asked for, besides the settings.
 struct CommandLine {
-    char action = ' '; ///< 'i' or 'r'
-    std::string exploiter;
-    std::string destDir;       ///< of the last "-d"; empty for the default
-    std::string privatePath;   ///< of the last "-d", as it was given
-    char privateAction = ' ';  ///< the action while "-p" was given
-    InstallRegistry installer; ///< version and build date of this installer, nothing else
+    char action = ' ';        ///< 'i' or 'r'
+    std::string destDir;      ///< of the last "-d"; fixDestination() completes it
+    std::string privatePath;  ///< of the last "-d", as it was given
+    char privateAction = ' '; ///< the action if "-p" was given
+
+    /// The installer's own record: its version and build date, the calling exploiter's identifier
+    /// without a colon and, after fixDestination(), the destination.
+    InstallRegistry request;
 };
 
 /// Parses the arguments into `commandLine` and the process-wide settings.
@@ -27,9 +29,6 @@ struct CommandLine {
 /// Fixes the destination: `defaultDir` unless the command line names another, without a final
 /// slash. Returns 0, or 1 when there is none: that and the usage text were printed.
 [[nodiscard]] int fixDestination(CommandLine& commandLine, const std::string& defaultDir);
-
-/// The installer's own record: what it brings, for whom and whereto.
-[[nodiscard]] InstallRegistry requestOf(const CommandLine& commandLine);
 
 /// Prints the usage text on standard output and returns 1, the exit status that goes with it.
 int printUsage();

@@ -113,7 +113,7 @@ Discovery discoverInstallation(const CommandLine& commandLine, bool readOnly)
     found.installAction = decideAction(commandLine.action);
 
     if (found.status == ScannerControlBroken && found.installAction) {
-        forceUpdate(found.registry, commandLine.installer.version);
+        forceUpdate(found.registry, commandLine.request.version);
         found.registryFound = true;
     }
 
@@ -121,7 +121,7 @@ Discovery discoverInstallation(const CommandLine& commandLine, bool readOnly)
         found.registryFound ? found.registry.homeDirectory : commandLine.destDir;
     found.homeExists = pathExists(home);
     found.upgradeNeeded =
-        found.registryFound && isUpgradeNeeded(found.registry, commandLine.installer);
+        found.registryFound && isUpgradeNeeded(found.registry, commandLine.request);
 
     found.indexPath = fileIndexPath(home);
     *logstream << "Log file is: " << found.indexPath << '\n';

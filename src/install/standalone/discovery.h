@@ -14,7 +14,7 @@ struct Discovery {
     bool homeExists = false;    ///< the home directory, before this run
     bool upgradeNeeded = false; ///< the registered installation is not newer than this installer
     bool installAction = false; ///< install or upgrade; otherwise remove
-    std::string indexPath;      ///< the index of installed files
+    std::string indexPath;      ///< the file index
     std::string currentZorHome;
     std::string currentCfgHome;
 };

@@ -2,6 +2,7 @@
 
 #include "file_codes.h"
 #include "file_writing.h"
+#include "paths.h"
 #include "safe_path.h"
 
 #include <algorithm>
@@ -13,15 +14,6 @@
 #include <unistd.h>
 
 namespace {
-
-/// The directory that holds `path`.
-std::string parentOf(const std::string& path)
-{
-    const std::size_t slash = path.find_last_of('/', path.find_last_not_of('/'));
-    if (slash == std::string::npos)
-        return ".";
-    return path.substr(0, std::max<std::size_t>(slash, 1));
-}
 
 /// Opens the directory `path`, or the nearest existing one above it.
 ScopedFd openNearest(std::string path)
@@ -74,15 +66,10 @@ int FileSystemSync::sync() const
     return code;
 }
 
-int syncDirectories(const FileTransaction& transaction)
+int syncDirectories(const std::vector<std::string>& directories)
 {
-    std::string last;
     int code = FileOk;
-    for (const JournalEntry& entry : transaction.journal) {
-        const std::string directory = parentOf(entry.path);
-        if (directory == last)
-            continue;
-        last = directory;
+    for (const std::string& directory : directories) {
         const ScopedFd fd = openPath(directory, O_RDONLY | O_DIRECTORY);
         if (fd.isOpen() && code == FileOk)
             code = codeOf(syncFile(fd.get()));

@@ -7,7 +7,6 @@
 #pragma once
 
 #include "scoped.h"
-#include "transaction.h"
 
 #include <string>
 #include <vector>
@@ -28,6 +27,6 @@ private:
     std::vector<ScopedFd> fileSystems_;
 };
 
-/// Writes the names in all directories in which `transaction` changed something to the disk; the
-/// files' content must be there. Returns 0 or CannotWrite (5) as FileSystemSync::sync().
-[[nodiscard]] int syncDirectories(const FileTransaction& transaction);
+/// Writes the names in `directories` to the disk; the content of the files must be there already.
+/// Returns 0 or CannotWrite (5) as FileSystemSync::sync().
+[[nodiscard]] int syncDirectories(const std::vector<std::string>& directories);

@@ -1,6 +1,5 @@
 #include "entry_extraction.h"
 
-#include "file_operations.h"
 #include "file_writing.h"
 #include "safe_path.h"
 #include "sound_entry.h"
@@ -19,13 +18,6 @@ constexpr mode_t NewFileMode = 0666;    // what a file gets that no mode is set 
 constexpr mode_t UnfinishedMode = 0600; // nobody else can open the file while it is being written
 constexpr int ExtractBlockSize = 8192;
 
-/// True when the last file of the journal took the place of another.
-bool lastReplacedAnother(const FileTransaction& transaction)
-{
-    const auto& journal = transaction.journal;
-    return journal.size() >= 2 && journal[journal.size() - 2].kind == BackedUp;
-}
-
 /// Opens `destination` for a file of `package`, its old content backed up. Returns 0, or the code
 /// of what failed.
 ///
@@ -35,7 +27,7 @@ bool lastReplacedAnother(const FileTransaction& transaction)
 int openDestination(FileTransaction& transaction, OpenPackage& package,
                     const std::string& destination, WritableFile& file)
 {
-    if (!lastReplacedAnother(transaction) &&
+    if (!lastFileReplacedAnother(transaction) &&
         openForWriting(destination, Existing::Refuse, UnfinishedMode, file) == 0)
         return FileOk;
 

@@ -30,7 +30,7 @@ void trace(bool debug, const char* what, const std::string& value)
 
 /// Extracts one entry to `destination`; a trailing slash means a directory.
 int extractEntry(FileTransaction& transaction, OpenPackage& package, const ZipEntry& entry,
-                 const std::string& destination, mode_t mode, std::FILE* logFile, bool debug)
+                 const std::string& destination, mode_t mode, std::FILE* index, bool debug)
 {
     if (endsWithSlash(destination)) {
         trace(debug, "createPath: ", destination);
@@ -39,15 +39,15 @@ int extractEntry(FileTransaction& transaction, OpenPackage& package, const ZipEn
 
     trace(debug, "extractFile: ", destination);
     const int code = extractOpenFile(transaction, package, &entry, destination, mode);
-    if (logFile != nullptr) // also after a failure: part of the file may lie there
-        (void)std::fprintf(logFile, "%s\n", destination.c_str());
+    if (index != nullptr) // also after a failure: part of the file may lie there
+        (void)std::fprintf(index, "%s\n", destination.c_str());
     return code;
 }
 
 /// extractEntries() of an open package.
 int extractMatching(FileTransaction& transaction, OpenPackage& package,
                     const std::string& srcPrefix, const std::string& dstDir, mode_t mode,
-                    const std::string* skipList, std::FILE* logFile, bool debug)
+                    const std::string* skipList, std::FILE* index, bool debug)
 {
     trace(debug, "Src path: ", srcPrefix);
     trace(debug, "Dst path: ", dstDir);
@@ -73,8 +73,7 @@ int extractMatching(FileTransaction& transaction, OpenPackage& package,
 
         if (isInterrupted())
             return RunInterrupted;
-        const int code =
-            extractEntry(transaction, package, entry, destination, mode, logFile, debug);
+        const int code = extractEntry(transaction, package, entry, destination, mode, index, debug);
         if (code != FileOk) {
             trace(debug, "createPath or extractFile failed", "");
             return code;
@@ -139,7 +138,7 @@ std::vector<ExtractionStep> extractionSteps(bool freshInstall)
 }
 
 int extractPackage(const std::string& spbPath, FileTransaction& transaction,
-                   InstallRegistry& installation, bool freshInstall, const std::string* logPath)
+                   InstallRegistry& installation, bool freshInstall, const std::string* indexPath)
 {
     *logstream << "Starting file extraction...\n" << std::flush; // an entry may end the process
     auto archive = std::make_unique<const ZipFile>(spbPath.c_str());
@@ -149,41 +148,41 @@ int extractPackage(const std::string& spbPath, FileTransaction& transaction,
     }
 
     std::set<std::string> files;
-    if (logPath != nullptr) {
-        readFileIndex(*logPath, files); // of earlier installations
-        openTransientIndex(transaction, *logPath);
+    if (indexPath != nullptr) {
+        readFileIndex(*indexPath, files); // of earlier installations
+        openTransientIndex(transaction, *indexPath);
     }
 
     const int code = extractDirs(transaction, *archive, installation.homeDirectory, freshInstall);
 
     archive.reset(); // a long list of entries makes room for as long an index
     closeTransientIndex();
-    if (logPath != nullptr) {
+    if (indexPath != nullptr) {
         const ScopedUmask mask(globalFilesUmask);
-        readFileIndex(*logPath, files);
+        readFileIndex(*indexPath, files);
         addInstallerFiles(installation, files);
-        writeFileIndex(*logPath, files);
+        writeFileIndex(*indexPath, files);
     }
     if (code != FileOk) {
         *logstream << "File extraction failed, error = " << code << " ("
                    << fileErrorText(static_cast<unsigned>(code)) << ")\n";
-        if (logPath != nullptr)
-            (void)unlinkPath(*logPath); // it lists what the rollback takes away
+        if (indexPath != nullptr)
+            (void)unlinkPath(*indexPath); // it lists what the rollback takes away
     }
     return code;
 }
 
 int extractDir(FileTransaction& transaction, const ZipFile& archive, const std::string& targetDir,
-               const std::string& subdir, mode_t mode, std::FILE* logFile, bool debug)
+               const std::string& subdir, mode_t mode, std::FILE* index, bool debug)
 {
     return extractEntries(transaction, archive, sourcePrefix(subdir), joinPath(targetDir, subdir),
-                          mode, nullptr, logFile, debug);
+                          mode, nullptr, index, debug);
 }
 
 int extractEntries(FileTransaction& transaction, const ZipFile& archive,
                    const std::string& srcPrefix, const std::string& dstDir, mode_t mode,
-                   const std::string* skipList, std::FILE* logFile, bool debug)
+                   const std::string* skipList, std::FILE* index, bool debug)
 {
     OpenPackage package(archive);
-    return extractMatching(transaction, package, srcPrefix, dstDir, mode, skipList, logFile, debug);
+    return extractMatching(transaction, package, srcPrefix, dstDir, mode, skipList, index, debug);
 }

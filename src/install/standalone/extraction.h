@@ -34,28 +34,28 @@ struct ExtractionStep {
 [[nodiscard]] std::string destinationName(const std::string& dstDir, const std::string& rest);
 
 /// Extracts the whole package at `spbPath` into the home of `installation`, journalled, and writes
-/// the index of installed files at `logPath` (null: none).
+/// the file index at `indexPath` (null: none).
 ///
 /// Unless `freshInstall`, the installed "config/Zor.properties" is left alone. Returns 0, 1 when
 /// there is no package or nothing in it, or the first failing code of a file operation; what was
 /// extracted by then is the rollback's, the index is deleted. Logs its steps and failures.
 [[nodiscard]] int extractPackage(const std::string& spbPath, FileTransaction& transaction,
                                  InstallRegistry& installation, bool freshInstall,
-                                 const std::string* logPath);
+                                 const std::string* indexPath);
 
 /// extractEntries() of the package directory `subdir` into the same one of `targetDir`, without a
 /// skip list.
 [[nodiscard]] int extractDir(FileTransaction& transaction, const ZipFile& archive,
                              const std::string& targetDir, const std::string& subdir, mode_t mode,
-                             std::FILE* logFile, bool debug);
+                             std::FILE* index, bool debug);
 
 /// Extracts every entry whose name begins with `srcPrefix` into `dstDir`: a name that ends with "/"
 /// as a directory, others as files, all with `mode`.
 ///
 /// Entries named in the name list `skipList` (null: none) are passed over. Every extracted file is
-/// written to `logFile` (null: none), `debug` traces on standard output. Returns 0 or the first
+/// written to `index` (null: none), `debug` traces on standard output. Returns 0 or the first
 /// failing code of createPath() or extractFile().
 [[nodiscard]] int extractEntries(FileTransaction& transaction, const ZipFile& archive,
                                  const std::string& srcPrefix, const std::string& dstDir,
-                                 mode_t mode, const std::string* skipList, std::FILE* logFile,
+                                 mode_t mode, const std::string* skipList, std::FILE* index,
                                  bool debug);

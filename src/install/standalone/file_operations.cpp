@@ -2,7 +2,6 @@
 
 #include "file_replacement.h"
 #include "file_writing.h"
-#include "paths.h"
 #include "safe_path.h"
 #include "scoped.h"
 
@@ -73,17 +72,6 @@ int copyForRestoring(const std::string& source, const std::string& destination)
     return error == 0 ? closeWritten(out.fd) : writeErrorCode(error);
 }
 
-/// True if what is in the way at `place` must be moved: anything but a link of ours that leads
-/// nowhere. The latter stays, and what it points to is created.
-bool isInTheWay(const Place& place, const std::string& path)
-{
-    struct stat status = {};
-    if (fstatat(place.fd(), place.name.c_str(), &status, AT_SYMLINK_NOFOLLOW) == 0 &&
-        (!S_ISLNK(status.st_mode) || !isTrustedOwner(status.st_uid)))
-        return true;
-    return !pathIsMissing(path);
-}
-
 int createIfMissing(FileTransaction& transaction, const std::string& path, mode_t mode)
 {
     if (path.empty() || pathExists(path))
@@ -102,30 +90,6 @@ int copyFile(const std::string& source, const std::string& destination)
     WritableFile out;
     const int code = openCopy(source, destination, in, out);
     return code != FileOk ? code : copyAndClose(in, out);
-}
-
-int backupFile(FileTransaction& transaction, const std::string& path)
-{
-    if (!transaction.backup)
-        return FileOk;
-    Place place;
-    if (findPlace(path, LastLink::Keep, place) != 0)
-        return pathIsMissing(path) ? FileOk : CannotRename;
-    if (!isInTheWay(place, path))
-        return FileOk;
-
-    const char* const name = place.name.c_str();
-    const std::string backup = backupName(place.name);
-    if (renameat2(place.fd(), name, place.fd(), backup.c_str(), RENAME_NOREPLACE) != 0) {
-        // A backup of an older run. If it cannot be deleted, the rename fails.
-        (void)unlinkat(place.fd(), backup.c_str(), 0);
-        if (renameat(place.fd(), name, place.fd(), backup.c_str()) != 0)
-            return CannotRename;
-    }
-
-    // Recorded only now: an entry without a backup would have nothing to restore.
-    record(transaction, BackedUp, path);
-    return FileOk;
 }
 
 int backupCopy(FileTransaction& transaction, const std::string& path)

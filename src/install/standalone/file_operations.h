@@ -6,7 +6,10 @@
 // Directories and files get their mode under the process umask; the caller sets that.
 #pragma once
 
+#include "entry_extraction.h"
 #include "file_codes.h"
+#include "paths.h"
+#include "text.h"
 #include "transaction.h"
 
 #include <string>
@@ -18,13 +21,6 @@
 /// Returns 0, CannotOpenForReading (1, the destination is not touched), CannotOpenForWriting (2),
 /// CannotRead (4), or the code of a failed write (5, 6, 7). A failed copy leaves what was written.
 [[nodiscard]] int copyFile(const std::string& source, const std::string& destination);
-
-/// Moves what is at `path` to its backup name and journals that; an older backup is deleted.
-///
-/// Does nothing if the transaction keeps no backups or nothing at `path` can be reached
-/// (pathIsMissing()), except that a stranger's link is moved wherever it leads. Afterwards the name
-/// is free, or is a link of ours that leads nowhere. Returns 0 or CannotRename (9).
-[[nodiscard]] int backupFile(FileTransaction& transaction, const std::string& path);
 
 /// Copies the file at `path` to its backup name, for a caller that replaces it next: journals the
 /// backup and then `path` as created. The copy has owner, group, mode and attributes of the

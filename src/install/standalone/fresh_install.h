@@ -31,7 +31,7 @@ void writeInstallType(const std::string& home, const std::string* indexPath);
 /// Installs `spbPackage` into the home of `registry`, journalled.
 ///
 /// `registry` holds the calling exploiter's identifier without its colon; with `writeRegistry` the
-/// list is completed and the registry saved. `indexPath` is the index of installed files, null for
+/// list is completed and the registry saved. `indexPath` is the file index, null for
 /// none. With `useCustomPath` traces go to `customPath`. Returns 0, or the first code met: of a
 /// file operation, an `errno` of a property file, -1 when "install" cannot be made, or the status
 /// of the scanner control program. The caller commits or rolls back.

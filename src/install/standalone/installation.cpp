@@ -21,7 +21,8 @@ constexpr mode_t IndexMode = 0644;
 /// Syncs what the run wrote: after `deployment`, whole file systems.
 int makeDurable(const FileTransaction& transaction, const FileSystemSync* deployment)
 {
-    const int code = deployment != nullptr ? deployment->sync() : syncDirectories(transaction);
+    const int code = deployment != nullptr ? deployment->sync()
+                                           : syncDirectories(changedDirectories(transaction));
     if (code != FileOk)
         *logstream << "*** Error: could not write the installation to disk. Error = " << code
                    << '\n';
@@ -42,7 +43,7 @@ std::vector<std::string> writtenDirectories(const std::string& home, bool useCus
 
 /// Runs the fresh installation or the upgrade, which a signal can stop until all its steps are
 /// made.
-int runProcedure(bool upgrade, FileTransaction& transaction, InstallRegistry& registry,
+int runProcedure(Procedure procedure, FileTransaction& transaction, InstallRegistry& registry,
                  InstallRegistry& request, const std::string& indexPath, bool flag,
                  bool useCustomPath, const std::string& customPath)
 {
@@ -50,9 +51,10 @@ int runProcedure(bool upgrade, FileTransaction& transaction, InstallRegistry& re
     if (isInterrupted())
         return RunInterrupted;
     const int code =
-        upgrade ? upgradeInstall(transaction, registry, request, &indexPath, flag, useCustomPath,
-                                 customPath)
-                : freshInstall(transaction, request, &indexPath, flag, useCustomPath, customPath);
+        procedure == Procedure::FreshInstall
+            ? freshInstall(transaction, request, &indexPath, flag, useCustomPath, customPath)
+            : upgradeInstall(transaction, registry, request, &indexPath,
+                             procedure == Procedure::Upgrade, flag, useCustomPath, customPath);
     (void)setFileMode(indexPath, IndexMode); // also of a failed run; may be absent
     return code == FileOk && isInterrupted() ? RunInterrupted : code;
 }
@@ -63,13 +65,26 @@ int installWithTransaction(bool upgrade, FileTransaction& transaction, InstallRe
                            InstallRegistry& request, const std::string& indexPath, bool flag,
                            bool useCustomPath, const std::string& customPath)
 {
-    std::optional<FileSystemSync> deployment;
-    if (!upgrade || isUpgradeNeeded(registry, request))
-        deployment.emplace(writtenDirectories(
-            upgrade ? registry.homeDirectory : request.homeDirectory, useCustomPath, customPath));
+    Procedure procedure = Procedure::FreshInstall;
+    if (upgrade)
+        procedure =
+            isUpgradeNeeded(registry, request) ? Procedure::Upgrade : Procedure::Registration;
+    return installWithTransaction(procedure, transaction, registry, request, indexPath, flag,
+                                  useCustomPath, customPath);
+}
 
-    int code = runProcedure(upgrade, transaction, registry, request, indexPath, flag, useCustomPath,
-                            customPath);
+int installWithTransaction(Procedure procedure, FileTransaction& transaction,
+                           InstallRegistry& registry, InstallRegistry& request,
+                           const std::string& indexPath, bool flag, bool useCustomPath,
+                           const std::string& customPath)
+{
+    const InstallRegistry& target = procedure == Procedure::FreshInstall ? request : registry;
+    std::optional<FileSystemSync> deployment;
+    if (procedure != Procedure::Registration)
+        deployment.emplace(writtenDirectories(target.homeDirectory, useCustomPath, customPath));
+
+    int code = runProcedure(procedure, transaction, registry, request, indexPath, flag,
+                            useCustomPath, customPath);
     if (code == FileOk)
         code = makeDurable(transaction, deployment ? &*deployment : nullptr);
 

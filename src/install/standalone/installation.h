@@ -6,13 +6,26 @@
 struct FileTransaction;
 struct InstallRegistry;
 
-/// Runs the upgrade of the registered installation `registry`, or the fresh installation of
-/// `request`, the installer's own record; then commits, or, on a failure and unless `norollback`,
-/// rolls back. Logs which.
+/// What is done to install a package.
+enum class Procedure {
+    FreshInstall,
+    Upgrade,      ///< of an installation that is not newer: its files are replaced
+    Registration, ///< an upgrade of a newer installation: only registers the exploiter
+};
+
+/// Installs as `request`, the installer's own record, or upgrades the registered installation
+/// `registry`; then commits or, on a failure and unless `norollback`, rolls back. Logs which.
 ///
-/// `indexPath` is the index of installed files; it is made readable for everybody. `flag` asks the
-/// fresh installation to write the registry and the upgrade to disable the scanners while it runs.
-/// Returns the procedure's result.
+/// `indexPath` is the file index; it is made readable for everybody. `flag` makes the fresh
+/// installation write the registry, and the upgrade disable the scanners while it runs. Returns the
+/// procedure's result.
+[[nodiscard]] int installWithTransaction(Procedure procedure, FileTransaction& transaction,
+                                         InstallRegistry& registry, InstallRegistry& request,
+                                         const std::string& indexPath, bool flag,
+                                         bool useCustomPath, const std::string& customPath);
+
+/// The same for callers that have not chosen a procedure: an upgrade if `upgrade`, which replaces
+/// the files if isUpgradeNeeded(), otherwise a fresh installation. No flow calls it.
 [[nodiscard]] int installWithTransaction(bool upgrade, FileTransaction& transaction,
                                          InstallRegistry& registry, InstallRegistry& request,
                                          const std::string& indexPath, bool flag,

@@ -5,7 +5,7 @@
 #include <string_view>
 
 /// Ends the name of a backup: "/opt/x" is kept as "/opt/x.bak". One generation only.
-inline constexpr std::string_view BackupSuffix = ".bak";
+inline const std::string BackupSuffix = ".bak";
 
 /// `directory`, a "/" unless it already ends with one, `name`.
 [[nodiscard]] std::string joinPath(const std::string& directory, std::string_view name);
@@ -15,6 +15,9 @@ inline constexpr std::string_view BackupSuffix = ".bak";
 
 /// True when `path` ends with "/".
 [[nodiscard]] bool endsWithSlash(const std::string& path);
+
+/// The directory that holds `path`: "/a" for "/a/b" and "/a/b/", "." for "b".
+[[nodiscard]] std::string parentOf(const std::string& path);
 
 /// `path` followed by BackupSuffix.
 [[nodiscard]] std::string backupName(const std::string& path);

@@ -88,12 +88,12 @@ int parseRegistry(const std::string& path, InstallRegistry* registry)
     return complete && std::ferror(file.get()) == 0 ? RegistryOk : RegistryIncomplete;
 }
 
-bool isUpgradeNeeded(const InstallRegistry& installed, const InstallRegistry& package)
+bool isUpgradeNeeded(const InstallRegistry& installed, const InstallRegistry& request)
 {
-    const int difference = compareVersions(installed.version, package.version);
+    const int difference = compareVersions(installed.version, request.version);
     if (difference != 0)
         return difference < 0;
-    return buildDateNumber(package.buildDate) >= buildDateNumber(installed.buildDate);
+    return buildDateNumber(request.buildDate) >= buildDateNumber(installed.buildDate);
 }
 
 int writeRegistry(FileTransaction& transaction, const std::string& path,

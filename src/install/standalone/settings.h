@@ -75,5 +75,5 @@ inline const std::string ZOR_FILE_INDEX = "ZOR_files";
 /// used.
 void completeLayoutNames();
 
-/// The index of installed files while an extraction writes it; null at all other times.
+/// The file index while an extraction writes it; null at all other times.
 extern std::FILE* zor_file_handle;

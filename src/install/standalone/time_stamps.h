@@ -1,6 +1,6 @@
 // Times as texts.
 //
-// Only localTimeStamp() is used by the installer itself: it heads the index of installed files. The
+// Only localTimeStamp() is used by the installer itself: it heads the file index. The
 // others complete the set. All of them give texts in the "C" locale.
 #pragma once
 

@@ -9,6 +9,10 @@
 
 #include <cstdio>
 
+#include <fcntl.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
 namespace {
 
 char letterOf(int kind)
@@ -38,6 +42,17 @@ int kindOf(char letter)
     default:
         return 0;
     }
+}
+
+/// True if what is in the way at `place` must be moved: anything but a link of ours that leads
+/// nowhere. The latter stays, and what it points to is created.
+bool isInTheWay(const Place& place, const std::string& path)
+{
+    struct stat status = {};
+    if (fstatat(place.fd(), place.name.c_str(), &status, AT_SYMLINK_NOFOLLOW) == 0 &&
+        (!S_ISLNK(status.st_mode) || !isTrustedOwner(status.st_uid)))
+        return true;
+    return !pathIsMissing(path);
 }
 
 /// True unless `entry` is claimed and another run has put a file of its own at its path.
@@ -92,9 +107,50 @@ void claim(FileTransaction& transaction, const std::string& path, const FileIden
     }
 }
 
+int backupFile(FileTransaction& transaction, const std::string& path)
+{
+    if (!transaction.backup)
+        return FileOk;
+    Place place;
+    if (findPlace(path, LastLink::Keep, place) != 0)
+        return pathIsMissing(path) ? FileOk : CannotRename;
+    if (!isInTheWay(place, path))
+        return FileOk;
+
+    const char* const name = place.name.c_str();
+    const std::string backup = backupName(place.name);
+    if (renameat2(place.fd(), name, place.fd(), backup.c_str(), RENAME_NOREPLACE) != 0) {
+        // A backup of an older run. If it cannot be deleted, the rename fails.
+        (void)unlinkat(place.fd(), backup.c_str(), 0);
+        if (renameat(place.fd(), name, place.fd(), backup.c_str()) != 0)
+            return CannotRename;
+    }
+
+    // Recorded only now: an entry without a backup would have nothing to restore.
+    record(transaction, BackedUp, path);
+    return FileOk;
+}
+
 std::size_t changeCount(const FileTransaction& transaction)
 {
     return transaction.journal.size();
+}
+
+bool lastFileReplacedAnother(const FileTransaction& transaction)
+{
+    const auto& journal = transaction.journal;
+    return journal.size() >= 2 && journal[journal.size() - 2].kind == BackedUp;
+}
+
+std::vector<std::string> changedDirectories(const FileTransaction& transaction)
+{
+    std::vector<std::string> directories;
+    for (const JournalEntry& entry : transaction.journal) {
+        std::string directory = parentOf(entry.path);
+        if (directories.empty() || directories.back() != directory)
+            directories.push_back(std::move(directory));
+    }
+    return directories;
 }
 
 int commit(FileTransaction& transaction)
@@ -170,6 +226,6 @@ int substituteVariables(const FileTransaction& transaction, std::string& text)
 {
     int count = 0;
     for (const auto& [name, value] : transaction.variables)
-        count += replaceEach(text, std::string(VariablePrefix) + name, value);
+        count += replaceEach(text, VariablePrefix + name, value);
     return count;
 }

@@ -11,7 +11,6 @@
 #include <cstddef>
 #include <optional>
 #include <string>
-#include <string_view>
 #include <utility>
 #include <vector>
 
@@ -39,7 +38,7 @@ struct FileTransaction {
 };
 
 /// Stands before the name of a variable in a text.
-inline constexpr std::string_view VariablePrefix = "$";
+inline const std::string VariablePrefix = "$";
 
 /// Appends an entry to the journal.
 void record(FileTransaction& transaction, int kind, const std::string& path);
@@ -48,8 +47,22 @@ void record(FileTransaction& transaction, int kind, const std::string& path);
 /// such a file meanwhile; a rollback then leaves its file alone.
 void claim(FileTransaction& transaction, const std::string& path, const FileIdentity& ours);
 
+/// Moves what is at `path` to its backup name and journals that; an older backup is deleted.
+///
+/// Does nothing if the transaction keeps no backups or nothing at `path` can be reached
+/// (pathIsMissing()), except that a stranger's link is moved wherever it leads. Afterwards the name
+/// is free, or is a link of ours that leads nowhere. Returns 0 or CannotRename (9).
+[[nodiscard]] int backupFile(FileTransaction& transaction, const std::string& path);
+
 /// The number of changes in the journal.
 [[nodiscard]] std::size_t changeCount(const FileTransaction& transaction);
+
+/// True if the last file that was written replaced another.
+[[nodiscard]] bool lastFileReplacedAnother(const FileTransaction& transaction);
+
+/// The directories in which something changed, in the order of the changes; one of them may occur
+/// more than once.
+[[nodiscard]] std::vector<std::string> changedDirectories(const FileTransaction& transaction);
 
 /// Deletes every backup and empties the journal. Failures are ignored; returns 0.
 int commit(FileTransaction& transaction);

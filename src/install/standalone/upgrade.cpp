@@ -26,9 +26,9 @@ constexpr const char* ObsoleteFiles[] = {
     "libzor.so", "kpo_config.xml", "libxerces-c.so.26",
 };
 
-/// Replaces the installed files, whose scanners are stopped, by those of the package.
+/// Replaces the installed files, whose scanners are stopped, by those of the request.
 int deployFiles(FileTransaction& transaction, InstallRegistry& registry,
-                const InstallRegistry& package, const std::string* indexPath, bool useCustomPath)
+                const InstallRegistry& request, const std::string* indexPath, bool useCustomPath)
 {
     const std::string& home = registry.homeDirectory;
     (void)removeDir(transaction, home, spbPropertiesDir, true);
@@ -42,12 +42,12 @@ int deployFiles(FileTransaction& transaction, InstallRegistry& registry,
     (void)setSelinuxContext(home); // never fatal
     if (isInterrupted())
         return RunInterrupted;
-    return customizeDeployment(home, package, useCustomPath);
+    return customizeDeployment(home, request, useCustomPath);
 }
 
 /// The common log directory and the registry, after `deployed` files or without any.
 int finishUpgrade(FileTransaction& transaction, InstallRegistry& registry,
-                  const InstallRegistry& package, bool deployed, bool useCustomPath,
+                  const InstallRegistry& request, bool deployed, bool useCustomPath,
                   const std::string& customPath)
 {
     if (!localInstall && !useCustomPath) {
@@ -57,17 +57,17 @@ int finishUpgrade(FileTransaction& transaction, InstallRegistry& registry,
             return code;
     }
     if (deployed)
-        registry.version = package.version;
-    const bool changed = updateRegistration(registry, package);
+        registry.version = request.version;
+    const bool changed = updateRegistration(registry, request);
     return deployed || changed ? saveRegistry(transaction, registry) : FileOk;
 }
 
 } // namespace
 
-bool updateRegistration(InstallRegistry& registry, const InstallRegistry& package)
+bool updateRegistration(InstallRegistry& registry, const InstallRegistry& request)
 {
     bool changed = false;
-    const std::string& exploiter = package.exploiters;
+    const std::string& exploiter = request.exploiters;
     if (!isExploiterRegistered(registry, exploiter)) {
         if (skipExploiterRegistration) {
             *logstream << "Exploiter registration skipped\n";
@@ -77,9 +77,9 @@ bool updateRegistration(InstallRegistry& registry, const InstallRegistry& packag
             changed = true;
         }
     }
-    if (buildDateNumber(package.buildDate) > buildDateNumber(registry.buildDate)) {
-        *logstream << "Updating BuildDate informations to: " << package.buildDate << '\n';
-        registry.buildDate = package.buildDate;
+    if (buildDateNumber(request.buildDate) > buildDateNumber(registry.buildDate)) {
+        *logstream << "Updating BuildDate informations to: " << request.buildDate << '\n';
+        registry.buildDate = request.buildDate;
         changed = true;
     }
     return changed;
@@ -102,13 +102,12 @@ void removeObsoleteFiles(const std::string& home)
 }
 
 int upgradeInstall(FileTransaction& transaction, InstallRegistry& registry,
-                   const InstallRegistry& request, const std::string* indexPath, bool disable,
-                   bool useCustomPath, const std::string& customPath)
+                   const InstallRegistry& request, const std::string* indexPath, bool deploys,
+                   bool disable, bool useCustomPath, const std::string& customPath)
 {
     const std::string& home = registry.homeDirectory;
     detectSingleUserMode(home);
 
-    const bool deploys = isUpgradeNeeded(registry, request);
     bool stopped = false;
     int code = FileOk;
     if (deploys) {

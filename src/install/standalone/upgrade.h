@@ -1,4 +1,5 @@
-// The upgrade: a package brought over a registered installation, or only one more exploiter.
+// The upgrade of a registered installation: replaces its files, or only registers one more
+// exploiter.
 #pragma once
 
 #include <string>
@@ -7,22 +8,23 @@
 struct FileTransaction;
 struct InstallRegistry;
 
-/// Brings the installation of `registry` to the version of `request`, the installer's own record,
+/// Upgrades the installation of `registry` to the version of `request`, the installer's own record,
 /// whose exploiter list is the calling exploiter's identifier.
 ///
-/// Deploys the package when the installed version is older, or the same with a build date that is
-/// not later; otherwise only registers the exploiter. The scanners are stopped first, disabled as
-/// well with `disable`, and once stopped enabled again at the end in any case. `indexPath` is the
-/// index of installed files, null for none; with `useCustomPath` the log directory is the caller's.
-/// Returns 0, ScannersNotStopped (7), a code of a file operation, or the `errno` of a property
-/// file. The caller commits or rolls back; deletions and changes of property files stay.
+/// If `deploys` (see isUpgradeNeeded()), the package replaces the installed files; otherwise only
+/// the exploiter is registered. The scanners are stopped first (and disabled if `disable`); once
+/// stopped, they are always enabled again at the end. `indexPath` is the file index, null for none;
+/// with `useCustomPath` the caller provides the log directory. Returns 0, ScannersNotStopped (7), a
+/// code of a file operation, or the `errno` of a property file. The caller commits or rolls back;
+/// deletions and changes of property files are not undone.
 [[nodiscard]] int upgradeInstall(FileTransaction& transaction, InstallRegistry& registry,
                                  const InstallRegistry& request, const std::string* indexPath,
-                                 bool disable, bool useCustomPath, const std::string& customPath);
+                                 bool deploys, bool disable, bool useCustomPath,
+                                 const std::string& customPath);
 
-/// Adds the calling exploiter of `package`, unless `skipExploiterRegistration`, and a later build
-/// date to `registry`; logs it. Returns true when that changed it.
-bool updateRegistration(InstallRegistry& registry, const InstallRegistry& package);
+/// Adds the calling exploiter of `request`, unless `skipExploiterRegistration`, and a later build
+/// date to `registry`; logs it. Returns true if that changed `registry`.
+bool updateRegistration(InstallRegistry& registry, const InstallRegistry& request);
 
 /// The files in "bin" of `home` that newer versions do not carry, whether or not they exist.
 [[nodiscard]] std::vector<std::string> obsoleteFiles(const std::string& home);

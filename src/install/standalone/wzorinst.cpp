@@ -58,11 +58,19 @@ int removeRegistered(Discovery& found, const InstallRegistry& request)
     FileTransaction transaction;
     const int status = removeInstallation(transaction, found.registry, request, &found.indexPath);
     if (status == 0) {
-        (void)syncDirectories(transaction); // of a registry; a failure leaves the old one
+        // At most a registry was saved; if this fails, the old one may come back.
+        (void)syncDirectories(changedDirectories(transaction));
         *logstream << "Uninstallation successful, removing temporary files\n";
         (void)commit(transaction); // always 0
     }
     return status;
+}
+
+Procedure procedureFor(const Discovery& found)
+{
+    if (!found.registryFound)
+        return Procedure::FreshInstall;
+    return found.upgradeNeeded ? Procedure::Upgrade : Procedure::Registration;
 }
 
 /// What follows a successful installation: the modes, and an upgrade's empty scanner cache.
@@ -79,7 +87,7 @@ int installOrUpgrade(Discovery& found, InstallRegistry& request)
         return -1;
     FileTransaction transaction;
     const int status =
-        installWithTransaction(found.registryFound, transaction, found.registry, request,
+        installWithTransaction(procedureFor(found), transaction, found.registry, request,
                                found.indexPath, true, custom_log_path_available, new_log_path);
     if (status == 0)
         finishInstallation(transaction, found);
@@ -107,9 +115,8 @@ int main(int argc, char** argv)
 
     watchForSignals();
     Discovery found = discoverInstallation(commandLine);
-    InstallRegistry request = requestOf(commandLine);
-    int status =
-        found.installAction ? installOrUpgrade(found, request) : removeRegistered(found, request);
+    int status = found.installAction ? installOrUpgrade(found, commandLine.request)
+                                     : removeRegistered(found, commandLine.request);
     if (privateMode)
         status = performPrivateAction(commandLine, status);
 

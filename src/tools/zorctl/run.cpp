@@ -147,7 +147,7 @@ public:
         if (installer_.empty())
             return refuse(ExitCouldNotCheck, "wzorinst is neither next to zorctl nor in PATH");
         if (!log_.open(logDirectory(), std::string(1, asked.commandLine.action),
-                       asked.commandLine.exploiter))
+                       asked.commandLine.request.exploiters))
             return refuse(ExitCouldNotCheck, "cannot write a log in " + logDirectory());
 
         const int locked = lock();

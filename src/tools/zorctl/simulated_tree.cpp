@@ -31,12 +31,6 @@ Kind entryOnDisk(const std::string& path)
     return S_ISDIR(status.st_mode) ? Kind::Directory : Kind::File;
 }
 
-std::string parentOf(const std::string& path)
-{
-    const std::size_t slash = path.rfind('/');
-    return slash == 0 ? "/" : path.substr(0, slash);
-}
-
 } // namespace
 
 Kind SimulatedTree::kindOf(const std::string& path) const

@@ -83,7 +83,7 @@ public:
     void run()
     {
         Discovery found = discoverInstallation(commandLine_, true);
-        InstallRegistry request = requestOf(commandLine_);
+        InstallRegistry request = commandLine_.request;
         forecast_.home = found.registryFound ? found.registry.homeDirectory : request.homeDirectory;
         if (found.installAction)
             install(found, request);
@@ -110,7 +110,7 @@ private:
         if (!found.registryFound) {
             forecast_.operation = "fresh";
             freshInstall(home, true);
-        } else if (isUpgradeNeeded(found.registry, request)) {
+        } else if (found.upgradeNeeded) {
             forecast_.operation = "upgrade";
             upgrade(found, request);
         } else {
@@ -592,7 +592,7 @@ Forecast forecastRun(const PlannedRun& run)
     Forecast forecast;
     forecast.type = installTypeName(localInstall);
     forecast.action = std::string(1, run.commandLine.action);
-    forecast.exploiter = run.commandLine.exploiter;
+    forecast.exploiter = run.commandLine.request.exploiters;
     Simulation(run.commandLine, forecast).run();
     std::vector<std::string>& lost = forecast.notRestored;
     std::sort(lost.begin(), lost.end());
