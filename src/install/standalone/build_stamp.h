@@ -1,4 +1,4 @@
-// The build stamp: one text that says which build of the toolkit this installer belongs to.
+// The build stamp: identifies the build of the toolkit that this installer belongs to.
 //
 // "22/12/02zor_9.2.30.0000" is the build date in its first eight characters, the product word, "_"
 // and the version.
@@ -11,10 +11,10 @@
 /// The stamp of this installer.
 extern const std::string zorBuildStamp;
 
-/// The version that `stamp` carries after its "_"; 2.1.0.0 when it carries none that is usable (the
-/// first number above 0, a second one present, none negative). The fifth number is always 0.
+/// The version after the "_" of `stamp`; 2.1.0.0 if there is no usable one (the first number above
+/// 0, a second one present, none negative). The fifth number is always 0.
 [[nodiscard]] ZorVersion stampVersion(const std::string& stamp);
 
-/// The build date that heads `stamp`; empty when it is not longer than nine characters or its third
-/// and sixth characters are not "/".
+/// The build date at the start of `stamp`; empty if `stamp` is not longer than nine characters or
+/// its third and sixth characters are not "/".
 [[nodiscard]] std::string stampBuildDate(const std::string& stamp);

@@ -37,7 +37,7 @@ int invalidOption(const std::string& argument)
     return printUsage();
 }
 
-/// True for the path of a descriptor of the caller's, which is opened directly: "/dev/stdout",
+/// True for the path of one of the caller's descriptors, which is opened directly: "/dev/stdout",
 /// "/dev/fd/63", "/proc/self/fd/1".
 bool isDescriptorPath(std::string_view path)
 {
@@ -65,7 +65,8 @@ ScopedFd openLog(const std::string& path)
     return std::move(file.fd);
 }
 
-/// Makes the file at `path` the log stream. A file that cannot be opened swallows all that follows.
+/// Makes the file at `path` the log stream. If it cannot be opened, everything that follows is
+/// lost.
 void redirectLog(const char* path)
 {
     using Buffer = __gnu_cxx::stdio_filebuf<char>;
@@ -87,7 +88,7 @@ public:
     {
     }
 
-    /// Takes every option from the fourth argument on; returns 0 or 1.
+    /// Processes every option, from the fourth argument on; returns 0 or 1.
     int run()
     {
         for (at_ = 3; at_ < argc_; ++at_) {
@@ -193,7 +194,7 @@ private:
 
     int applyProvider(const char* value)
     {
-        // Deliberate: a text search, so a value that holds "|" can match across two names.
+        // Deliberate: a text search, so a value that contains "|" can match across two names.
         if (!nameListContains(providers_, value)) {
             *logstream << "Invalid provider specified: " << value << '\n';
             return printUsage();
@@ -212,7 +213,7 @@ private:
     int installTypeChoices_ = 0;
 };
 
-/// What can be judged only when every option is known.
+/// Checks what depends on several options.
 int checkOptions(const CommandLine& commandLine, const OptionParser& options)
 {
     if (privateMode && commandLine.privatePath.empty()) {

@@ -1,7 +1,7 @@
 // The command line of the installer: parsed once, left to right, into settings and a record.
 //
-// Settings that options print are printed at once, so what stands before "-o" goes to standard
-// output and what stands behind it to the file.
+// An option that prints its setting does so at once: lines of options before "-o" go to standard
+// output, lines of options after it to the file.
 #pragma once
 
 #include "registry.h"
@@ -22,13 +22,13 @@ struct CommandLine {
 
 /// Parses the arguments into `commandLine` and the process-wide settings.
 ///
-/// Returns 0, or 1 when the run ends here: the reason was printed, with the usage text where it
-/// helps.
+/// Returns 0, or 1 if the run ends here: the reason was printed, for most errors with the usage
+/// text.
 [[nodiscard]] int parseCommandLine(int argc, char** argv, CommandLine& commandLine);
 
-/// Fixes the destination: `defaultDir` unless the command line names another, without a final
-/// slash. Returns 0, or 1 when there is none: that and the usage text were printed.
+/// Sets the destination: `defaultDir` unless the command line names another, without a final
+/// slash. Returns 0, or 1 if there is none: an error and the usage text were printed.
 [[nodiscard]] int fixDestination(CommandLine& commandLine, const std::string& defaultDir);
 
-/// Prints the usage text on standard output and returns 1, the exit status that goes with it.
+/// Prints the usage text on standard output. Returns 1, the exit status of a usage error.
 int printUsage();

@@ -36,7 +36,7 @@ std::string commonDirectoryOf(std::FILE* file)
 
 void writeDefaultSetting(const std::string& path)
 {
-    // Dropped without commit or rollback: the setting is the house's, not this installation's.
+    // Neither committed nor rolled back: other products use the setting, too.
     FileTransaction scratch;
     {
         const ScopedUmask mask(globalFilesUmask);
@@ -61,7 +61,7 @@ std::string readCommonDirectory(bool readOnly)
     const ScopedFile file = openForReading(path);
     if (file)
         return commonDirectoryOf(file.get());
-    // One that is there but cannot be read names a directory that we do not know: it is kept.
+    // A setting that exists but cannot be read may name another directory: it is kept.
     if (!readOnly && pathIsMissing(path))
         writeDefaultSetting(path);
     return DefaultCommonDirectory;

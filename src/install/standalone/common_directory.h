@@ -1,7 +1,7 @@
-// The Corvan common directory, which several products of the house share.
+// The Corvan common directory, which several Corvan products share.
 //
-// It is named by the line "corvan_common_dir=<directory>" of the setting file
-// "/etc/kel/corvan/common/cfg/log.properties"; "/usr/kel/corvan/common" without one.
+// The line "corvan_common_dir=<directory>" of the setting file
+// "/etc/kel/corvan/common/cfg/log.properties" names it; the default is "/usr/kel/corvan/common".
 #pragma once
 
 #include <string>
@@ -13,7 +13,7 @@ extern const std::string KeyCorvanCommonDir; ///< "corvan_common_dir"
 
 /// The common directory.
 ///
-/// Unless `readOnly`, a missing setting file is written with the default, with the directories that
-/// lead to it: not journalled, so they outlive a rollback. Failures are not reported. A setting
-/// file that exists but cannot be read is left alone; the default applies.
+/// Unless `readOnly`, a missing setting file is created with the default, together with its
+/// directories. They are not journalled, so a rollback does not delete them. Failures are not
+/// reported. A setting file that exists but cannot be read is not changed; the default applies.
 [[nodiscard]] std::string readCommonDirectory(bool readOnly);

@@ -13,7 +13,7 @@ namespace {
 
 constexpr int FirstPrivate = 3;
 
-/// Where close_range() cannot do it: before Linux 5.11.
+/// Fallback for systems where close_range() cannot set the flag: before Linux 5.11.
 void closeOnExecOneByOne()
 {
     const ScopedDir open(opendir("/proc/self/fd"));
@@ -33,7 +33,7 @@ void secureDescriptors()
     for (int fd = 0; fd < FirstPrivate; ++fd) {
         // Takes the lowest free number, which is `fd`.
         if (fcntl(fd, F_GETFD) < 0)
-            (void)open("/dev/null", O_RDWR); // without it, writes fail as they did
+            (void)open("/dev/null", O_RDWR); // if this fails, writes fail as before
     }
     if (close_range(FirstPrivate, ~0U, CLOSE_RANGE_CLOEXEC) != 0)
         closeOnExecOneByOne();

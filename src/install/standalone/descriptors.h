@@ -1,7 +1,7 @@
-// The descriptors that the caller passed on.
+// The file descriptors that the process inherited.
 #pragma once
 
-/// Opens descriptors 0 to 2 on /dev/null where the caller closed them, so that no file of ours is
-/// taken for standard output; and keeps commands that are run from inheriting any other, such as a
-/// lock that a program started by them would hold forever.
+/// Opens those of the descriptors 0 to 2 that are closed on /dev/null, so that no other file gets
+/// such a number. Sets close-on-exec on all others: a command that is run must not inherit, for
+/// example, a lock that a daemon started by it would keep forever.
 void secureDescriptors();

@@ -26,7 +26,7 @@ bool canCreateProbe(const std::string& home)
     const std::string probe = joinPath(home, ProbeFileName);
     if (!openStream(probe, Existing::Truncate, ProbeFileMode))
         return false;
-    (void)unlinkPath(probe); // an empty file at the worst
+    (void)unlinkPath(probe); // if this fails, an empty file remains
     return true;
 }
 
@@ -42,7 +42,7 @@ int probeHome(const std::string& home, bool readOnly)
     return HomeNotWritable;
 }
 
-/// Whether the scanner control of the installation in `home` is there and not empty.
+/// Whether the scanner control of the installation in `home` exists and is not empty.
 int checkScannerControl(const std::string& home)
 {
     const std::string path = joinPath(home, trawlcfgExe);

@@ -1,4 +1,4 @@
-// What is registered on the machine, whether it is intact, and what is to be done about it.
+// Finds the registered installation, checks whether it is intact, and decides what to do.
 #pragma once
 
 #include "command_line.h"
@@ -27,7 +27,7 @@ enum VerificationCode : int {
 
 /// Reads and verifies the registry of this run's install type and decides; logs each step.
 ///
-/// A broken installation that is installed again is turned into an upgrade, in which failures to
-/// stop the scanners are tolerated. The home directory is probed by a file that is created and
-/// deleted again; with `readOnly` by asking the system, which changes nothing.
+/// Installing over a broken installation becomes an upgrade that tolerates failures to stop the
+/// scanners. The home directory is probed by creating and deleting a file; with `readOnly`, by
+/// asking the system, which changes nothing.
 [[nodiscard]] Discovery discoverInstallation(const CommandLine& commandLine, bool readOnly = false);

@@ -27,7 +27,7 @@ ScopedFd openNearest(std::string path)
     }
 }
 
-/// The code for an error of a sync. What the file system cannot do is no failed write.
+/// The code for an error of a sync. If the file system cannot sync, that is not a failed write.
 int codeOf(int error)
 {
     return error == EIO || error == ENOSPC || error == EDQUOT ? CannotWrite : FileOk;

@@ -14,16 +14,16 @@
 
 namespace {
 
-constexpr mode_t NewFileMode = 0666;    // what a file gets that no mode is set for
+constexpr mode_t NewFileMode = 0666;    // of a file for which no mode is given
 constexpr mode_t UnfinishedMode = 0600; // nobody else can open the file while it is being written
 constexpr int ExtractBlockSize = 8192;
 
 /// Opens `destination` for a file of `package`, its old content backed up. Returns 0, or the code
 /// of what failed.
 ///
-/// In a new installation nothing is in the way, so creating the file comes first, and looking at
-/// what is there only when that fails, whatever the reason. After a file that replaced another,
-/// this one is expected to do so as well.
+/// In a new installation nothing is in the way, so this first tries to create the file, and checks
+/// what exists only if that fails. After a file that replaced another, this one probably does, too,
+/// and the check comes first.
 int openDestination(FileTransaction& transaction, OpenPackage& package,
                     const std::string& destination, WritableFile& file)
 {
@@ -34,7 +34,7 @@ int openDestination(FileTransaction& transaction, OpenPackage& package,
     const int backedUp = backupFile(transaction, destination);
     if (backedUp != FileOk)
         return backedUp;
-    // After a backup the name is free. Whatever is there again was planted.
+    // After a backup the name is free. Whatever is there now was planted.
     const Existing existing = transaction.backup ? Existing::Refuse : Existing::Truncate;
     const int error = openForWriting(destination, existing, UnfinishedMode, file);
     package.fileWasReplaced();
@@ -65,11 +65,11 @@ int writeEntry(const ZipEntry& entry, PackageWindow& source, int destination)
     if (copied != EntryNotSound)
         return copied;
 
-    // A damaged entry holds what its stream delivers in blocks of ExtractBlockSize. A device has
-    // nothing to take back, and says EINVAL.
+    // The content of a damaged entry is what its stream delivers in blocks of ExtractBlockSize.
+    // For a device, which cannot be truncated, the error is EINVAL.
     if (lseek(destination, 0, SEEK_SET) != 0 || (ftruncate(destination, 0) != 0 && errno != EINVAL))
         return writeErrorCode(errno);
-    // From the package as it was opened: this very file may have taken its place.
+    // From the package as it was opened: this file may have replaced it.
     ScopedFd own(fcntl(source.fd(), F_DUPFD_CLOEXEC, 0));
     if (!own.isOpen())
         return CannotOpenForReading;
@@ -122,7 +122,7 @@ int extractOpenFile(FileTransaction& transaction, OpenPackage& package, const Zi
     if (code == FileOk && mode != 0)
         (void)fchmod(file.fd.get(), mode); // the content is what counts
     else if (file.created)
-        (void)fchmod(file.fd.get(), underUmask(NewFileMode)); // it stays under "-norollback"
+        (void)fchmod(file.fd.get(), underUmask(NewFileMode)); // it remains under "-norollback"
     return code == FileOk ? closeWritten(file.fd) : code;
 }
 

@@ -1,4 +1,4 @@
-// Copying one entry of a package to its place on the disk.
+// Extraction of one entry of a package to a file.
 #pragma once
 
 #include "file_codes.h"
@@ -13,8 +13,8 @@
 class ZipFile;
 struct ZipEntry;
 
-/// A package that stays open from entry to entry: opening it for each of many small entries costs
-/// as much as writing some of them.
+/// A package that stays open between entries: opening it for each small entry would cost as much as
+/// writing some of them.
 class OpenPackage {
 public:
     /// `archive` must outlive this object.
@@ -26,11 +26,11 @@ public:
     /// callers share; null where ZipFile::getInputStream() returns null.
     [[nodiscard]] std::shared_ptr<PackageWindow> open(const ZipEntry* entry);
 
-    /// To be called when a file was replaced, which may be the package: lets the next open() use
-    /// what is at the package's path then.
+    /// Call this after a file was replaced, which may be the package: the next open() uses what is
+    /// at the package's path then.
     void fileWasReplaced();
 
-    /// To be called when a file was truncated, which may be the package.
+    /// Call this after a file was truncated, which may be the package.
     void fileWasTruncated();
 
 private:
@@ -42,7 +42,7 @@ private:
 /// exactly `mode` unless that is 0. The directory must exist. Until the file is complete, nobody
 /// but its owner can open it for writing.
 ///
-/// Returns 0; CannotOpenForReading (1) if the entry has no stream: nothing was done then; 9 if the
+/// Returns 0; CannotOpenForReading (1), with nothing changed, if the entry has no stream; 9 if the
 /// old content cannot be moved; 2, also for a name that is planted meanwhile; 4; or the code of a
 /// failed write (5, 6, 7).
 [[nodiscard]] int extractOpenFile(FileTransaction& transaction, OpenPackage& package,

@@ -39,7 +39,7 @@ int extractEntry(FileTransaction& transaction, OpenPackage& package, const ZipEn
 
     trace(debug, "extractFile: ", destination);
     const int code = extractOpenFile(transaction, package, &entry, destination, mode);
-    if (index != nullptr) // also after a failure: part of the file may lie there
+    if (index != nullptr) // also after a failure: part of the file may exist
         (void)std::fprintf(index, "%s\n", destination.c_str());
     return code;
 }
@@ -91,7 +91,7 @@ int extractDirs(FileTransaction& transaction, const ZipFile& archive, const std:
     const ScopedUmask mask(globalFilesUmask);
     for (const ExtractionStep& step : extractionSteps(freshInstall)) {
         const std::string destination = joinPath(home, step.subdir);
-        const bool isConfig = step.subdir == spbCfgDir; // says so, and never traces
+        const bool isConfig = step.subdir == spbCfgDir; // is logged, and never traced
         if (isConfig)
             *logstream << "Extracting configs to '" << destination << "'\n" << std::flush;
         const int code = extractMatching(
@@ -123,15 +123,15 @@ std::string destinationName(const std::string& dstDir, const std::string& rest)
 
 std::vector<ExtractionStep> extractionSteps(bool freshInstall)
 {
-    std::string settings; // the owner's by now
+    std::string settings; // may have been edited
     if (!freshInstall)
         appendToNameList(settings, sourcePrefix(spbCfgDir) + zorProps);
     return {
         {spbBinDir, PublicMode, ""},
         {spbPropertiesDir, PublicMode, ""},
         {spbCfgDir, PublicMode, settings},
-        // Deliberate: the step above has extracted these already; the second pass backs up and
-        // lists them once more.
+        // Deliberate: the step above has already extracted these files. The second pass backs them
+        // up and lists them again.
         {joinPath(spbCfgDir, spbCfgXssDir), PublicMode, ""},
         {auxDirInstall, InstallDirMode, ""},
     };
@@ -140,7 +140,7 @@ std::vector<ExtractionStep> extractionSteps(bool freshInstall)
 int extractPackage(const std::string& spbPath, FileTransaction& transaction,
                    InstallRegistry& installation, bool freshInstall, const std::string* indexPath)
 {
-    *logstream << "Starting file extraction...\n" << std::flush; // an entry may end the process
+    *logstream << "Starting file extraction...\n" << std::flush; // a bad entry may end the process
     auto archive = std::make_unique<const ZipFile>(spbPath.c_str());
     if (archive->entries().empty()) {
         *logstream << "*** Error: package not found or not valid.\n";
@@ -167,7 +167,7 @@ int extractPackage(const std::string& spbPath, FileTransaction& transaction,
         *logstream << "File extraction failed, error = " << code << " ("
                    << fileErrorText(static_cast<unsigned>(code)) << ")\n";
         if (indexPath != nullptr)
-            (void)unlinkPath(*indexPath); // it lists what the rollback takes away
+            (void)unlinkPath(*indexPath); // it lists what the rollback deletes
     }
     return code;
 }

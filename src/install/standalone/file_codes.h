@@ -19,12 +19,12 @@ enum FileCode : int {
     CannotCreateDirectory = 11,
     CannotRemoveDirectory = 12,
     CannotChangeMode = 13,
-    RunInterrupted = 14, ///< a signal asked the run to stop; it has no text of its own
+    RunInterrupted = 14, ///< a signal asked the run to stop; not one of the texts below
 };
 
 /// The text of `code`; "Unknown error" for a number above 13.
 [[nodiscard]] std::string fileErrorText(unsigned code);
 
-/// The code of a failed write: `error` is the `errno` of the moment. EACCES is AccessDenied (7),
+/// The code of a failed write with the `errno` `error`. EACCES is AccessDenied (7),
 /// ENOSPC is OutOfSpace (6), everything else CannotWrite (5).
 [[nodiscard]] int writeErrorCode(int error);

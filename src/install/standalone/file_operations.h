@@ -1,9 +1,9 @@
 // The primitives through which an installation changes the disk.
 //
-// Each returns a code of file_codes.h and prints nothing. What it changed stands in the journal, so
-// a caller that sees a failure only returns it. A primitive that fails before its journal entry
-// leaves no entry; a partial file of such a one stays. Permission changes are not journalled.
-// Directories and files get their mode under the process umask; the caller sets that.
+// Each returns a code of file_codes.h and prints nothing. Its changes are in the journal, so a
+// caller only has to return a failure. A primitive that fails before its journal entry leaves no
+// entry; a partial file that it wrote remains. Permission changes are not journalled. Directories
+// and files get their mode under the process umask, which the caller sets.
 #pragma once
 
 #include "entry_extraction.h"
@@ -42,10 +42,10 @@
 /// A path that leads through a stranger's link gives 13. A rollback does not undo this.
 [[nodiscard]] int setFileMode(const std::string& path, mode_t mode);
 
-/// The same; the transaction is part of the interface of all primitives.
+/// The same. The transaction is part of the interface, not used.
 [[nodiscard]] int setFileMode(FileTransaction& transaction, const std::string& path, mode_t mode);
 
-/// Creates one directory, with 0777 when `mode` is 0. Returns 0, or -1 with `errno`.
+/// Creates one directory, with 0777 if `mode` is 0. Returns 0, or -1 with `errno`.
 [[nodiscard]] int makeDirectory(const std::string& path, mode_t mode);
 
 /// Removes an empty directory. Returns 0, or -1 with `errno`.
@@ -53,12 +53,12 @@ int removeDirectory(const std::string& path);
 
 /// Creates and journals every missing directory named before the last "/" of `path`.
 ///
-/// What exists, of whatever kind, is passed over. Returns 0 or CannotCreateDirectory (11).
+/// Whatever already exists is skipped. Returns 0 or CannotCreateDirectory (11).
 [[nodiscard]] int createPath(FileTransaction& transaction, const std::string& path, mode_t mode);
 
 /// As createPath(), with the last component as well.
 ///
-/// `counter` may be null. Deliberate: it is set to 0 and never raised; whoever needs to know what
-/// was created reads the journal.
+/// `counter` may be null. Deliberate: it is set to 0 and never incremented; to learn what was
+/// created, compare changeCount().
 [[nodiscard]] int createFullPath(FileTransaction& transaction, const std::string& path, mode_t mode,
                                  int* counter);

@@ -30,7 +30,7 @@ std::string temporaryName(const Place& place)
     return place.name + TemporarySuffix;
 }
 
-/// Fills `names` with the extended attributes of `file`, each ended by a NUL; none without support.
+/// Fills `names` with the extended attributes of `file`, each ended by a NUL; none if unsupported.
 /// Returns false if they cannot be read.
 bool readAttributeNames(int file, std::vector<char>& names)
 {
@@ -64,7 +64,8 @@ bool copyExtendedAttributes(int from, int to)
         std::vector<char> present;
         if (!readAttribute(from, name, wanted))
             return false;
-        // What the new file has anyway, such as a security label, may not be settable by a user.
+        // The new file may already have it, such as a security label, which a user cannot always
+        // set.
         if (readAttribute(to, name, present) && present == wanted)
             continue;
         if (fsetxattr(to, name, wanted.data(), wanted.size(), 0) != 0)
@@ -126,7 +127,7 @@ void deleteTemporary(const Place& place)
     (void)unlinkat(place.fd(), temporaryName(place).c_str(), 0);
 }
 
-/// True if a temporary file that cannot be created with `error` leaves only writing in place.
+/// True if the file must be written in place when creating a temporary file fails with `error`.
 bool needsWritingInPlace(int error)
 {
     return error == EACCES || error == EPERM || error == EROFS || error == ENAMETOOLONG;

@@ -1,11 +1,11 @@
-// Replacing a small file as a whole: whoever looks at its path, whenever the run is killed or the
-// disk fills up, finds the complete old or the complete new content.
+// Atomic replacement of a small file: even if the run is killed or the disk fills up, its path has
+// either the complete old or the complete new content.
 //
-// The new content goes to a temporary file beside the old one, is written to the disk, takes over
-// owner, group, mode and extended attributes, and is renamed to the path. A link of root or of the
-// running user stays a link: what it leads to is replaced. Three kinds of files cannot be replaced
-// and are overwritten in place: one that is not a regular file, one that something is mounted on,
-// and one whose owner or attributes the running user cannot pass on, or in whose directory it
+// The new content is written to a temporary file in the same directory and synced. The file gets
+// the owner, group, mode and extended attributes of the old one and is renamed to its path. A link
+// of root or of the running user stays a link: its target is replaced. Three kinds of files cannot
+// be replaced and are overwritten in place: one that is not a regular file, one that is a mount
+// point, and one whose owner or attributes the running user cannot copy, or in whose directory it
 // cannot create files.
 #pragma once
 
@@ -17,11 +17,12 @@
 
 #include <sys/types.h>
 
-/// Ends the name of a temporary file. A killed run leaves at most one of them; the next run that
-/// replaces the same file deletes it, and so does the last removal.
+/// The suffix of a temporary file. A killed run leaves at most one; the next run that replaces the
+/// same file deletes it, and so does the last removal.
 extern const std::string TemporarySuffix;
 
-/// Writes the new content to the stream. Failed writes need no report: they stick to the stream.
+/// Writes the new content to the stream. Failed writes need not be reported: the stream keeps its
+/// error flag.
 using ContentWriter = std::function<void(std::FILE*)>;
 
 /// Replaces the content of `path` by what `write` writes. A new file gets `mode` under the umask.

@@ -37,7 +37,7 @@ int makeSubdirOrReport(FileTransaction& transaction, const std::string& parent,
     return code;
 }
 
-/// Creates the directories that the package does not carry.
+/// Creates the directories that the package does not contain.
 int createDirectories(FileTransaction& transaction, const std::string& home)
 {
     const mode_t cacheMode = isRoot() ? CacheDirRootMode : UserCacheDirMode;
@@ -73,7 +73,7 @@ int registerInstallation(FileTransaction& transaction, InstallRegistry& registry
 
     {
         const ScopedUmask mask(globalFilesUmask);
-        // If it fails, the save says so.
+        // If this fails, so does the save.
         (void)createFullPath(transaction, registryDirectory(localInstall), RegistryDirMode,
                              nullptr);
     }
@@ -169,7 +169,7 @@ int freshInstall(FileTransaction& transaction, InstallRegistry& registry,
     if (isInterrupted())
         return RunInterrupted;
 
-    // The shared installation has its traces in the common directory; a user's own goes without.
+    // A per-user installation does not use the common directory.
     if (localInstall && !useCustomPath)
         return 0;
     return updateCommonTracePath(transaction, home, useCustomPath, customPath);

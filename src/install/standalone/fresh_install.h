@@ -1,4 +1,4 @@
-// The fresh installation: the toolkit put where none is registered yet.
+// The fresh installation: installs the toolkit where none is registered yet.
 #pragma once
 
 #include <string>
@@ -18,10 +18,10 @@ struct PropertyFile;
 /// Returns 0 or -1.
 [[nodiscard]] int createInstallDir(FileTransaction& transaction, const std::string& home);
 
-/// Fills the placeholders of a new "Zor.properties" in.
+/// Fills in the placeholders of a new "Zor.properties".
 void fillMainProperties(PropertyFile& file, const std::string& home);
 
-/// Fills the placeholders of a new "ZorTrace.properties" in.
+/// Fills in the placeholders of a new "ZorTrace.properties".
 void fillTraceProperties(PropertyFile& file, const std::string& home);
 
 /// Records in `home` whether the installation is the shared or a per-user one, and adds the record
@@ -30,11 +30,11 @@ void writeInstallType(const std::string& home, const std::string* indexPath);
 
 /// Installs `spbPackage` into the home of `registry`, journalled.
 ///
-/// `registry` holds the calling exploiter's identifier without its colon; with `writeRegistry` the
-/// list is completed and the registry saved. `indexPath` is the file index, null for
-/// none. With `useCustomPath` traces go to `customPath`. Returns 0, or the first code met: of a
-/// file operation, an `errno` of a property file, -1 when "install" cannot be made, or the status
-/// of the scanner control program. The caller commits or rolls back.
+/// The list of `registry` is the calling exploiter's identifier without a colon; if
+/// `writeRegistry`, the list is completed and the registry is saved. `indexPath` is the file index,
+/// null for none. If `useCustomPath`, traces go to `customPath`. Returns 0 or the first failure: a
+/// code of a file operation, the `errno` of a property file, -1 if "install" cannot be created, or
+/// the status of the scanner control program. The caller commits or rolls back.
 [[nodiscard]] int freshInstall(FileTransaction& transaction, InstallRegistry& registry,
                                const std::string* indexPath, bool writeRegistry, bool useCustomPath,
                                const std::string& customPath);

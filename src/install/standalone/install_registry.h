@@ -7,7 +7,7 @@
 
 struct InstallRegistry {
     ZorVersion version;
-    std::string buildDate;     ///< "YY/MM/DD", kept as it stands
+    std::string buildDate;     ///< "YY/MM/DD", kept unchanged
     std::string exploiters;    ///< see exploiters.h
     std::string homeDirectory; ///< where the toolkit is installed
     std::string configRootDirectory;

@@ -41,8 +41,7 @@ std::vector<std::string> writtenDirectories(const std::string& home, bool useCus
     return directories;
 }
 
-/// Runs the fresh installation or the upgrade, which a signal can stop until all its steps are
-/// made.
+/// Runs the fresh installation or the upgrade. A signal can stop it until its last step is done.
 int runProcedure(Procedure procedure, FileTransaction& transaction, InstallRegistry& registry,
                  InstallRegistry& request, const std::string& indexPath, bool flag,
                  bool useCustomPath, const std::string& customPath)
@@ -95,7 +94,7 @@ int installWithTransaction(Procedure procedure, FileTransaction& transaction,
         *logstream << "Installation failed, rolling back\n";
         (void)rollback(transaction); // always 0
         if (deployment)
-            (void)deployment->sync(); // the old state is back, on the disk or not
+            (void)deployment->sync(); // the old state is restored in any case
     } else {
         *logstream << "Installation failed\n";
     }

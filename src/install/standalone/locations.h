@@ -1,4 +1,4 @@
-// Where installations lie: the shared one, and one per user.
+// The locations of installations: the shared one, and one for each user.
 //
 // "Local" is the installation of the current user, "global" the shared one.
 #pragma once
@@ -17,7 +17,7 @@ enum InstalledType : int {
     GlobalInstall = 2,
 };
 
-/// True when the real user id is 0.
+/// True if the real user id is 0.
 [[nodiscard]] bool isRoot();
 
 /// "local" or "global".
@@ -27,14 +27,14 @@ enum InstalledType : int {
 /// there is neither.
 [[nodiscard]] std::string homeDirectory();
 
-/// Where the toolkit goes unless told otherwise. Without a home directory a local installation has
-/// the global place, and a line on `logstream` says so.
+/// The default directory of the toolkit. Without a home directory, that of a local installation is
+/// the global one, and an error is printed on `logstream`.
 [[nodiscard]] std::string defaultInstallDir(bool local);
 
 /// The directory of the registry file. Without a home directory the global one, silently.
 [[nodiscard]] std::string registryDirectory(bool local);
 
-/// The registry file; empty when its directory is.
+/// The registry file; empty if its directory is.
 [[nodiscard]] std::string registryPath(bool local);
 
 /// The registry file of the user whose home directory is `home`.
@@ -44,6 +44,6 @@ enum InstalledType : int {
 /// InstalledType (0 to 2). A file without the key counts as global.
 [[nodiscard]] int installedTypeOf(const std::string& targetDir);
 
-/// True unless an installation of the other type occupies `targetDir`; two lines on `logstream`
-/// tell when it does.
+/// True unless there is an installation of the other type in `targetDir`, which is then reported on
+/// `logstream`.
 [[nodiscard]] bool checkInstallTypeCompatibility(bool local, const std::string& targetDir);

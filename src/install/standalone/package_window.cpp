@@ -13,7 +13,7 @@ namespace {
 constexpr std::size_t SmallestRead = std::size_t{4} * 1024;
 constexpr std::size_t LargestReadAhead = std::size_t{256} * 1024;
 
-/// A gap that costs less to read than another system call. Between two entries lies a header.
+/// A gap that costs less to read than another system call. Between two entries there is a header.
 constexpr std::int64_t SmallGap = 4096;
 
 /// Whether the file goes on to `end`.
@@ -38,10 +38,10 @@ bool PackageWindow::holds(std::int64_t at, std::size_t size) const
            size <= held_ - static_cast<std::size_t>(at - start_);
 }
 
-/// Makes the window begin at `at`, with what it holds from there on, and reads the rest.
+/// Moves the start of the window to `at`, keeps what is already read and reads the rest.
 bool PackageWindow::moveTo(std::int64_t at, std::size_t size)
 {
-    // A header may claim any size: memory is for data that is there.
+    // A header may claim any size: allocate only for data that exists.
     if (size > LargestReadAhead && !reaches(file_.get(), at + static_cast<std::int64_t>(size)))
         return false;
 
@@ -68,16 +68,16 @@ bool PackageWindow::moveTo(std::int64_t at, std::size_t size)
     return true;
 }
 
-/// Makes the buffer hold `size` bytes, and keeps those that it holds.
+/// Resizes the buffer to `size` bytes and keeps its content.
 bool PackageWindow::makeRoom(std::size_t size)
 {
     if (size <= capacity_)
         return true;
     if (held_ == 0)
-        buffer_.reset(); // so that the old and the new one are never held together
+        buffer_.reset(); // first, so that the old and the new one never exist together
     std::unique_ptr<unsigned char[]> larger(new (std::nothrow) unsigned char[size]);
     if (!larger) {
-        held_ = 0; // forget all, the caller reads in another way
+        held_ = 0; // drop everything; the caller uses another way to read
         buffer_.reset();
         capacity_ = 0;
         return false;

@@ -1,10 +1,10 @@
-// Paths as texts: joining them, the name of a backup.
+// Operations on paths as text: nothing here looks at the disk.
 #pragma once
 
 #include <string>
 #include <string_view>
 
-/// Ends the name of a backup: "/opt/x" is kept as "/opt/x.bak". One generation only.
+/// The suffix of a backup: "/opt/x" is kept as "/opt/x.bak". There is only one generation.
 inline const std::string BackupSuffix = ".bak";
 
 /// `directory`, a "/" unless it already ends with one, `name`.
@@ -13,7 +13,7 @@ inline const std::string BackupSuffix = ".bak";
 /// As joinPath(), but an empty `name` gives `directory` unchanged.
 [[nodiscard]] std::string joinPathOptional(const std::string& directory, std::string_view name);
 
-/// True when `path` ends with "/".
+/// True if `path` ends with "/".
 [[nodiscard]] bool endsWithSlash(const std::string& path);
 
 /// The directory that holds `path`: "/a" for "/a/b" and "/a/b/", "." for "b".

@@ -8,7 +8,7 @@
 
 #include <sys/types.h>
 
-/// A path, and the mode that it has if it exists.
+/// A path and the mode that it gets if it exists.
 struct Permission {
     std::string path;
     mode_t mode;

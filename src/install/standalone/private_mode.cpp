@@ -15,7 +15,7 @@ namespace {
 int removePrivately(const std::string& privatePath)
 {
     FileTransaction transaction;
-    (void)stopScanners(privatePath, true, true); // the directory goes in any case
+    (void)stopScanners(privatePath, true, true); // the directory is removed in any case
     (void)removeDir(transaction, privatePath, "", true);
     *logstream << "Performing private remove\n";
     return 0;

@@ -1,5 +1,5 @@
-// Private mode: the tail of a run that installs into, or removes, a directory of the caller's own,
-// without any registry.
+// Private mode: the last step of a run with "-p", which installs into, or removes, a directory of
+// the caller without using a registry.
 #pragma once
 
 #include "command_line.h"

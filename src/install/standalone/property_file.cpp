@@ -37,8 +37,8 @@ int readLines(const std::string& path, std::vector<std::string>& lines)
     while (readLine(file.get(), line))
         lines.push_back(line);
     const int error = std::ferror(file.get()) != 0 ? errno : 0;
-    // Half a file, taken for whole, would be saved over the whole one. A directory can be opened
-    // and holds no lines: to save it is what fails.
+    // A file that was read only in part would later overwrite the complete one. A directory can be
+    // opened and has no lines: saving is what fails.
     return error == EISDIR ? 0 : error;
 }
 

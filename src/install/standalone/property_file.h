@@ -14,17 +14,17 @@
 struct PropertyFile {
     std::vector<std::string> lines; ///< without their newlines, otherwise as read
 
-    /// Replaces `lines` by those of the file at `path`. Returns 0, or the `errno` of what failed,
-    /// with a line about it on `logstream`; no lines are held then. A directory loads as no lines.
+    /// Replaces `lines` by those of the file at `path`. Returns 0, or the `errno` of a failure,
+    /// which is logged and leaves `lines` empty. A directory loads as no lines.
     [[nodiscard]] int load(const std::string& path);
 
     /// Replaces the file at `path` by the lines, each with a newline (replaceFile()). Returns 0, or
-    /// the `errno` of the failed open, with a line about it on `logstream`.
+    /// the `errno` of a failed open, which is logged.
     ///
     /// Deliberate: a failing write is not reported. The file then keeps its old content.
     [[nodiscard]] int save(const std::string& path) const;
 
-    /// The value of the first line with "=" whose key is `key`; empty when there is none.
+    /// The value of the first line with "=" whose key is `key`; empty if there is none.
     [[nodiscard]] std::string getValue(const std::string& key) const;
 
     /// The last line whose key is `key`, or null. It belongs to `lines`.
@@ -38,8 +38,7 @@ struct PropertyFile {
     /// As setValue(), for every line whose key contains `fragment`; each keeps its own key.
     int setValueWhereKeyContains(const std::string& fragment, const std::string& value);
 
-    /// Empties every line whose key contains `fragment`; returns their number. The lines stay, as
-    /// empty ones.
+    /// Replaces every line whose key contains `fragment` by an empty line; returns their number.
     int clearWhereKeyContains(const std::string& fragment);
 
     /// Replaces `old` by `replacement` in every line, as replaceEach() of text.h does; returns the

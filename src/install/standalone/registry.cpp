@@ -23,14 +23,14 @@ namespace {
 
 constexpr mode_t RegistryFileMode = 0666;
 
-/// Which of the required keys have been met.
+/// Which of the required keys have been read.
 struct SeenKeys {
     bool version = false;
     bool exploiters = false;
     bool home = false;
 };
 
-/// Takes one line of the file; false when it is a version line that does not parse.
+/// Parses one line of the file; false for a version line that does not parse.
 bool takeLine(const std::string& line, InstallRegistry& registry, SeenKeys& seen)
 {
     if (line.find('=') == std::string::npos)
@@ -83,7 +83,7 @@ int parseRegistry(const std::string& path, InstallRegistry* registry)
             return RegistryBadVersion;
     }
 
-    // A registry that could be read in part only must never pass for a whole one.
+    // A registry of which only a part could be read is not complete.
     const bool complete = seen.version && seen.exploiters && seen.home;
     return complete && std::ferror(file.get()) == 0 ? RegistryOk : RegistryIncomplete;
 }

@@ -1,8 +1,8 @@
 // The install registry: one "zor.ini" names the version, home and users of an installation.
 //
 // Five lines "key = value", each ended by a newline, in the order version, build date, home,
-// exploiters, configuration root. The reader also takes other orders, other spacing and other
-// lines; of a key that occurs twice the later line wins.
+// exploiters, configuration root. The reader also accepts other orders, other spacing and other
+// lines; if a key occurs twice, the later line wins.
 #pragma once
 
 #include "common_directory.h"
@@ -25,26 +25,26 @@ enum RegistryCode : int {
     RegistryOk = 0,
     RegistryCannotOpen = 1,
     RegistryIncomplete = 2, ///< version, exploiters or home is missing, or reading failed
-    RegistryBadVersion = 3, ///< nothing behind the bad version line was read
+    RegistryBadVersion = 3, ///< nothing after the bad version line was read
 };
 
 /// Reads the registry file at `path` into `registry`, which may be null to check only.
 ///
 /// Returns a RegistryCode (0 to 3). Fields whose key does not occur keep their value, so callers
-/// give a fresh record; after a code other than 0 it holds what was read before.
+/// pass a new record; after a failure it contains what was read until then.
 [[nodiscard]] int parseRegistry(const std::string& path, InstallRegistry* registry);
 
-/// True when `package` goes over `installed`: that is older, or of the same version and not of a
-/// later build, so the same build too.
+/// True if the package of `request`, the installer's own record, must replace `installed`: that has
+/// an older version, or the same version and a build date that is not later.
 [[nodiscard]] bool isUpgradeNeeded(const InstallRegistry& installed,
-                                   const InstallRegistry& package);
+                                   const InstallRegistry& request);
 
 /// Writes the whole registry file at `path`, journalled; an existing file is copied to its backup
-/// name first when the transaction keeps backups.
+/// name first if the transaction keeps backups.
 ///
-/// Whoever reads it meanwhile finds the old or the new registry (replaceFile()). Returns 0,
-/// CannotOpenForWriting (2), CannotWrite (5) whatever the reason, or the code of backupCopy(); in
-/// each of these cases the old registry is still there.
+/// The replacement is atomic (replaceFile()). Returns 0, CannotOpenForWriting (2), CannotWrite (5)
+/// for any failed write, or the code of backupCopy(); after a failure the old registry is still
+/// there.
 [[nodiscard]] int writeRegistry(FileTransaction& transaction, const std::string& path,
                                 const InstallRegistry& registry);
 

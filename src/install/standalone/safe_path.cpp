@@ -105,7 +105,7 @@ bool isOnProc(int fd)
     return fstatfs(fd, &status) == 0 && status.f_type == PROC_SUPER_MAGIC;
 }
 
-/// One walk along a path. `rest_` is what has not been passed yet, relative to `directory_`.
+/// One walk along a path. `rest_` is what is not resolved yet, relative to `directory_`.
 class Walk {
 public:
     Walk(const std::string& path, LastLink lastLink) : rest_(path), lastLink_(lastLink) {}
@@ -130,7 +130,7 @@ private:
         return directory_.isOpen() ? 0 : errno;
     }
 
-    /// Passes the next component.
+    /// Resolves the next component.
     int step()
     {
         rest_.erase(0, std::min(rest_.find_first_not_of('/'), rest_.size()));
@@ -250,7 +250,7 @@ bool isPlainFile(const struct stat& status)
     return S_ISREG(status.st_mode) || S_ISDIR(status.st_mode);
 }
 
-/// Opens the FIFO, socket or device at `place` as the caller wants it, waiting if it takes that.
+/// Opens the FIFO, socket or device at `place` as the caller asked, even if that blocks.
 ScopedFd openSpecialFile(const Place& place, int flags)
 {
     if (othersCanPlantIn(place)) {
@@ -386,9 +386,9 @@ bool pathIsMissing(const std::string& path)
 {
     if (pathExists(path))
         return false;
-    // A failing disk can answer EACCES once. Only a refusal that is repeated comes from the modes
-    // of a directory, and only then nothing there could be moved or opened.
-    // cppcheck-suppress knownConditionTrueFalse // the disk may answer otherwise now
+    // A failing disk can return EACCES once. Only if the second lookup fails with it as well does
+    // it come from the mode of a directory, so that nothing there could be moved or opened.
+    // cppcheck-suppress knownConditionTrueFalse // the second lookup may give another result
     if (errno == EACCES && pathExists(path))
         return false;
     return errno == ENOENT || errno == ENOTDIR || errno == ELOOP || errno == ENAMETOOLONG ||

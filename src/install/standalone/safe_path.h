@@ -3,7 +3,7 @@
 // The installer often runs as root, and some directories that it works in are writable by everyone
 // by design ("bin/etc", "cache_data", the log directories). Whoever can write there can plant a
 // symbolic link, a hard link or a FIFO under a name that a run is going to use, before the run or
-// in the middle of it. A path handed to the system as text would make root create, truncate, chmod
+// in the middle of it. A path passed to the system as text would make root create, truncate, chmod
 // or delete whatever that name leads to. So every path is resolved here, once, component by
 // component. A symbolic link is followed only if root or the running user owns it; any other is a
 // stranger's link, and the path is refused. What remains is a `Place`, an open directory and a name
@@ -41,7 +41,7 @@ struct Place {
 /// What findPlace() does with a symbolic link that is the last component.
 enum class LastLink { Follow, Keep };
 
-/// Finds the place of `path`. With LastLink::Follow its name was no link when it was looked at;
+/// Finds the place of `path`. With LastLink::Follow its name was not a link when it was checked;
 /// open it with O_NOFOLLOW all the same. The name itself may be missing.
 ///
 /// Returns 0, StrangersLink (-1), or the `errno` of the component that could not be passed.
@@ -69,24 +69,25 @@ public:
     ~ScopedDirectoryReuse();
 };
 
-/// True if root or the running user owns what `owner` owns. An owner that the user namespace does
-/// not map is neither.
+/// True if `owner` is root or the running user. An owner that the user namespace does not map is
+/// neither.
 [[nodiscard]] bool isTrustedOwner(uid_t owner);
 
 /// True if someone other than root and the running user can create names in the directory that
 /// `status` describes. A group that may write counts as others.
 [[nodiscard]] bool othersCanPlant(const struct stat& status);
 
-/// True when something exists at `path`, links followed: a dangling link does not. On false `errno`
-/// says why, ENOENT for a refused path.
+/// True if something exists at `path`, links followed, so false for a dangling link. If false,
+/// `errno` is the reason, ENOENT for a refused path.
 [[nodiscard]] bool pathExists(const std::string& path);
 
-/// True when nothing at `path` can be reached, links followed, and nothing there could be moved or
-/// opened either: the path is missing, refused, too long, a loop of links, or leads through a
-/// directory that must not be searched.
+/// True if there is nothing at `path`, links followed, that this process could move or open: the
+/// path does not exist, is refused, is too long, is a loop of links, or leads through a file or
+/// through a directory that this process may not search.
 ///
-/// A path that cannot be looked at for another reason, on a failing disk say, is not missing: what
-/// is there must be kept.
+/// False if something exists, or if that is unknown, for example after a read error of the disk:
+/// the caller must then keep what may be there. A single EACCES is not trusted, since a failing
+/// disk can cause it: the path is looked up a second time.
 [[nodiscard]] bool pathIsMissing(const std::string& path);
 
 /// stat() of `path`. Returns 0, or -1 with `errno`.
@@ -134,15 +135,15 @@ struct WritableFile {
 /// What changeMode() found and did.
 enum class ModeChange {
     Changed,
-    NothingThere, ///< missing, or not to be looked at
+    NothingThere, ///< missing, or not accessible
     Failed,       ///< refused by the system, a stranger's link, or a file planted by hard link
 };
 
-/// Sets the permission bits of `path`, which is never opened for that: a directory or file of mode
-/// 000 and a FIFO get theirs, too. A regular file that has a second name in a directory in which
-/// others can plant is left alone.
+/// Sets the permission bits of `path` without opening it, so this also works for a FIFO and for a
+/// directory or file of mode 000. A regular file with a second name, in a directory where others
+/// can plant, is not changed.
 ///
-/// Without /proc, only what can be opened for reading gets its mode.
+/// Without /proc, this works only for what can be opened for reading.
 [[nodiscard]] ModeChange changeMode(const std::string& path, mode_t mode);
 
 /// unlink() of `path`. Returns 0, or -1 with `errno`.

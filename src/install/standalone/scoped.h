@@ -1,7 +1,7 @@
-// Guards: what they hold is given back when they leave their scope.
+// Guards that release a resource at the end of their scope.
 //
-// A file that was written is closed by name on the good road, since the last block can fail there:
-// `release()` it to std::fclose() or close() and look at the answer.
+// On success, a file that was written is closed explicitly, since writing the last block can fail
+// then: pass `release()` to std::fclose() or close() and check the result.
 #pragma once
 
 #include <cstdio>
@@ -19,13 +19,13 @@ struct DirCloser {
     void operator()(DIR* dir) const { (void)closedir(dir); }
 };
 
-/// Owns a stdio stream; null when none is open.
+/// Owns a stdio stream; null if none is open.
 using ScopedFile = std::unique_ptr<std::FILE, FileCloser>;
 
-/// Owns a directory stream; null when none is open.
+/// Owns a directory stream; null if none is open.
 using ScopedDir = std::unique_ptr<DIR, DirCloser>;
 
-/// Owns a file descriptor; -1 when none is open.
+/// Owns a file descriptor; -1 if none is open.
 class ScopedFd {
 public:
     explicit ScopedFd(int fd) : fd_(fd) {}
@@ -46,7 +46,7 @@ public:
     [[nodiscard]] bool isOpen() const { return fd_ >= 0; }
     [[nodiscard]] int get() const { return fd_; }
 
-    /// Gives the descriptor up: the caller closes it.
+    /// Gives up the descriptor: the caller closes it.
     [[nodiscard]] int release() { return std::exchange(fd_, -1); }
 
 private:

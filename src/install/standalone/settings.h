@@ -1,8 +1,8 @@
 // Process-wide settings: what the command line chose, and the names of the package's layout.
 //
 // They are written while the program starts and reads its command line, by the repair of a broken
-// installation (ignoreUpdateErrors) and by the detection of single-user mode; everybody else only
-// reads them, where they are needed.
+// installation (ignoreUpdateErrors) and by the detection of single-user mode; all other code only
+// reads them.
 #pragma once
 
 #include <cstdio>
@@ -19,14 +19,14 @@ extern bool privateMode;               ///< a private installation or removal fo
 extern bool debugMode;                 ///< trace lines, and the output of external commands
 extern bool norollback;                ///< leave everything as it is when an installation fails
 extern bool ignoreNonFatalErrors;      ///< a failed scanner command counts as a success
-extern bool ignoreUpdateErrors;        ///< the status of scanner commands is not looked at
+extern bool ignoreUpdateErrors;        ///< the status of scanner commands is ignored
 extern bool createSingleUserModeFile;  ///< put the single-user flag into the installation
-extern bool applySingleUserMode;       ///< single-user mode: nobody but the owner writes
+extern bool applySingleUserMode;       ///< single-user mode: only the owner may write
 extern bool custom_log_path_available; ///< a directory for traces was given
 
 extern std::string spbPackage;      ///< path of the SPB
 extern std::string fileScannerMode; ///< default provider of the file-system scanner
-extern std::string new_log_path;    ///< that directory
+extern std::string new_log_path;    ///< the directory for traces
 
 /// Every line of progress, warning or error: standard output, or the file of "-o". Never null.
 extern std::ostream* logstream;
@@ -40,8 +40,8 @@ extern mode_t CacheDirRootMode;
 extern mode_t EtcDirMode;
 inline constexpr mode_t CorvanCommonDirMode = 0777;
 
-/// Single-user mode: the modes above are lowered and applySingleUserMode is set, for the rest of
-/// the run.
+/// Turns single-user mode on for the rest of the run: restricts the modes above and sets
+/// applySingleUserMode.
 void enterSingleUserMode();
 
 // The package's layout: names of directories and files, relative to the installation.
@@ -71,8 +71,7 @@ inline const std::string UninstallFileName = "_uninst";
 inline const std::string singleUserFlag = "config/SingleUserMode";
 inline const std::string ZOR_FILE_INDEX = "ZOR_files";
 
-/// Completes the layout names that depend on one another. To be called once, before any of them is
-/// used.
+/// Completes the layout names that depend on one another. Call it once, before any of them is used.
 void completeLayoutNames();
 
 /// The file index while an extraction writes it; null at all other times.

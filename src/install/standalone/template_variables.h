@@ -1,5 +1,4 @@
-// The placeholders "$(name)" of the toolkit's scripts and property files, and the update of the
-// scripts.
+// The placeholders "$(name)" of the toolkit's scripts and property files, and filling them in.
 #pragma once
 
 #include <string>
@@ -16,18 +15,17 @@ extern const std::string tokenScannerMode;     ///< "$(fscanner_mode)"; property
 /// returns the number of replacements.
 int replaceAll(PropertyFile& file, const std::string& placeholder, const std::string& value);
 
-/// The scripts in "install" that carry placeholders.
+/// The scripts in "install" that contain placeholders.
 inline constexpr const char* ScriptNames[] = {"trawlcfg.sh", "rmdirs.sh"};
 
-/// Fills the placeholders of a script in.
+/// Fills in the placeholders of a script.
 void fillScript(PropertyFile& script, const std::string& home, const std::string& common);
 
-/// Fills the placeholders of the script "install/"`fileName` in `home` in, and logs what it does.
+/// Fills in the placeholders of the script "install/"`fileName` in `home`, and logs its steps.
 ///
-/// Returns 0, also when there is no such script, or the `errno` with which loading or saving
-/// failed.
+/// Returns 0, also if there is no such script, or the `errno` of a failed load or save.
 int updateScript(const std::string& fileName, const std::string& home, const std::string& common);
 
-/// updateScript() for every script that carries placeholders. A script that cannot be updated does
+/// Calls updateScript() for every script that contains placeholders. Failures are ignored: they do
 /// not fail an installation.
 void updateScripts(const std::string& home, const std::string& common);

@@ -49,8 +49,8 @@ std::string textAfterEquals(const std::string& line)
 int replaceEach(std::string& text, const std::string& old, const std::string& replacement)
 {
     int count = 0;
-    // Deliberate: not from behind the replacement. What it forms with its neighbours is replaced
-    // too.
+    // Deliberate: searches from the beginning again, so that what a replacement forms with its
+    // neighbours is replaced, too.
     for (std::size_t at = text.find(old); at != std::string::npos; at = text.find(old)) {
         text.replace(at, old.size(), replacement);
         ++count;

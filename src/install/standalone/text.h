@@ -1,40 +1,41 @@
 // Trimming, and lists of names held in one text.
 //
-// A name list frames each name with "|" on both sides: "|bin/a||bin/b|". It is searched as a text,
-// so a name that itself holds "|" can match across two names.
+// In a name list each name has a "|" on both sides: "|bin/a||bin/b|". It is searched as a text,
+// so a name that contains "|" can match across two names.
 #pragma once
 
 #include <string>
 #include <string_view>
 
-/// The characters cut from keys and values: blank, tab, newline, carriage return.
+/// The characters that are trimmed from keys and values: blank, tab, newline, carriage return.
 inline const std::string Blanks = " \t\n\r";
 
-/// Stands before and after every name of a name list.
+/// Precedes and follows every name of a name list.
 inline const std::string ListSeparator = "|";
 
-/// Cuts every leading and trailing character of Blanks, in place.
+/// Removes every leading and trailing character of Blanks, in place.
 ///
-/// Deliberate: a text made only of blanks stays as it is; registries depend on it, since an empty
+/// Deliberate: a text of nothing but blanks is not changed. Registries depend on it: an empty
 /// exploiter list reads back as one blank.
 void trim(std::string& text);
 
-/// Cuts every trailing character of Blanks, in place; a text made only of blanks becomes empty.
+/// Removes every trailing character of Blanks, in place; a text of nothing but blanks becomes
+/// empty.
 void trimRight(std::string& text);
 
-/// Appends `name` in its frame to `list`.
+/// Appends `name` between two separators to `list`.
 void appendToNameList(std::string& list, std::string_view name);
 
-/// True when `name` in its frame occurs in `list`.
+/// True if `name` between two separators occurs in `list`.
 [[nodiscard]] bool nameListContains(std::string_view list, std::string_view name);
 
-/// What `line` holds before its first "=", trimmed; the whole line, trimmed, without one.
+/// The text before the first "=" of `line`, trimmed; without "=", the whole line, trimmed.
 [[nodiscard]] std::string keyOfLine(const std::string& line);
 
-/// What `line` holds after its first "=", as it stands; empty without one.
+/// The text after the first "=" of `line`, unchanged; empty without "=".
 [[nodiscard]] std::string textAfterEquals(const std::string& line);
 
-/// Replaces the first `old` in `text` by `replacement`, from the start of the text again and again,
-/// until there is none; returns the number of replacements. `old` must not be empty and not occur
-/// in `replacement`: that would never end.
+/// Replaces `old` by `replacement` until it does not occur in `text` any more; every search starts
+/// at the beginning. Returns the number of replacements. `old` must not be empty or occur in
+/// `replacement`: that would never end.
 int replaceEach(std::string& text, const std::string& old, const std::string& replacement);

@@ -29,7 +29,7 @@ int formatUtcTime(std::time_t t, char* buffer, std::size_t size, const char* for
     const std::tm* utc = std::gmtime(&t);
     if (utc == nullptr)
         return -1;
-    (void)std::strftime(buffer, size, format, utc); // a text that does not fit is the caller's
+    (void)std::strftime(buffer, size, format, utc); // the caller provides enough space
     return 0;
 }
 
@@ -58,8 +58,8 @@ int formatUniqueStamp(std::time_t t, char* buffer, std::size_t size)
     if (formatUtcTime(t, date, sizeof date, "%Y%m%d%H%M%S") != 0)
         return -1;
 
-    // Deliberate: the number is not the seconds but the low half of the bits of their double, which
-    // is what has always stood in these stamps.
+    // Deliberate: the number is not the seconds but the low half of the bits of their double. The
+    // stamps have always contained that.
     const auto bits = std::bit_cast<std::uint64_t>(secondsSinceLocalEpoch(t));
     (void)std::sprintf(buffer, "%s_%u", date, static_cast<std::uint32_t>(bits));
     return 0;

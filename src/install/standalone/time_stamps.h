@@ -1,4 +1,4 @@
-// Times as texts.
+// Time stamps as text.
 //
 // Only localTimeStamp() is used by the installer itself: it heads the file index. The
 // others complete the set. All of them give texts in the "C" locale.
@@ -10,8 +10,8 @@
 
 /// Formats `t` (seconds since the epoch) as UTC with the strftime() format `format`.
 ///
-/// All `size` bytes of `buffer` are set to 0 first. Returns 0, also when the text does not fit (the
-/// buffer is then as the C library leaves it); -1 when `buffer` is null, `size` is 0 (nothing is
+/// All `size` bytes of `buffer` are set to 0 first. Returns 0, also if the text does not fit (the
+/// buffer is then as the C library leaves it); -1 if `buffer` is null, `size` is 0 (nothing is
 /// written) or `t` cannot be broken down.
 [[nodiscard]] int formatUtcTime(std::time_t t, char* buffer, std::size_t size, const char* format);
 
@@ -26,12 +26,12 @@
 
 /// Writes the UTC time as "20221202101112", "_" and a number derived from `t`.
 ///
-/// `size` only says that there is a buffer: the text and its final NUL are written
-/// whole whatever it is (at most 43 bytes). Returns 0, or -1 as formatUtcTime().
+/// `size` is only compared with 0: the whole text and its final NUL (at most 43 bytes) are always
+/// written. Returns 0, or -1 as formatUtcTime().
 [[nodiscard]] int formatUniqueStamp(std::time_t t, char* buffer, std::size_t size);
 
 /// The current time in seconds since the epoch.
 [[nodiscard]] std::time_t currentTime();
 
-/// The local time now as "2022-12-02T10:11:12"; empty when it cannot be formatted.
+/// The local time now as "2022-12-02T10:11:12"; empty if it cannot be formatted.
 [[nodiscard]] std::string localTimeStamp();

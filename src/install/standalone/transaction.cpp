@@ -29,7 +29,7 @@ char letterOf(int kind)
     }
 }
 
-/// The kind behind a letter of a saved journal; 0 for a letter that it never holds.
+/// The kind for a letter of a saved journal; 0 for any other letter.
 int kindOf(char letter)
 {
     switch (letter) {
@@ -44,8 +44,8 @@ int kindOf(char letter)
     }
 }
 
-/// True if what is in the way at `place` must be moved: anything but a link of ours that leads
-/// nowhere. The latter stays, and what it points to is created.
+/// True if what is at `place` must be moved: anything but a dangling link of root or the running
+/// user. Such a link remains, and its target is created.
 bool isInTheWay(const Place& place, const std::string& path)
 {
     struct stat status = {};
@@ -85,7 +85,7 @@ void undo(const JournalEntry& entry, const JournalEntry* previous)
             (void)unlinkPath(entry.path);
         break;
     case DirectoryCreated:
-        (void)removeDirectoryPath(entry.path); // stays while it holds what no entry recorded
+        (void)removeDirectoryPath(entry.path); // remains if it contains anything else
         break;
     default:
         break;
@@ -159,7 +159,7 @@ int commit(FileTransaction& transaction)
     const auto& journal = transaction.journal;
     for (auto entry = journal.rbegin(); entry != journal.rend(); ++entry) {
         if (entry->kind == BackedUp)
-            (void)unlinkPath(backupName(entry->path)); // left where it is otherwise
+            (void)unlinkPath(backupName(entry->path)); // remains if this fails
     }
     transaction.journal.clear();
     return FileOk;

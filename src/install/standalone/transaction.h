@@ -3,7 +3,7 @@
 // Every operation that changes the disk appends what it did, oldest first. commit() deletes the
 // backups, rollback() undoes the changes, newest first, so that files go before their directories
 // and a file that was backed up and rewritten is first deleted and then restored. The journal lives
-// in memory: when the process dies, the backups stay beside the files.
+// in memory: if the process is killed, the backups remain next to the files.
 #pragma once
 
 #include "safe_path.h"
@@ -16,9 +16,9 @@
 
 /// Kinds of journal entries. The numbers are fixed; 3 does not exist.
 enum JournalKind : int {
-    BackedUp = 1,         ///< the path's previous content lies at its backup name
+    BackedUp = 1,         ///< the previous content of the path is at its backup name
     Created = 2,          ///< the path is a file that this run wrote
-    DirectoryCreated = 4, ///< the path is a directory that this run made
+    DirectoryCreated = 4, ///< the path is a directory that this run created
 };
 
 struct JournalEntry {
@@ -29,7 +29,7 @@ struct JournalEntry {
 
 /// The state of one run; owned by the driver, passed by reference to every file operation.
 ///
-/// Dropped without commit or rollback it leaves the disk as it is.
+/// Without commit or rollback nothing on the disk changes.
 struct FileTransaction {
     bool backup = true;     ///< keep what is replaced under its backup name
     bool journalled = true; ///< set together with `backup`; nothing reads it
@@ -37,7 +37,7 @@ struct FileTransaction {
     std::vector<std::pair<std::string, std::string>> variables; ///< name and value
 };
 
-/// Stands before the name of a variable in a text.
+/// Precedes the name of a variable in a text.
 inline const std::string VariablePrefix = "$";
 
 /// Appends an entry to the journal.
@@ -50,8 +50,8 @@ void claim(FileTransaction& transaction, const std::string& path, const FileIden
 /// Moves what is at `path` to its backup name and journals that; an older backup is deleted.
 ///
 /// Does nothing if the transaction keeps no backups or nothing at `path` can be reached
-/// (pathIsMissing()), except that a stranger's link is moved wherever it leads. Afterwards the name
-/// is free, or is a link of ours that leads nowhere. Returns 0 or CannotRename (9).
+/// (pathIsMissing()), except that a stranger's link is always moved. Afterwards the name
+/// is free, or a dangling link of root or the running user. Returns 0 or CannotRename (9).
 [[nodiscard]] int backupFile(FileTransaction& transaction, const std::string& path);
 
 /// The number of changes in the journal.
@@ -68,7 +68,7 @@ void claim(FileTransaction& transaction, const std::string& path, const FileIden
 int commit(FileTransaction& transaction);
 
 /// Undoes every change, newest first, and empties the journal. Failures are ignored: a directory
-/// that is not empty stays, a backup that cannot be moved stays. Returns 0.
+/// that is not empty and a backup that cannot be moved remain. Returns 0.
 int rollback(FileTransaction& transaction);
 
 /// Writes the journal to the file at `path`: per entry a letter ("B", "C", "D", a blank for an
@@ -80,10 +80,10 @@ int rollback(FileTransaction& transaction);
 /// before it stay. No flow calls it.
 [[nodiscard]] int loadJournal(FileTransaction& transaction, const std::string& path);
 
-/// Sets the variable `name`, a new one behind the others. No flow calls it.
+/// Sets the variable `name`; a new one is added at the end. No flow calls it.
 void setVariable(FileTransaction& transaction, const std::string& name, const std::string& value);
 
-/// The value of the variable `name`; empty when there is none. No flow calls it.
+/// The value of the variable `name`; empty if there is none. No flow calls it.
 [[nodiscard]] std::string getVariable(const FileTransaction& transaction, const std::string& name);
 
 /// Replaces every "$" + name in `text` by the variable's value, variable by variable, each time

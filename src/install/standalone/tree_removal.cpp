@@ -55,15 +55,15 @@ bool listNames(int fd, std::size_t limit, std::string& names)
     return true;
 }
 
-/// Deletes a tree. It goes down and up by descriptors, never by paths, so that nothing that is
-/// swapped or moved meanwhile leads it elsewhere. It holds two descriptors and no stack, however
-/// deep the tree is.
+/// Deletes a tree. It moves by descriptors, never by paths, so that directories that are swapped or
+/// moved meanwhile cannot redirect it. It needs two descriptors and no recursion, however deep the
+/// tree is.
 class TreeRemoval {
 public:
     TreeRemoval(bool recurse, bool keepDirs) : recurse_(recurse), keepDirs_(keepDirs) {}
 
     /// Deletes the content of the directory `root`, whose path is `path`, and all below it. Returns
-    /// the result of the root's level; the root itself stays.
+    /// the result of the root's level; the root itself is kept.
     bool run(ScopedFd root, const std::string& path)
     {
         root_ = std::move(root);
@@ -138,8 +138,8 @@ private:
     bool removeChild(Level& level, const std::string& name)
     {
         struct stat status = {};
-        // A path that the system would not take counts as one that cannot be looked at. In a
-        // directory that may be listed but not searched, "." cannot be looked at either.
+        // A path that is too long for the system counts as one that cannot be examined. In a
+        // directory that may be listed but not searched, "." cannot be examined either.
         if (path_.size() >= PATH_MAX ||
             fstatat(current_.get(), name.c_str(), &status, AT_SYMLINK_NOFOLLOW) != 0) {
             level.result = false;
@@ -184,9 +184,8 @@ private:
         path_.resize(level.pathSize);
     }
 
-    /// Makes `current_` the directory of the last level. Returns false if that has been moved away
-    /// or replaced: what is left of the level, and of those above it, is then given up as far as it
-    /// cannot be found again.
+    /// Makes `current_` the directory of the last level. Returns false if that was moved away or
+    /// replaced and cannot be found again: the rest of the level is then skipped.
     bool goUp()
     {
         if (isLevel(levels_.back(), ScopedFd(openat(current_.get(), "..", DirectoryFlags))))
@@ -198,7 +197,7 @@ private:
         return false;
     }
 
-    /// Takes `directory` as `current_` if it is that of `level`.
+    /// Makes `directory` the `current_` one if it is that of `level`.
     bool isLevel(const Level& level, ScopedFd directory)
     {
         struct stat status = {};
@@ -229,7 +228,7 @@ private:
     std::size_t held_ = 0; ///< bytes of names in all levels
 };
 
-/// Opens the directory at `place` or, through a link of ours, the one that `path` leads to.
+/// Opens the directory at `place` or, if that is a trusted link, the one that it leads to.
 ScopedFd openDirectory(const Place& place, const std::string& path)
 {
     // Without trailing slashes, which would make the system follow a link.

@@ -1,9 +1,9 @@
-// Finds the unwind tables of a piece of code, for the C++ runtime that a shipping binary carries.
+// Finds the unwind tables of a piece of code, for the C++ runtime that a shipped binary contains.
 //
-// The runtime asks `_dl_find_object` for them, which C libraries have had since 2.35 only. This
-// one is made of `dl_iterate_phdr`, which all have, so that the binary also starts on 2.34, where
-// its 64-bit times begin. It is linked into shipping binaries alone: a process that uses the
-// machine's C++ runtime has its own.
+// The runtime calls `_dl_find_object`, which the GNU C library has only since 2.35. This one uses
+// `dl_iterate_phdr`, which every version has, so that the binary also starts on 2.34, the first
+// version with 64-bit times. It is linked only into shipped binaries: a process that uses the
+// machine's C++ runtime already has the function.
 
 #include <cstddef>
 
@@ -17,7 +17,7 @@ struct Search {
     ElfW(Addr) tables = 0;
 };
 
-/// Takes the tables of the loaded `object` when the address lies in it; 1 then ends the walk.
+/// Stores the tables of the loaded `object` if it contains the address; 1 then ends the walk.
 int examine(dl_phdr_info* object, std::size_t, void* data)
 {
     auto& search = *static_cast<Search*>(data);
@@ -41,7 +41,7 @@ int examine(dl_phdr_info* object, std::size_t, void* data)
 } // namespace
 
 /// Sets `dlfo_eh_frame`, all that the runtime reads on x86, to the table index of the object that
-/// `address` lies in. Returns 0, or -1 when there is no such object or it has no index.
+/// contains `address`. Returns 0, or -1 if there is no such object or it has no index.
 // NOLINTNEXTLINE(readability-identifier-naming): the C library's name
 extern "C" [[gnu::visibility("hidden")]] int _dl_find_object(void* address,
                                                              dl_find_object* result) noexcept

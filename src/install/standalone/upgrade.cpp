@@ -26,7 +26,7 @@ constexpr const char* ObsoleteFiles[] = {
     "libzor.so", "kpo_config.xml", "libxerces-c.so.26",
 };
 
-/// Replaces the installed files, whose scanners are stopped, by those of the request.
+/// Replaces the installed files by those of the package. The scanners are stopped.
 int deployFiles(FileTransaction& transaction, InstallRegistry& registry,
                 const InstallRegistry& request, const std::string* indexPath, bool useCustomPath)
 {
@@ -131,7 +131,7 @@ int upgradeInstall(FileTransaction& transaction, InstallRegistry& registry,
     if (code == FileOk)
         code = finishUpgrade(transaction, registry, request, deploys, useCustomPath, customPath);
 
-    // Also after a failure: the caller only undoes what the journal holds.
+    // Also after a failure: the caller undoes only what is in the journal.
     if (createSingleUserModeFile)
         createSingleUserModeFlag(transaction, home, indexPath);
     if (stopped && restartScanners(home) != 0)

@@ -26,8 +26,8 @@ struct InstallRegistry;
 /// date to `registry`; logs it. Returns true if that changed `registry`.
 bool updateRegistration(InstallRegistry& registry, const InstallRegistry& request);
 
-/// The files in "bin" of `home` that newer versions do not carry, whether or not they exist.
+/// The files in "bin" of `home` that newer versions do not contain, whether or not they exist.
 [[nodiscard]] std::vector<std::string> obsoleteFiles(const std::string& home);
 
-/// Deletes, not journalled, the files in "bin" of `home` that newer versions do not carry.
+/// Deletes obsoleteFiles(). Not journalled.
 void removeObsoleteFiles(const std::string& home);

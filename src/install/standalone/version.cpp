@@ -20,7 +20,7 @@ std::size_t skipWhiteSpace(const std::string& text, std::size_t at)
     return at;
 }
 
-/// Reads the run of digits at `at`, moves `at` behind it. No overflow check: the number wraps.
+/// Reads the run of digits at `at`, moves `at` past it. No overflow check: the number wraps.
 std::uint32_t readNumber(const std::string& text, std::size_t& at)
 {
     std::uint32_t value = 0;
@@ -81,11 +81,11 @@ std::string formatVersion(const ZorVersion& version)
 
 std::string registryVersionText(const ZorVersion& version)
 {
-    // Deliberate: printed as signed numbers, so that 2^31 and above show as negative ones; the
-    // registry has always been written so.
+    // Deliberate: printed as signed numbers, so that 2^31 and above are negative; the registry has
+    // always been written like this.
     char text[64];
     (void)std::snprintf(
-        text, sizeof text, "%d.%d.%d.%04d", // 47 characters at the most
+        text, sizeof text, "%d.%d.%d.%04d", // at most 47 characters
         static_cast<std::int32_t>(version.major), static_cast<std::int32_t>(version.minor),
         static_cast<std::int32_t>(version.release), static_cast<std::int32_t>(version.level));
     return text;

@@ -19,15 +19,15 @@ struct ZorVersion {
 /// Reads one to five numbers separated by "." from `text`, white space around them allowed.
 ///
 /// Numbers not given are 0, so a blank text is version 0.0.0.0.0; a number that does not fit 32
-/// bits wraps around. `version` may be null to check only. Returns 0, or -1 when anything else
-/// stands in the text or a sixth number follows; `version` is unchanged then.
+/// bits wraps around. `version` may be null to check only. Returns 0, or -1, with `version`
+/// unchanged, if `text` contains anything else or a sixth number.
 [[nodiscard]] int parseVersion(const std::string& text, ZorVersion* version);
 
-/// Negative when `a` is older than `b`, 0 when equal, positive when newer: the difference, as a
+/// Negative if `a` is older than `b`, 0 if equal, positive if newer: the difference, as a
 /// signed 32-bit number, of the first pair of numbers that differ.
 [[nodiscard]] int compareVersions(const ZorVersion& a, const ZorVersion& b);
 
-/// The form shown to people, "2.3.0.0012"; ".5" follows only when the fifth number is above 0.
+/// The form shown to people, "2.3.0.0012"; ".5" follows only if the fifth number is above 0.
 [[nodiscard]] std::string formatVersion(const ZorVersion& version);
 
 /// The form written to the registry and the property files, "2.3.0.0012": never the fifth number.

@@ -24,15 +24,15 @@
 
 namespace {
 
-/// Makes writes that end a process by a signal fail instead, so that the run goes on or is undone:
-/// to a pipe whose reader has gone, and beyond the largest file that the caller allows.
+/// Makes two kinds of writes fail that would otherwise kill the process: to a pipe that nobody
+/// reads, and beyond the file size limit. The run then continues or is undone.
 void letWritesFail()
 {
     for (const int number : {SIGPIPE, SIGXFSZ}) {
-        // A handler of our own: unlike an ignored signal, the commands that we run do not inherit
-        // it. What the caller ignores stays ignored.
+        // A handler, since commands would inherit an ignored signal. What the caller ignores stays
+        // ignored.
         if (std::signal(number, [](int) {}) == SIG_IGN)
-            (void)std::signal(number, SIG_IGN); // was possible before
+            (void)std::signal(number, SIG_IGN); // worked a moment ago
     }
 }
 
@@ -42,7 +42,7 @@ std::string printSettings()
     *logstream << "ZOR version: " << zorBuildStamp << '\n'
                << "Install type: " << installTypeName(localInstall) << '\n'
                << "Register exploiter: " << (skipExploiterRegistration ? "no" : "yes") << '\n';
-    // Asked once a run: without a home directory it prints a line of its own.
+    // Called only once: without a home directory it prints an error.
     std::string defaultDir = defaultInstallDir(localInstall);
     *logstream << "Default dest: " << defaultDir << '\n'
                << "INI location: " << registryPath(localInstall) << '\n';

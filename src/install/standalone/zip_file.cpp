@@ -37,7 +37,7 @@ bool hasSignature(const unsigned char* at, unsigned char third, unsigned char fo
     return at[0] == 'P' && at[1] == 'K' && at[2] == third && at[3] == fourth;
 }
 
-/// Reads up to `size` bytes; fewer only at the end of the file or when reading fails.
+/// Reads up to `size` bytes; fewer only at the end of the file or if reading fails.
 std::size_t readUpTo(int fd, void* buffer, std::size_t size)
 {
     std::size_t done = 0;
@@ -105,7 +105,7 @@ bool readName(HeaderReader& reader, std::uint32_t length, std::string& name)
     return true;
 }
 
-/// Takes sizes and offset of `count` central headers; dataOffset is the local header's until
+/// Reads sizes and offsets of `count` central headers; dataOffset is the local header's until
 /// resolveLocalHeader() has run.
 bool readCentralHeaders(HeaderReader& reader, std::uint32_t count, std::vector<ZipEntry>& entries)
 {
@@ -130,7 +130,7 @@ bool readCentralHeaders(HeaderReader& reader, std::uint32_t count, std::vector<Z
     return true;
 }
 
-/// Gives `entry` its name and the place of its data. The local signature is not looked at.
+/// Sets the name of `entry` and the offset of its data. The local signature is not checked.
 bool resolveLocalHeader(HeaderReader& reader, ZipEntry& entry)
 {
     unsigned char header[LocalHeaderSize];
@@ -147,10 +147,10 @@ bool resolveLocalHeader(HeaderReader& reader, ZipEntry& entry)
     return true;
 }
 
-/// Reads the central directory; false when anything about it is wrong.
+/// Reads the central directory; false if anything about it is wrong.
 bool readCentralDirectory(HeaderReader& reader, std::vector<ZipEntry>& entries)
 {
-    // The end record is looked for in one place only, so an archive comment hides it.
+    // The end record is expected in one place only, so an archive comment hides it.
     unsigned char end[EndRecordSize];
     if (!reader.seekBeforeEnd(EndRecordSize) || !reader.read(end, sizeof end) ||
         !hasSignature(end, 5, 6))
@@ -166,7 +166,7 @@ bool readCentralDirectory(HeaderReader& reader, std::vector<ZipEntry>& entries)
                        [&](ZipEntry& entry) { return resolveLocalHeader(reader, entry); });
 }
 
-/// Reads one local header behind its signature's check and moves past its data.
+/// Reads one local header, whose signature is checked already, and moves past its data.
 int scanLocalHeader(HeaderReader& reader, const unsigned char* header, ZipEntry& entry)
 {
     const std::uint32_t nameLength = read16(header + 26);
@@ -258,7 +258,7 @@ X__DeflatedInputStream::X__DeflatedInputStream(ScopedFd file, std::uint32_t comp
     : file_(std::move(file)), compressedRemaining_(compressedSize), available_(uncompressedSize)
 {
     inflate_.next_in = input_;
-    (void)inflateInit2(&inflate_, -15); // raw data; if it fails, the first inflate tells
+    (void)inflateInit2(&inflate_, -15); // raw data; if it fails, so does the first inflate
 }
 
 X__DeflatedInputStream::~X__DeflatedInputStream()
@@ -274,7 +274,7 @@ int X__DeflatedInputStream::read()
     return static_cast<signed char>(c);
 }
 
-/// Reads compressed bytes ahead; false when none are left.
+/// Reads ahead compressed bytes; false if none are left.
 bool X__DeflatedInputStream::refill()
 {
     const std::size_t wanted = std::min<std::size_t>(sizeof input_, compressedRemaining_);
@@ -318,7 +318,7 @@ int X__DeflatedInputStream::read(char* buf, int len)
     // entry that inflates to more than its recorded size ends the program.
     const auto result = static_cast<int>(static_cast<unsigned>(len) - inflate_.avail_out);
     if (!(available_ >= static_cast<unsigned>(result))) {
-        (void)std::fflush(nullptr); // what was printed so far; the abort would drop it
+        (void)std::fflush(nullptr); // the abort would drop what was printed so far
         __assert_fail("available_ >= (unsigned) result", "zip_file", 432,
                       "virtual int X__DeflatedInputStream::read(char*, int)");
     }
@@ -348,7 +348,7 @@ std::unique_ptr<InputStream> streamOver(ScopedFd file, const ZipEntry& entry)
 
 ZipFile::ZipFile(const char* path) : path_(path == nullptr ? "" : path)
 {
-    (void)readDirectory(path, entries_); // an empty list tells
+    (void)readDirectory(path, entries_); // a failure leaves the list empty
 }
 
 const ZipEntry* ZipFile::findEntry(const std::string& name) const

@@ -1,7 +1,7 @@
 // The package reader: the directory of a zip archive, and streams over its entries.
 //
-// It reads what extraction needs and no more: no CRC is checked, no data descriptor read; archive
-// comments, Zip64 records and multi-disk sets are unknown to it. Offsets are signed 32-bit
+// It supports only what extraction needs: no CRC is checked, no data descriptor is read; archive
+// comments, Zip64 records and multi-disk sets are not supported. Offsets are signed 32-bit
 // quantities: a seek to 2^31 or beyond counts as failed on every build.
 #pragma once
 
@@ -14,7 +14,7 @@
 
 #include <zlib.h>
 
-/// One entry of an archive, as its headers tell.
+/// One entry of an archive, as its headers describe it.
 struct ZipEntry {
     std::string name; ///< from the local header, cut at its first NUL
     std::uint32_t uncompressedSize = 0;
@@ -24,7 +24,7 @@ struct ZipEntry {
     std::uint32_t method = 0;     ///< 0 stored and 8 deflated can be opened; others are listed only
 };
 
-/// Results of ZipFile::readDirectory(). Everything but ZipOk leaves no entries.
+/// Results of ZipFile::readDirectory(). All but ZipOk mean that there are no entries.
 enum ZipCode : int {
     ZipOk = 0,
     ZipCannotOpen = 1,       ///< no path, or not readable
@@ -51,7 +51,7 @@ public:
     virtual int read() = 0;
 
     /// Up to `len` bytes into `buf`; returns their count, 0 at the end. A count below 0 is an error
-    /// to callers, though neither stream of an archive gives one.
+    /// to callers, but neither stream of an archive returns one.
     virtual int read(char* buf, int len) = 0;
 
     /// The uncompressed bytes that are not delivered yet.
@@ -61,14 +61,14 @@ public:
     virtual void close() {}
 };
 
-/// Reads an entry that is stored as it is.
+/// Reads an entry that is stored uncompressed.
 class X__StoredInputStream : public InputStream { // NOLINT(readability-identifier-naming)
 public:
-    /// Takes over `file`, which stands at the entry's first byte; `size` is the entry's size.
+    /// Takes over `file`, whose offset is the entry's first byte; `size` is the entry's size.
     X__StoredInputStream(ScopedFd file, std::uint32_t size);
 
-    /// Deliberate: does not look at what remains of the entry, so past its end this goes on with
-    /// the bytes that follow in the archive, and available() becomes negative.
+    /// Deliberate: does not check how much of the entry remains, so past its end this returns the
+    /// bytes that follow in the archive, and available() becomes negative.
     int read() override;
     int read(char* buf, int len) override;
     int available() override;
@@ -81,18 +81,17 @@ private:
 /// Reads an entry that is compressed by the deflate method.
 class X__DeflatedInputStream : public InputStream { // NOLINT(readability-identifier-naming)
 public:
-    /// Takes over `file`, which stands at the entry's first byte.
+    /// Takes over `file`, whose offset is the entry's first byte.
     X__DeflatedInputStream(ScopedFd file, std::uint32_t compressedSize,
                            std::uint32_t uncompressedSize);
     ~X__DeflatedInputStream() override;
 
-    /// Deliberate: the byte as a signed char, so 0x80 to 0xFF come back negative and 0xFF looks
-    /// like the end. The stored stream gives 0 to 255.
+    /// Deliberate: the byte as a signed char, so 0x80 to 0xFF are negative and 0xFF looks like the
+    /// end. The stored stream returns 0 to 255.
     int read() override;
 
-    /// Aborts the program when the entry inflates to more than its recorded size. When the
-    /// compressed data runs out before its end mark, what this call had inflated so far is dropped
-    /// and 0 returned.
+    /// Aborts the program if the entry inflates to more than its recorded size. If the compressed
+    /// data ends before its end mark, what this call has inflated is dropped and 0 is returned.
     int read(char* buf, int len) override;
     int available() override;
 
@@ -103,13 +102,13 @@ private:
     ScopedFd file_;
     std::uint32_t compressedRemaining_; ///< compressed bytes not read from the file yet
     std::uint32_t available_;
-    int status_ = 0; ///< last answer of inflate; Z_STREAM_ERROR marks exhausted input
+    int status_ = 0; ///< last result of inflate; Z_STREAM_ERROR marks exhausted input
     z_stream inflate_ = {};
     unsigned char input_[4096];
 };
 
-/// Where the data of `entry` begins in its archive. A seek to 2^31 or beyond fails, which nobody
-/// looks at: such an entry begins at the archive's first byte.
+/// Where the data of `entry` begins in its archive. A seek to 2^31 or beyond fails, and the failure
+/// is ignored: such an entry begins at the archive's first byte.
 [[nodiscard]] std::int64_t dataStart(const ZipEntry& entry);
 
 /// True if there is a stream for `entry`: it is not null, neither of its sizes is 0, and its method
@@ -123,7 +122,7 @@ private:
 /// itself.
 class ZipFile {
 public:
-    /// Reads the directory of the archive at `path`. Entries stay empty when there is none to read.
+    /// Reads the directory of the archive at `path`. Without a readable one there are no entries.
     explicit ZipFile(const char* path);
     ZipFile(const ZipFile&) = delete;
     ZipFile& operator=(const ZipFile&) = delete;
@@ -135,9 +134,8 @@ public:
     /// The first entry whose name is exactly `name`, or null. No flow calls it.
     [[nodiscard]] const ZipEntry* findEntry(const std::string& name) const;
 
-    /// A stream over `entry`, which the caller owns and deletes. Null when `entry` is null, when
-    /// one of its sizes is 0, when its method is neither stored nor deflated, or when the archive
-    /// cannot be opened.
+    /// A stream over `entry`, which the caller owns and deletes. Null if `entry` is null, one of
+    /// its sizes is 0, its method is neither stored nor deflated, or the archive cannot be opened.
     [[nodiscard]] InputStream* getInputStream(const ZipEntry* entry) const;
 
     /// The archive's path as given to the constructor.
@@ -147,7 +145,7 @@ public:
     [[nodiscard]] ScopedFd openArchive() const;
 
     /// Fills `entries` from the archive at `path` (null is allowed): from its central directory,
-    /// or, when that cannot be used, from its local headers. Returns a ZipCode (0 to 8); `entries`
+    /// or, if that cannot be used, from its local headers. Returns a ZipCode (0 to 8); `entries`
     /// is empty for every code but 0.
     [[nodiscard]] static int readDirectory(const char* path, std::vector<ZipEntry>& entries);
 
