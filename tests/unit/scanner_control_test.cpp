@@ -1,7 +1,7 @@
 #include "installer_fixtures.h"
 #include "paths.h"
-#include "scanner_control.h"
 #include "safe_path.h"
+#include "scanner_control.h"
 #include "settings.h"
 #include "toolkit_package.h"
 
