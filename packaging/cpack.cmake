@@ -1,5 +1,5 @@
-# The packages, each as .tar.gz, .deb and .rpm: wzorinst, and spb for those who make SPBs, which both
-# need nothing but a C library; and the debug symbols.
+# The packages, each as .tar.gz, .deb and .rpm: wzorinst; zorctl for those who run machines; spb for
+# those who make SPBs; and the debug symbols. Of the system they need nothing but a C library.
 # Same files, same bytes: all times are that of the release, or SOURCE_DATE_EPOCH.
 set(CPACK_GENERATOR TGZ DEB)
 find_program(RPMBUILD rpmbuild)
@@ -9,22 +9,26 @@ else()
   message(STATUS "No RPM packages: rpmbuild is missing (Debian package rpm)")
 endif()
 set(CPACK_COMPONENTS_ALL wzorinst debug)
-if(TARGET spb)
-  list(APPEND CPACK_COMPONENTS_ALL spb)
-endif()
+foreach(tool IN ITEMS spb zorctl)
+  if(TARGET ${tool})
+    list(APPEND CPACK_COMPONENTS_ALL ${tool})
+  endif()
+endforeach()
 set(CPACK_COMPONENTS_GROUPING IGNORE)
 set(CPACK_PACKAGE_DIRECTORY ${CMAKE_BINARY_DIR}/packages)
 set(CPACK_PROJECT_CONFIG_FILE ${CMAKE_CURRENT_SOURCE_DIR}/cpack_generator.cmake)
 set(CPACK_PRE_BUILD_SCRIPTS ${CMAKE_CURRENT_SOURCE_DIR}/cpack_staged_files.cmake)
 set(CPACK_RELEASE_TIME ${WZOR_RELEASE_TIME})
+set(CPACK_DEBIAN_FILES ${CMAKE_CURRENT_SOURCE_DIR}/debian)
 
 set(CPACK_PACKAGE_NAME wzorinst)
 set(CPACK_PACKAGE_VENDOR "The maintainers of wzorinst")
 set(CPACK_PACKAGE_CONTACT "The maintainers of wzorinst <wzorinst@localhost>")
 set(WZORINST_SUMMARY "installer of the ZOR inventory-scanning toolkit")
 set(SPB_SUMMARY "makes, checks and compares the packages that wzorinst installs")
+set(ZORCTL_SUMMARY "status, verification, guarded runs and repair for ZOR installations")
 set(DEBUG_SUMMARY "debug symbols of wzorinst")
-foreach(component wzorinst spb debug)
+foreach(component wzorinst spb zorctl debug)
   file(READ description-${component}.txt description)
   string(TOUPPER ${component} name)
   set(CPACK_DEBIAN_${name}_DESCRIPTION "${${name}_SUMMARY}\n${description}")
@@ -38,10 +42,13 @@ set(suffix ${PROJECT_VERSION}-linux-${CMAKE_SYSTEM_PROCESSOR})
 set(CPACK_PACKAGE_FILE_NAME wzorinst-${suffix}) # the archives' top directory
 set(CPACK_ARCHIVE_WZORINST_FILE_NAME wzorinst-${suffix})
 set(CPACK_ARCHIVE_SPB_FILE_NAME wzorinst-spb-${suffix})
+set(CPACK_ARCHIVE_ZORCTL_FILE_NAME wzorinst-zorctl-${suffix})
 set(CPACK_ARCHIVE_DEBUG_FILE_NAME wzorinst-debug-${suffix})
 
-# Debian packages: wzorinst_9.2.30-1_i386.deb, and so on. The oldest C library stands in the list
-# that scripts/check_binary holds the binary to.
+# Debian packages: wzorinst_9.2.30-1_i386.deb, and so on. The oldest C library is in the list
+# that scripts/check_binary compares the binary with. Programs of either architecture serve products of the
+# other one, hence "foreign"; CPack has no variable for that before 3.31, so it is the second line of
+# another field.
 file(STRINGS needs-${CMAKE_SYSTEM_PROCESSOR}.txt c_library REGEX "^libc\\.so\\.6: ")
 string(REPLACE "libc.so.6: GLIBC_" "" c_library ${c_library})
 set(debian_name_of_i686 i386)
@@ -53,15 +60,22 @@ set(CPACK_DEBIAN_PACKAGE_CONTROL_STRICT_PERMISSION ON)
 set(CPACK_DEBIAN_PACKAGE_ARCHITECTURE ${debian_name_of_${CMAKE_SYSTEM_PROCESSOR}})
 set(CPACK_DEBIAN_PACKAGE_RELEASE 1)
 set(CPACK_DEBIAN_WZORINST_PACKAGE_NAME wzorinst)
-set(CPACK_DEBIAN_WZORINST_PACKAGE_SECTION admin)
+set(CPACK_DEBIAN_WZORINST_PACKAGE_SECTION "admin\nMulti-Arch: foreign")
 set(CPACK_DEBIAN_WZORINST_PACKAGE_DEPENDS "libc6 (>= ${c_library})")
-set(CPACK_DEBIAN_WZORINST_PACKAGE_SUGGESTS wzorinst-spb)
+set(CPACK_DEBIAN_WZORINST_PACKAGE_SUGGESTS "wzorinst-spb, wzorinst-zorctl")
 set(CPACK_DEBIAN_SPB_PACKAGE_NAME wzorinst-spb)
-set(CPACK_DEBIAN_SPB_PACKAGE_SECTION devel)
+set(CPACK_DEBIAN_SPB_PACKAGE_SECTION "devel\nMulti-Arch: foreign")
 set(CPACK_DEBIAN_SPB_PACKAGE_DEPENDS "libc6 (>= ${c_library})")
 set(CPACK_DEBIAN_SPB_PACKAGE_SUGGESTS openssh-client)
+# zorctl shares the installer's library and starts both programs: all are of one version.
+set(CPACK_DEBIAN_ZORCTL_PACKAGE_NAME wzorinst-zorctl)
+set(CPACK_DEBIAN_ZORCTL_PACKAGE_SECTION "admin\nMulti-Arch: foreign")
+set(CPACK_DEBIAN_ZORCTL_PACKAGE_DEPENDS
+    "libc6 (>= ${c_library}), wzorinst (= ${PROJECT_VERSION}-1), wzorinst-spb (= ${PROJECT_VERSION}-1)"
+)
+set(CPACK_DEBIAN_ZORCTL_PACKAGE_SUGGESTS openssh-client)
 set(CPACK_DEBIAN_DEBUG_PACKAGE_NAME wzorinst-dbgsym)
-set(CPACK_DEBIAN_DEBUG_PACKAGE_SECTION debug)
+set(CPACK_DEBIAN_DEBUG_PACKAGE_SECTION "debug\nMulti-Arch: same")
 set(CPACK_DEBIAN_DEBUG_PACKAGE_DEPENDS "wzorinst (= ${PROJECT_VERSION}-1)")
 
 # RPM packages: wzorinst-9.2.30-1.i686.rpm, and so on. The needs of programs are found by rpm.
@@ -76,6 +90,10 @@ set(CPACK_RPM_PACKAGE_RELOCATABLE OFF)
 set(CPACK_RPM_WZORINST_PACKAGE_GROUP System/Management)
 set(CPACK_RPM_SPB_PACKAGE_NAME wzorinst-spb)
 set(CPACK_RPM_SPB_PACKAGE_GROUP Development/Tools)
+set(CPACK_RPM_ZORCTL_PACKAGE_NAME wzorinst-zorctl)
+set(CPACK_RPM_ZORCTL_PACKAGE_GROUP System/Management)
+set(CPACK_RPM_ZORCTL_PACKAGE_REQUIRES
+    "wzorinst = ${PROJECT_VERSION}-1, wzorinst-spb = ${PROJECT_VERSION}-1")
 set(CPACK_RPM_DEBUG_PACKAGE_NAME wzorinst-debuginfo)
 set(CPACK_RPM_DEBUG_PACKAGE_GROUP Development/Debug)
 set(CPACK_RPM_DEBUG_PACKAGE_REQUIRES "wzorinst = ${PROJECT_VERSION}-1")

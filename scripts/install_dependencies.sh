@@ -24,6 +24,7 @@ test='
     cmake-format
     codespell
     cppcheck
+    debhelper
     e2fsprogs
     g++-multilib
     gcovr
@@ -35,6 +36,7 @@ test='
     libclang-rt-dev
     libcli11-dev
     libdeflate-dev:i386
+    lintian
     man-db
     nettle-dev
     nettle-dev:i386
@@ -43,6 +45,7 @@ test='
     python3-jsonschema
     python3-pytest
     rpm
+    rpmlint
     scdoc
     shellcheck
     strace

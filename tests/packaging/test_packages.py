@@ -5,6 +5,7 @@ only be read. That directory holds nothing but the package, so a program that ru
 nothing else than the C library, which alone is borrowed.
 """
 
+import gzip
 import os
 import subprocess
 import tarfile
@@ -34,6 +35,12 @@ SPB_INSTALLED = """\
 755 /usr/bin/spb
 644 /usr/share/bash-completion/completions/spb
 644 /usr/share/man/man1/spb.1.gz
+"""
+
+ZORCTL_INSTALLED = """\
+755 /usr/bin/zorctl
+644 /usr/share/bash-completion/completions/zorctl
+644 /usr/share/man/man8/zorctl.8.gz
 """
 
 STATUS_REPORT = """\
@@ -163,6 +170,15 @@ def run_installed(root, *command):
     )
 
 
+def with_debian_files(installed, package):
+    """The files of a .deb: `installed`, and the two that only such packages have."""
+    lines = installed.splitlines(keepends=True) + [
+        f"644 /usr/share/doc/{package}/changelog.Debian.gz\n",
+        f"644 /usr/share/lintian/overrides/{package}\n",
+    ]
+    return "".join(sorted(lines, key=lambda line: line.split()[1]))
+
+
 def installed_files(root):
     """Mode and path of every file below the root directory's /usr."""
     found = [path for path in (root / "usr").rglob("*") if not path.is_dir()]
@@ -196,12 +212,15 @@ def test_the_packages_have_the_names_that_their_systems_expect(packages, names):
             f"wzorinst-{VERSION}-linux-{processor}.tar.gz",
             f"wzorinst-debug-{VERSION}-linux-{processor}.tar.gz",
             f"wzorinst-spb-{VERSION}-linux-{processor}.tar.gz",
+            f"wzorinst-zorctl-{VERSION}-linux-{processor}.tar.gz",
             f"wzorinst_{VERSION}-1_{debian}.deb",
             f"wzorinst-dbgsym_{VERSION}-1_{debian}.deb",
             f"wzorinst-spb_{VERSION}-1_{debian}.deb",
+            f"wzorinst-zorctl_{VERSION}-1_{debian}.deb",
             f"wzorinst-{VERSION}-1.{processor}.rpm",
             f"wzorinst-debuginfo-{VERSION}-1.{processor}.rpm",
             f"wzorinst-spb-{VERSION}-1.{processor}.rpm",
+            f"wzorinst-zorctl-{VERSION}-1.{processor}.rpm",
         ]
     )
 
@@ -230,7 +249,7 @@ def test_an_installed_deb_runs_and_its_removal_leaves_nothing(deb, root, binary)
 
     dpkg(root, "--install", deb)
 
-    assert installed_files(root) == INSTALLED
+    assert installed_files(root) == with_debian_files(INSTALLED, "wzorinst")
     assert (root / "usr/bin/wzorinst").read_bytes() == binary.read_bytes()
     report = run_installed(root, "wzorinst", "t")
     assert (report.returncode, report.stdout, report.stderr) == (0, STATUS_REPORT, "")
@@ -292,7 +311,7 @@ def test_the_tool_for_spbs_is_a_deb_that_needs_the_c_library_alone(packages, nam
 
     dpkg(root, "--install", deb)
 
-    assert installed_files(root) == SPB_INSTALLED
+    assert installed_files(root) == with_debian_files(SPB_INSTALLED, "wzorinst-spb")
     assert debian_fields(deb)["Depends"] == "libc6 (>= 2.34)"
     shown = run_installed(root, "spb", "--version")
     assert (shown.returncode, shown.stdout, shown.stderr) == (0, f"spb {VERSION}\n", "")
@@ -310,12 +329,89 @@ def test_the_tool_for_spbs_is_an_rpm_that_needs_the_c_library_alone(packages, na
     ]
 
 
+def test_zorctl_is_a_deb_that_needs_both_programs_of_its_version(packages, names, root):
+    deb = packages / f"wzorinst-zorctl_{VERSION}-1_{names['debian']}.deb"
+
+    dpkg(root, "--install", deb)
+
+    assert installed_files(root) == with_debian_files(ZORCTL_INSTALLED, "wzorinst-zorctl")
+    assert debian_fields(deb)["Depends"] == (
+        "libc6 (>= 2.34), wzorinst (= 9.2.30-1), wzorinst-spb (= 9.2.30-1)"
+    )
+    shown = run_installed(root, "zorctl", "--version")
+    assert (shown.returncode, shown.stdout, shown.stderr) == (
+        0,
+        "zorctl 22/12/02zor_9.2.30.0000\n",
+        "",
+    )
+
+
+def test_zorctl_is_an_rpm_that_needs_both_programs_of_its_version(packages, names):
+    package = packages / f"wzorinst-zorctl-{VERSION}-1.{names['processor']}.rpm"
+
+    needs = rpm_query(package, "--requires").splitlines()
+    expected = ("libc.so.6", "ld-linux", "rtld(", "rpmlib(")
+    assert [need for need in needs if not need.startswith(expected)] == [
+        "wzorinst = 9.2.30-1",
+        "wzorinst-spb = 9.2.30-1",
+    ]
+    assert rpm_query(package, "--list").split() == [
+        line.split()[1] for line in ZORCTL_INSTALLED.splitlines()
+    ]
+
+
+def test_programs_of_either_architecture_serve_products_of_the_other_one(packages):
+    kinds = {
+        path.name.split("_")[0]: debian_fields(path)["Multi-Arch"]
+        for path in packages.glob("*.deb")
+    }
+
+    assert kinds == {
+        "wzorinst": "foreign",
+        "wzorinst-dbgsym": "same",
+        "wzorinst-spb": "foreign",
+        "wzorinst-zorctl": "foreign",
+    }
+
+
+def test_the_debian_changelog_is_that_of_the_version(deb, root):
+    dpkg(root, "--install", deb)
+
+    with gzip.open(root / "usr/share/doc/wzorinst/changelog.Debian.gz", "rt") as changelog:
+        assert changelog.readline() == "wzorinst (9.2.30-1) unstable; urgency=medium\n"
+
+
+def test_lintian_finds_no_errors(packages):
+    checked = subprocess.run(
+        ["lintian", "--allow-root", "--fail-on", "error", *packages.glob("*.deb")],
+        capture_output=True,
+        text=True,
+        check=False,
+    )
+
+    assert checked.returncode == 0, checked.stdout + checked.stderr
+
+
+def test_rpmlint_finds_no_errors(packages, tree):
+    checked = subprocess.run(
+        ["rpmlint", "--rpmlintrc", tree / "packaging/rpmlintrc", *packages.glob("*.rpm")],
+        capture_output=True,
+        text=True,
+        check=False,
+    )
+
+    assert "4 packages and 0 specfiles checked; 0 errors, " in checked.stdout, (
+        checked.stdout + checked.stderr
+    )
+
+
 def test_the_debug_symbols_lie_where_a_debugger_looks_for_them(packages, names, root):
     deb = packages / f"wzorinst-dbgsym_{VERSION}-1_{names['debian']}.deb"
 
     dpkg(root, "--install", deb)
 
-    assert installed_files(root) == "644 /usr/lib/debug/usr/bin/wzorinst.debug\n"
+    symbols = "644 /usr/lib/debug/usr/bin/wzorinst.debug\n"
+    assert installed_files(root) == with_debian_files(symbols, "wzorinst-dbgsym")
     assert debian_fields(deb)["Depends"] == "wzorinst (= 9.2.30-1)"
 
 
@@ -342,5 +438,6 @@ def test_install_goes_below_the_prefix_that_is_given(build, tmp_path):
         str(path.relative_to(tmp_path)) for path in tmp_path.rglob("*") if not path.is_dir()
     )
     assert found == sorted(
-        line.split()[1].removeprefix("/usr/") for line in (INSTALLED + SPB_INSTALLED).splitlines()
+        line.split()[1].removeprefix("/usr/")
+        for line in (INSTALLED + SPB_INSTALLED + ZORCTL_INSTALLED).splitlines()
     )
