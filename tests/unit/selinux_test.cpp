@@ -1,4 +1,5 @@
 #include "installer_fixtures.h"
+#include "process_limits.h"
 #include "safe_path.h"
 #include "selinux.h"
 #include "toolkit_package.h"
