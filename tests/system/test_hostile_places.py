@@ -321,6 +321,27 @@ def test_a_fifo_at_the_log_does_not_hang_the_run(machine):
     ends(outcome, 0)
 
 
+def test_a_fifo_at_the_package_does_not_hang_the_run(machine):
+    machine.fifo_as(GUEST, GUESTS + "/package.spb")
+
+    outcome = machine.run("i", "ABC", "-s", GUESTS + "/package.spb")
+
+    printed_lines(outcome, "*** Error: package not found or not valid.")
+    ends(outcome, 1)
+
+
+def test_no_log_is_written_through_a_hard_link(machine):
+    machine.plant("/srv/board", b"notes of all", 0o666)
+    machine.as_user(GUEST, lambda: os.link(machine.at("/srv/board"), machine.at(GUESTS + "/log")))
+
+    with Untouched(machine):
+        outcome = machine.run("i", "ABC", "-s", SPB, "-o", GUESTS + "/log")
+
+    assert outcome.stdout == f"SPB file: {SPB}\n"
+    ends(outcome, 0)
+    assert machine.read("/srv/board") == "notes of all"
+
+
 @pytest.mark.parametrize("target", **named(TARGETS))
 @pytest.mark.parametrize("below", ["", "/deep/traces"])
 def test_no_trace_directory_is_made_through_a_link(machine, below, target):

@@ -87,13 +87,17 @@ bool isTemporary(const Place& place, const ScopedFd& file)
 }
 
 /// Waits until the run that is writing the temporary file of `place` has finished; deletes the file
-/// if that run was killed. Returns 0, or EAGAIN if it takes too long.
+/// if that run was killed, or if somebody else planted it. Returns 0, or EAGAIN if it takes too
+/// long.
 int waitForOtherRun(const Place& place)
 {
     const std::string name = temporaryName(place);
     const ScopedFd other(openat(place.fd(), name.c_str(),
                                 O_RDONLY | O_NOFOLLOW | O_NONBLOCK | O_NOCTTY | O_CLOEXEC));
-    for (int tries = 0; other.isOpen() && flock(other.get(), LOCK_EX | LOCK_NB) != 0; ++tries) {
+    struct stat status = {};
+    const bool isOfARun = other.isOpen() && fstat(other.get(), &status) == 0 &&
+                          S_ISREG(status.st_mode) && isTrustedOwner(status.st_uid);
+    for (int tries = 0; isOfARun && flock(other.get(), LOCK_EX | LOCK_NB) != 0; ++tries) {
         if (tries == MaxTries)
             return EAGAIN;
         (void)usleep(PauseMicroseconds);

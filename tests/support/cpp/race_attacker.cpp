@@ -5,7 +5,8 @@
 //     race_attacker move A B TARGET         once somebody has opened the directory A, moves it to B
 //                                           and makes a symbolic link A to TARGET
 //     race_attacker plant TARGET PATH...    makes symbolic links PATH to TARGET when PATH is free
-//     race_attacker hold PATH               opens PATH for writing as soon as it can, and writes
+//     race_attacker hold PATH...            opens each PATH for writing as soon as it can, and
+//     writes
 //                                           "stolen" to it when SIGTERM comes
 //
 // It prints "ready" once it is about to begin, and ends with status 0 after SIGTERM.
@@ -105,19 +106,38 @@ void plant(const std::vector<const char*>& names)
     }
 }
 
-void hold(const std::string& path)
-{
-    // Where its directory exists, the name is all that is left to look up each time.
-    const std::size_t slash = path.rfind('/');
-    const int directory = open(path.substr(0, slash).c_str(), O_PATH | O_DIRECTORY | O_CLOEXEC);
-    const char* name = directory < 0 ? path.c_str() : path.c_str() + slash + 1;
-
+/// One file that hold() tries to open.
+struct Held {
+    std::string path;
+    int directory; ///< where it exists, the name is all that is left to look up each time; else -1
     int file = -1;
-    while (isOver == 0 && file < 0)
-        file = openat(directory < 0 ? AT_FDCWD : directory, name, O_WRONLY | O_CLOEXEC);
-    waitForTheEnd();
-    if (file >= 0 && write(file, "stolen", std::strlen("stolen")) < 0)
-        std::perror(path.c_str());
+
+    explicit Held(const char* name)
+        : path(name),
+          directory(open(path.substr(0, path.rfind('/')).c_str(), O_PATH | O_DIRECTORY | O_CLOEXEC))
+    {
+    }
+
+    void tryToOpen()
+    {
+        const std::size_t name = directory < 0 ? 0 : path.rfind('/') + 1;
+        if (file < 0)
+            file = openat(directory < 0 ? AT_FDCWD : directory, path.c_str() + name,
+                          O_WRONLY | O_CLOEXEC);
+    }
+};
+
+void hold(const std::vector<const char*>& names)
+{
+    std::vector<Held> files(names.begin(), names.end());
+    while (isOver == 0) {
+        for (Held& held : files)
+            held.tryToOpen();
+    }
+    for (const Held& held : files) {
+        if (held.file >= 0 && write(held.file, "stolen", std::strlen("stolen")) < 0)
+            std::perror(held.path.c_str());
+    }
 }
 
 int usage()
@@ -149,7 +169,7 @@ int main(int argc, char** argv)
         else if (mode == "plant")
             plant(names);
         else if (mode == "hold")
-            hold(names[0]);
+            hold(names);
         else
             return usage();
     }

@@ -265,7 +265,7 @@ RACES = (
         "log.properties is opened while it is written",
         0.24,
         directory_of_the_setting,
-        ("hold", SETTING),
+        ("hold", SETTING, SETTING + ".wzorinst-new"),
         ("i", "ABC", "-s", SPB),
         SETTING,
         attackers=3,
