@@ -4,7 +4,7 @@
 // The image root is "/" here, so that entries are called "/bin/x" and not by a long name that the
 // fuzzer would have to keep.
 #include "checker.h"
-#include "commands.h"
+#include "subcommands.h"
 #include "fuzz_support.h"
 #include "landed_files.h"
 #include "package_layout.h"

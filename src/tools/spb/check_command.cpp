@@ -1,5 +1,5 @@
 #include "checker.h"
-#include "commands.h"
+#include "subcommands.h"
 #include "exit_status.h"
 #include "shown_text.h"
 #include "tool_output.h"

@@ -1,4 +1,4 @@
-#include "commands.h"
+#include "subcommands.h"
 #include "exit_status.h"
 #include "landed_files.h"
 #include "shown_text.h"

@@ -1,7 +1,7 @@
 // Unpacks a package into a directory, and writes nothing outside of it: a name that leads out is
 // refused, and every directory on the way is opened in the one before, without following links. So
 // it does not matter what somebody else puts into the directory meanwhile. No file is replaced.
-#include "commands.h"
+#include "subcommands.h"
 #include "exit_status.h"
 #include "file_codes.h"
 #include "file_writing.h"

@@ -1,6 +1,6 @@
 #include "archive_writer.h"
 #include "checker.h"
-#include "commands.h"
+#include "subcommands.h"
 #include "exit_status.h"
 #include "package_layout.h"
 #include "shown_text.h"

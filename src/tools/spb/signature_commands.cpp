@@ -1,4 +1,4 @@
-#include "commands.h"
+#include "subcommands.h"
 #include "exit_status.h"
 #include "scoped.h"
 #include "shown_text.h"

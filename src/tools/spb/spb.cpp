@@ -1,6 +1,6 @@
 // spb: makes, lists, checks, compares, unpacks and signs SPBs, the packages that wzorinst installs.
 #include "command_line_tool.h"
-#include "commands.h"
+#include "subcommands.h"
 #include "exit_status.h"
 #include "findings.h"
 #include "settings.h"
