@@ -15,7 +15,7 @@ COMPLETION = (REPOSITORY / "packaging/bash-completion/zorctl").read_text()
 def taken(machine, command):
     """The long options that the help of `command` lists."""
     text = zorctl(machine, command, "--help").stdout
-    return set(re.findall(r"^  (?:-\w,)?(--[a-z-]+)", text, re.MULTILINE))
+    return set(re.findall(r"^  (?:-\w, )?(--[a-z-]+)", text, re.MULTILINE))
 
 
 def synopsis(command):
@@ -30,7 +30,7 @@ def offered(command):
 
 def test_the_commands_are_those_of_the_help(machine):
     text = zorctl(machine, "--help").stdout
-    listed = re.findall(r"^  ([a-z]+) ", text.split("Subcommands:\n")[1], re.MULTILINE)
+    listed = re.findall(r"^    ([a-z]+) ", text.split("commands:\n")[1], re.MULTILINE)
 
     assert tuple(listed) == COMMANDS
 

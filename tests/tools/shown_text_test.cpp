@@ -37,4 +37,9 @@ TEST(ShownText, BytesOfNoCharacterAreEscapedOneByOne)
     EXPECT_EQ(shown("\xf4\x90\x80\x80"), "\\xf4\\x90\\x80\\x80"); // beyond the last character
 }
 
+TEST(JsonText, OnlyBytesOfNoCharacterAreEscaped)
+{
+    EXPECT_EQ(jsonText("a\n\x1b\\\xc3\xb6\xff"), "a\n\x1b\\\xc3\xb6\\xff");
+}
+
 } // namespace

@@ -20,9 +20,12 @@ TEST(ToolOutput, MessagesBeginWithTheToolsName)
 
 TEST(ToolOutput, JsonKeepsTheOrderOfItsMembers)
 {
+    Json list = Json::array();
+    list.push_back(true);
+    list.push_back(nullptr);
     testing::internal::CaptureStdout();
 
-    printJson({{"z", 1}, {"a", {true, nullptr}}});
+    printJson({{"z", 1}, {"a", list}});
 
     EXPECT_EQ(testing::internal::GetCapturedStdout(),
               "{\n  \"z\": 1,\n  \"a\": [\n    true,\n    null\n  ]\n}\n");

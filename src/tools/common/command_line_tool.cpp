@@ -4,6 +4,7 @@
 #include "shown_text.h"
 #include "tool_output.h"
 
+#include <CLI/CLI.hpp>
 #include <algorithm>
 #include <iostream>
 #include <sstream>
@@ -58,7 +59,7 @@ std::string usageOf(const CLI::App* app)
         for (const CLI::Option* option : optionsOf(app, positional))
             text += " " + usageWord(*option);
     }
-    return text + "\n";
+    return text + (app->get_prefix_command() ? " ARGUMENT ...\n" : "\n");
 }
 
 /// `text` in lines of at most LineWidth, each indented by `indent` but the first, which begins at
@@ -122,6 +123,8 @@ std::string helpOf(const CLI::App* app, const std::string& /*name*/, CLI::AppFor
     text += "\noptions:\n";
     for (const CLI::Option* option : optionsOf(app, false))
         text += helpLine("  ", namesOf(*option), option->get_description());
+    if (app->get_parent() == nullptr && !app->get_footer().empty())
+        text += "\n" + wrapped(app->get_footer(), 0, 0);
     return text;
 }
 
@@ -138,7 +141,27 @@ int wrongUsage(const CLI::App* command, const std::string& message)
     return ToolTrouble;
 }
 
+void applyRules(CLI::Option* option, const OptionRules& rules)
+{
+    option->required(rules.required);
+    if (rules.argument != nullptr)
+        option->type_name(rules.argument);
+    if (!rules.choices.empty())
+        option->check(CLI::IsMember(rules.choices).description(""));
+    if (rules.objection)
+        option->check(CLI::Validator(
+            [objection = rules.objection](std::string& value) { return objection(value); }, ""));
+}
+
 } // namespace
+
+std::shared_ptr<CLI::App> makeCommandLine(const std::string& name, const std::string& description,
+                                          const std::string& epilog)
+{
+    auto app = std::make_shared<CLI::App>(description, name);
+    app->footer(epilog);
+    return app;
+}
 
 CLI::App* addCommand(CLI::App& app, const std::string& name, const std::string& summary,
                      const std::string& description)
@@ -147,6 +170,43 @@ CLI::App* addCommand(CLI::App& app, const std::string& name, const std::string& 
     command->footer(summary); // helpOf() shows it in the list of commands and nowhere else
     command->set_help_flag("-h,--help", "show this help and end");
     return command;
+}
+
+void addFlag(CLI::App* command, const std::string& names, bool& value, const std::string& text)
+{
+    command->add_flag(names, value, text);
+}
+
+void addOption(CLI::App* command, const std::string& names, std::string& value,
+               const std::string& text, const OptionRules& rules)
+{
+    applyRules(command->add_option(names, value, text), rules);
+}
+
+void addOption(CLI::App* command, const std::string& names, std::vector<std::string>& values,
+               const std::string& text, const OptionRules& rules)
+{
+    CLI::Option* const option = command->add_option(names, values, text);
+    if (!option->get_positional())
+        option->take_all()->expected(1);
+    applyRules(option, rules);
+}
+
+void addNumber(CLI::App* command, const std::string& names, int& value, const std::string& text,
+               int most, const char* argument)
+{
+    CLI::Option* const option = command->add_option(names, value, text);
+    option->check(CLI::Range(0, most).description(""))->type_name(argument);
+}
+
+void allowMore(CLI::App* command)
+{
+    command->prefix_command();
+}
+
+std::vector<std::string> remaining(const CLI::App* command)
+{
+    return command->remaining();
 }
 
 std::optional<int> parseCommandLine(CLI::App& app, int argc, const char* const* argv)
@@ -169,4 +229,16 @@ std::optional<int> parseCommandLine(CLI::App& app, int argc, const char* const* 
     } catch (const CLI::ParseError& error) {
         return wrongUsage(reachedCommand(&app), error.what());
     }
+}
+
+int runTool(CLI::App& app, const std::vector<ToolCommand>& commands, int argc,
+            const char* const* argv)
+{
+    if (const std::optional<int> status = parseCommandLine(app, argc, argv))
+        return *status;
+    for (const ToolCommand& one : commands) {
+        if (one.command->parsed())
+            return finishOutput(one.run(), one.trouble, one.command->get_name());
+    }
+    return ToolTrouble;
 }

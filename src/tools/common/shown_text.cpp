@@ -82,9 +82,8 @@ std::string escaped(std::uint32_t c)
     }
 }
 
-} // namespace
-
-std::string shown(std::string_view bytes)
+/// `bytes` with what is not valid UTF-8 escaped, and what does not show if `hidden`.
+std::string withEscapes(std::string_view bytes, bool hidden)
 {
     std::string text;
     while (!bytes.empty()) {
@@ -92,13 +91,25 @@ std::string shown(std::string_view bytes)
         const std::size_t size = std::max<std::size_t>(next.size, 1);
         if (next.size == 0)
             text += "\\x" + hex(static_cast<unsigned char>(bytes[0]), 2);
-        else if (isHidden(next.character))
+        else if (hidden && isHidden(next.character))
             text += escaped(next.character);
         else
             text += bytes.substr(0, size);
         bytes.remove_prefix(size);
     }
     return text;
+}
+
+} // namespace
+
+std::string shown(std::string_view bytes)
+{
+    return withEscapes(bytes, true);
+}
+
+std::string jsonText(std::string_view bytes)
+{
+    return withEscapes(bytes, false);
 }
 
 bool isUtf8(std::string_view bytes)

@@ -11,5 +11,9 @@
 /// characters become "\u202e" or "\U000e0001". Everything else, the backslash too, stays as it is.
 [[nodiscard]] std::string shown(std::string_view bytes);
 
+/// `bytes` for JSON, which escapes control characters itself: only what is not valid UTF-8 becomes
+/// "\xff", everything else stays as it is.
+[[nodiscard]] std::string jsonText(std::string_view bytes);
+
 /// True when `bytes` are valid UTF-8 as a whole.
 [[nodiscard]] bool isUtf8(std::string_view bytes);

@@ -1,12 +1,10 @@
 // What a companion tool prints: messages to standard error, results to standard output.
 #pragma once
 
-#include <nlohmann/json.hpp>
+#include "json_value.h"
+
 #include <string>
 #include <string_view>
-
-/// JSON whose members are printed in the order in which they were added.
-using Json = nlohmann::ordered_json;
 
 /// The name that begins every message on standard error; set by main().
 extern std::string toolName;
@@ -17,8 +15,7 @@ void complain(std::string_view message);
 /// complain() of what the system answered about `path`: "spb: PATH: No such file or directory".
 void complainOf(std::string_view path, int error);
 
-/// Prints `value` on standard output, indented, with a newline. Its texts must be shown() ones, or
-/// others that are valid UTF-8.
+/// Prints `value` on standard output, indented, with a newline.
 void printJson(const Json& value);
 
 /// To be called last: `status`, once all output is written.

@@ -66,7 +66,7 @@ int checkCommand(const CheckOptions& options)
     }
     if (options.json && several)
         printJson(reports);
-    else if (options.json && !reports.empty())
-        printJson(reports.front());
+    else if (options.json && !reports.list()->empty())
+        printJson(reports.list()->front());
     return status;
 }

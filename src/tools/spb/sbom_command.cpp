@@ -21,7 +21,9 @@ std::string uuidOf(const std::string& digest)
 
 Json sha256Hash(const std::string& digest)
 {
-    return Json::array({{{"alg", "SHA-256"}, {"content", digest}}});
+    Json list = Json::array();
+    list.push_back({{"alg", "SHA-256"}, {"content", digest}});
+    return list;
 }
 
 } // namespace

@@ -4,20 +4,11 @@
 #include "exit_status.h"
 #include "findings.h"
 #include "settings.h"
-#include "tool_output.h"
 
 #include <csignal>
-#include <functional>
 #include <ostream>
 
 namespace {
-
-/// A command, what runs it, and its exit status when its output cannot be written.
-struct Command {
-    CLI::App* parsed;
-    std::function<int()> run;
-    int trouble;
-};
 
 /// The options of all commands.
 struct Options {
@@ -34,44 +25,38 @@ struct Options {
 
 void addFile(CLI::App* command, std::string& file)
 {
-    command->add_option("FILE", file, "the SPB")->required();
+    addOption(command, "FILE", file, "the SPB", {.required = true});
 }
 
 void addJson(CLI::App* command, bool& json)
 {
-    command->add_flag("--json", json, "print JSON");
+    addFlag(command, "--json", json, "print JSON");
 }
 
 void addAccept(CLI::App* command, std::vector<std::string>& codes)
 {
-    command->add_option("--accept", codes, "ignore findings of this code; may be given again")
-        ->type_name("CODE")
-        ->take_all()
-        ->expected(1)
-        ->check(CLI::Validator(
-            [](const std::string& code) {
-                return kindOf(code) ? std::string() : "there is no code " + code;
-            },
-            ""));
+    addOption(command, "--accept", codes, "ignore findings of this code; may be given again",
+              {.argument = "CODE", .objection = [](const std::string& code) {
+                   return kindOf(code) ? std::string() : "there is no code " + code;
+               }});
 }
 
-Command addPack(CLI::App& app, PackOptions& options)
+ToolCommand addPack(CLI::App& app, PackOptions& options)
 {
     CLI::App* const command = addCommand(
         app, "pack", "pack a tree into an SPB",
         "Packs the package directories (bin, properties, config, install) of DIR into an "
         "SPB. The same tree gives the same bytes. Refuses, with exit status 1, what the "
         "installer could not install; prints what \"check\" finds otherwise.");
-    command->add_option("-o", options.output, "the SPB; - for standard output")
-        ->required()
-        ->type_name("FILE");
-    command->add_flag("--stored", options.stored, "do not compress");
+    addOption(command, "-o", options.output, "the SPB; - for standard output",
+              {.required = true, .argument = "FILE"});
+    addFlag(command, "--stored", options.stored, "do not compress");
     addAccept(command, options.accepted);
-    command->add_option("DIR", options.tree, "the tree to pack")->required();
+    addOption(command, "DIR", options.tree, "the tree to pack", {.required = true});
     return {command, [&] { return packCommand(options); }, ToolDiffers};
 }
 
-Command addList(CLI::App& app, FileOptions& options)
+ToolCommand addList(CLI::App& app, FileOptions& options)
 {
     CLI::App* const command = addCommand(
         app, "list", "list an SPB as the installer sees it",
@@ -84,7 +69,7 @@ Command addList(CLI::App& app, FileOptions& options)
     return {command, [&] { return listCommand(options); }, ToolDiffers};
 }
 
-Command addCheck(CLI::App& app, CheckOptions& options)
+ToolCommand addCheck(CLI::App& app, CheckOptions& options)
 {
     CLI::App* const command = addCommand(
         app, "check", "report what would make an installation fail or surprise",
@@ -93,11 +78,11 @@ Command addCheck(CLI::App& app, CheckOptions& options)
         "package would install, 2 when it would not, is damaged or cannot be read.");
     addAccept(command, options.accepted);
     addJson(command, options.json);
-    command->add_option("FILE", options.files, "the SPBs")->required();
+    addOption(command, "FILE", options.files, "the SPBs", {.required = true});
     return {command, [&] { return checkCommand(options); }, ToolTrouble};
 }
 
-Command addInfo(CLI::App& app, FileOptions& options)
+ToolCommand addInfo(CLI::App& app, FileOptions& options)
 {
     CLI::App* const command =
         addCommand(app, "info", "show sizes, digests and properties of an SPB",
@@ -108,7 +93,7 @@ Command addInfo(CLI::App& app, FileOptions& options)
     return {command, [&] { return infoCommand(options); }, ToolTrouble};
 }
 
-Command addDiff(CLI::App& app, DiffOptions& options)
+ToolCommand addDiff(CLI::App& app, DiffOptions& options)
 {
     CLI::App* const command = addCommand(
         app, "diff", "compare two SPBs",
@@ -116,26 +101,25 @@ Command addDiff(CLI::App& app, DiffOptions& options)
         "modes, and of property files the changed keys. Exit status 0 when there is no "
         "difference, 1 when there are some, 2 when an SPB cannot be read.");
     addJson(command, options.json);
-    command->add_option("FROM", options.from, "the older SPB")->required();
-    command->add_option("TO", options.to, "the newer SPB")->required();
+    addOption(command, "FROM", options.from, "the older SPB", {.required = true});
+    addOption(command, "TO", options.to, "the newer SPB", {.required = true});
     return {command, [&] { return diffCommand(options); }, ToolTrouble};
 }
 
-Command addExtract(CLI::App& app, ExtractOptions& options)
+ToolCommand addExtract(CLI::App& app, ExtractOptions& options)
 {
     CLI::App* const command = addCommand(
         app, "extract", "unpack an SPB into a directory",
         "Unpacks what the installer would install of an SPB into DIR, and writes nothing "
         "outside of it. No file is replaced. Exit status 1 when something could not be "
         "unpacked as it was packed.");
-    command->add_option("-d", options.directory, "where to; made when it is missing")
-        ->required()
-        ->type_name("DIR");
+    addOption(command, "-d", options.directory, "where to; made when it is missing",
+              {.required = true, .argument = "DIR"});
     addFile(command, options.file);
     return {command, [&] { return extractCommand(options); }, ToolTrouble};
 }
 
-Command addSbom(CLI::App& app, FileOptions& options)
+ToolCommand addSbom(CLI::App& app, FileOptions& options)
 {
     CLI::App* const command =
         addCommand(app, "sbom", "print a bill of materials (CycloneDX)",
@@ -145,31 +129,29 @@ Command addSbom(CLI::App& app, FileOptions& options)
     return {command, [&] { return sbomCommand(options); }, ToolTrouble};
 }
 
-Command addSign(CLI::App& app, SignOptions& options)
+ToolCommand addSign(CLI::App& app, SignOptions& options)
 {
     CLI::App* const command = addCommand(
         app, "sign", "sign an SPB with an SSH key",
         "Writes a detached signature, made by ssh-keygen -Y in the namespace \"spb\", to "
         "FILE.sig.");
-    command->add_option("-k", options.key, "the private key, or the public one of an agent's")
-        ->required()
-        ->type_name("KEY");
-    command->add_option("-o", options.output, "the signature; - for standard output")
-        ->type_name("FILE");
+    addOption(command, "-k", options.key, "the private key, or the public one of an agent's",
+              {.required = true, .argument = "KEY"});
+    addOption(command, "-o", options.output, "the signature; - for standard output",
+              {.argument = "FILE"});
     addFile(command, options.file);
     return {command, [&] { return signCommand(options); }, ToolTrouble};
 }
 
-Command addVerify(CLI::App& app, VerifyOptions& options)
+ToolCommand addVerify(CLI::App& app, VerifyOptions& options)
 {
     CLI::App* const command =
         addCommand(app, "verify", "verify the signature of an SPB",
                    "Verifies the detached signature FILE.sig. Exit status 0 when an allowed signer "
                    "made it, 1 when not, 2 when that could not be found out.");
-    command->add_option("-s", options.signers, "who may sign, as in ssh-keygen(1)")
-        ->required()
-        ->type_name("ALLOWED_SIGNERS");
-    command->add_option("-i", options.signature, "the signature")->type_name("SIGNATURE");
+    addOption(command, "-s", options.signers, "who may sign, as in ssh-keygen(1)",
+              {.required = true, .argument = "ALLOWED_SIGNERS"});
+    addOption(command, "-i", options.signature, "the signature", {.argument = "SIGNATURE"});
     addJson(command, options.json);
     addFile(command, options.file);
     return {command, [&] { return verifyCommand(options); }, ToolTrouble};
@@ -183,21 +165,21 @@ int main(int argc, char** argv)
     static std::ostream silence(nullptr);
     logstream = &silence; // the installer's library reports here
 
-    CLI::App app(
-        "Makes, lists, checks, compares, unpacks and signs SPBs, the packages that wzorinst "
-        "installs.",
-        "spb");
+    const auto app = makeCommandLine(
+        "spb", "Makes, lists, checks, compares, unpacks and signs SPBs, the packages that wzorinst "
+               "installs.");
     Options options;
-    const Command commands[] = {
-        addPack(app, options.pack), addList(app, options.list), addCheck(app, options.check),
-        addInfo(app, options.info), addDiff(app, options.diff), addExtract(app, options.extract),
-        addSbom(app, options.sbom), addSign(app, options.sign), addVerify(app, options.verify),
-    };
-    if (const std::optional<int> status = parseCommandLine(app, argc, argv))
-        return *status;
-    for (const Command& command : commands) {
-        if (command.parsed->parsed())
-            return finishOutput(command.run(), command.trouble, command.parsed->get_name());
-    }
-    return ToolTrouble;
+    return runTool(*app,
+                   {
+                       addPack(*app, options.pack),
+                       addList(*app, options.list),
+                       addCheck(*app, options.check),
+                       addInfo(*app, options.info),
+                       addDiff(*app, options.diff),
+                       addExtract(*app, options.extract),
+                       addSbom(*app, options.sbom),
+                       addSign(*app, options.sign),
+                       addVerify(*app, options.verify),
+                   },
+                   argc, argv);
 }

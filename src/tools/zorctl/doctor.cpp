@@ -16,8 +16,9 @@
 #include "scanner_control.h"
 #include "settings.h"
 #include "settings_upgrade.h"
+#include "shown_text.h"
 #include "survey.h"
-#include "text_output.h"
+#include "tool_output.h"
 #include "transaction.h"
 #include "trusted_path.h"
 
@@ -450,12 +451,12 @@ int exitStatusOf(const Doctor& doctor, const Installation& after, const DoctorOp
                  bool good)
 {
     if (after.health == Health::Unknown)
-        return ExitCouldNotCheck;
+        return ToolTrouble;
     if (!good || (!options.apply && !doctor.actions().empty()) || after.health == Health::Damaged)
-        return ExitDifferences;
+        return ToolDiffers;
     if (after.health == Health::Absent)
-        return ExitNoInstallation;
-    return doctor.advice().empty() ? ExitAsAsked : ExitDifferences;
+        return ToolNotInstalled;
+    return doctor.advice().empty() ? ToolOk : ToolDiffers;
 }
 
 } // namespace
@@ -467,8 +468,8 @@ int examine(const DoctorOptions& options)
     if (!options.apply) {
         lock = lockForReading(localInstall);
     } else if (takeLock(lockPath(localInstall), true, 0, lock) != LockState::Held) {
-        std::cerr << "zorctl: cannot take the lock " << shown(lockPath(localInstall)) << '\n';
-        return ExitLocked;
+        complain("cannot take the lock " + shown(lockPath(localInstall)));
+        return ToolLocked;
     }
 
     Installation found = surveyAsked();

@@ -10,6 +10,6 @@ struct DoctorOptions {
     bool json = false;
 };
 
-/// Prints what was interrupted and what to do; with `apply` does it. Returns an ExitStatus:
-/// ExitDifferences if something is left to do, ExitLocked if another run holds the lock.
+/// Prints what was interrupted and what to do; with `apply` does it. Returns a ToolStatus:
+/// ToolDiffers if something is left to do, ToolLocked if another run holds the lock.
 [[nodiscard]] int examine(const DoctorOptions& options);

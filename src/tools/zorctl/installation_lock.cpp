@@ -2,10 +2,10 @@
 
 #include "locations.h"
 #include "paths.h"
-#include "text_output.h"
+#include "shown_text.h"
+#include "tool_output.h"
 
 #include <cerrno>
-#include <iostream>
 
 #include <fcntl.h>
 #include <sys/file.h>
@@ -72,10 +72,9 @@ ScopedFd lockForReading(bool local)
     ScopedFd lock(-1);
     const LockState state = takeLock(path, false, 0, lock);
     if (state == LockState::Busy)
-        std::cerr << "zorctl: warning: another run holds " << shown(path)
-                  << "; this may change while it is reported\n";
+        complain("warning: another run holds " + shown(path) +
+                 "; this may change while it is reported");
     else if (state != LockState::Held)
-        std::cerr << "zorctl: warning: cannot lock " << shown(path)
-                  << "; this may change while it is reported\n";
+        complain("warning: cannot lock " + shown(path) + "; this may change while it is reported");
     return lock;
 }

@@ -3,11 +3,9 @@
 #include "build_stamp.h"
 #include "file_index.h"
 #include "locations.h"
+#include "shown_text.h"
 #include "survey.h"
-#include "text_output.h"
 #include "version.h"
-
-#include <iostream>
 
 namespace {
 
@@ -87,9 +85,4 @@ Json toJson(const Installation& found)
     addRegistered(object, found, none);
     addHome(object, found, none);
     return object;
-}
-
-void printJson(const Json& report)
-{
-    std::cout << report.dump(2) << '\n';
 }

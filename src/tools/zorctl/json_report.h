@@ -5,11 +5,9 @@
 // directory "schema".
 #pragma once
 
-#include <nlohmann/json.hpp>
+#include "json_value.h"
 
 struct Installation;
-
-using Json = nlohmann::ordered_json;
 
 /// The head of the report of the subcommand `command`: schema number, names of the program.
 [[nodiscard]] Json reportHead(const char* command, int schema);
@@ -17,6 +15,3 @@ using Json = nlohmann::ordered_json;
 /// `found` as the member of a report. A value that could not be determined is "unknown", one that
 /// does not apply is null.
 [[nodiscard]] Json toJson(const Installation& found);
-
-/// Prints `report` on standard output.
-void printJson(const Json& report);

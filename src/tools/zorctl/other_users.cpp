@@ -100,8 +100,8 @@ Json surveyAs(const Account& account)
     int status = 0;
     // One that a dead file system holds cannot even be killed: it is left behind.
     const bool ended = waitpid(child, &status, whole ? 0 : WNOHANG) == child;
-    Json found = Json::parse(text, nullptr, false);
-    const bool good = whole && ended && status == 0 && !found.is_discarded();
+    Json found;
+    const bool good = whole && ended && status == 0 && Json::parse(text, found);
     return good ? found : unknownInstallation(account);
 }
 

@@ -4,8 +4,10 @@
 #include "installation_lock.h"
 #include "json_report.h"
 #include "settings.h"
+#include "shown_text.h"
 #include "simulation.h"
 #include "text_output.h"
+#include "tool_output.h"
 
 #include <iostream>
 #include <set>
@@ -95,9 +97,9 @@ void printNames(const char* what, const Names& names, bool all)
 int statusOf(const Forecast& forecast, const PlanOptions& options)
 {
     if (!forecast.failure.empty())
-        return forecast.operation == "refused" && forecast.action == "r" ? ExitNoInstallation
-                                                                         : ExitDifferences;
-    return forecast.unchanged ? options.unchangedExit : ExitAsAsked;
+        return forecast.operation == "refused" && forecast.action == "r" ? ToolNotInstalled
+                                                                         : ToolDiffers;
+    return forecast.unchanged ? options.unchangedExit : ToolOk;
 }
 
 } // namespace
@@ -130,9 +132,8 @@ int planRun(const PlanOptions& options)
 {
     const PlannedRun run = parseRun(options.arguments);
     if (!run.error.empty()) {
-        std::cerr << "zorctl: wzorinst would not accept this command line: " << shown(run.error)
-                  << '\n';
-        return ExitCouldNotCheck;
+        complain("wzorinst would not accept this command line: " + shown(run.error));
+        return ToolTrouble;
     }
     const ScopedFd lock = lockForReading(localInstall);
     const Forecast forecast = forecastRun(run);

@@ -13,8 +13,8 @@ struct PlanOptions {
     int unchangedExit = 0; ///< the exit status if nothing would change
 };
 
-/// Prints what "wzorinst `arguments`" would do; changes nothing. Returns an ExitStatus:
-/// ExitDifferences if the run would fail, ExitNoInstallation if it would find nothing to remove.
+/// Prints what "wzorinst `arguments`" would do; changes nothing. Returns a ToolStatus:
+/// ToolDiffers if the run would fail, ToolNotInstalled if it would find nothing to remove.
 [[nodiscard]] int planRun(const PlanOptions& options);
 
 /// Prints `forecast` for people.

@@ -10,9 +10,10 @@
 #include "paths.h"
 #include "plan.h"
 #include "settings.h"
+#include "shown_text.h"
 #include "simulation.h"
-#include "text_output.h"
 #include "time_stamps.h"
+#include "tool_output.h"
 
 #include <cerrno>
 #include <csignal>
@@ -141,21 +142,21 @@ public:
     {
         const PlannedRun asked = parseRun(options_.arguments);
         if (!asked.error.empty())
-            return refuse(ExitCouldNotCheck,
+            return refuse(ToolTrouble,
                           "wzorinst would not accept this command line: " + asked.error);
         installer_ = findProgram("wzorinst");
         if (installer_.empty())
-            return refuse(ExitCouldNotCheck, "wzorinst is neither next to zorctl nor in PATH");
+            return refuse(ToolTrouble, "wzorinst is neither next to zorctl nor in PATH");
         if (!log_.open(logDirectory(), std::string(1, asked.commandLine.action),
                        asked.commandLine.request.exploiters))
-            return refuse(ExitCouldNotCheck, "cannot write a log in " + logDirectory());
+            return refuse(ToolTrouble, "cannot write a log in " + logDirectory());
 
         const int locked = lock();
-        if (locked != ExitAsAsked)
+        if (locked != ToolOk)
             return locked;
         const bool installs = asked.commandLine.action == 'i';
-        const int checked = installs ? checkPackage() : ExitAsAsked;
-        if (checked != ExitAsAsked)
+        const int checked = installs ? checkPackage() : ToolOk;
+        if (checked != ToolOk)
             return checked;
         logPlan(asked);
         return start();
@@ -164,7 +165,7 @@ public:
 private:
     int refuse(int status, const std::string& reason)
     {
-        std::cerr << "zorctl: " << shown(reason) << '\n';
+        complain(shown(reason));
         if (log_.descriptor() >= 0)
             log_.line(reason);
         return status;
@@ -183,28 +184,27 @@ private:
         switch (takeLock(path, true, options_.wait, lock_)) {
         case LockState::Held:
             log_.line("holding the lock " + path);
-            return ExitAsAsked;
+            return ToolOk;
         case LockState::Busy:
-            return refuse(ExitLocked, "another run holds " + path);
+            return refuse(ToolLocked, "another run holds " + path);
         case LockState::CannotLock:
             break;
         }
-        return refuse(ExitLocked, "cannot lock " + path);
+        return refuse(ToolLocked, "cannot lock " + path);
     }
 
     int checkPackage()
     {
         if (private_.path().empty())
-            return refuse(ExitCouldNotCheck, "cannot create a directory for the package");
+            return refuse(ToolTrouble, "cannot create a directory for the package");
         package_ = joinPath(private_.path(), "package.spb");
         const int error = copyPrivately(spbPackage, package_, PackageLimit);
         if (error == ENOSPC || error == EDQUOT || error == EIO)
-            return refuse(ExitCouldNotCheck,
-                          "cannot copy " + spbPackage + ": " + std::strerror(error));
+            return refuse(ToolTrouble, "cannot copy " + spbPackage + ": " + std::strerror(error));
         if (error != 0)
-            return refuse(ExitBadPackage, spbPackage + ": " + std::strerror(error));
-        const int verified = options_.signers.empty() ? ExitAsAsked : checkSignature();
-        return verified == ExitAsAsked ? checkContent() : verified;
+            return refuse(ToolBadPackage, spbPackage + ": " + std::strerror(error));
+        const int verified = options_.signers.empty() ? ToolOk : checkSignature();
+        return verified == ToolOk ? checkContent() : verified;
     }
 
     int checkSignature()
@@ -215,17 +215,17 @@ private:
         const std::string signers = joinPath(private_.path(), "signers");
         const int failed = copyPrivately(options_.signers, signers, SmallFileLimit);
         if (failed != 0)
-            return refuse(ExitCouldNotCheck, options_.signers + ": " + std::strerror(failed));
+            return refuse(ToolTrouble, options_.signers + ": " + std::strerror(failed));
         const int error = copyPrivately(source, signature, SmallFileLimit);
         if (error != 0)
-            return refuse(ExitBadSignature, source + ": " + std::strerror(error));
+            return refuse(ToolBadSignature, source + ": " + std::strerror(error));
         const std::string tool = findProgram("ssh-keygen");
         if (tool.empty())
-            return refuse(ExitCouldNotCheck, "ssh-keygen is not in PATH");
+            return refuse(ToolTrouble, "ssh-keygen is not in PATH");
 
         const std::string signer = findSigner(tool, signature, signers);
         if (signer.empty())
-            return refuse(ExitBadSignature,
+            return refuse(ToolBadSignature,
                           spbPackage + ": signed by nobody of " + options_.signers);
         const ScopedFd content(open(package_.c_str(), O_RDONLY | O_CLOEXEC));
         const ChildSetup setup = {content.get(), log_.descriptor(), log_.descriptor(), -1};
@@ -233,9 +233,9 @@ private:
                                        SignatureNamespace, "-s", signature},
                                       setup);
         if (status != 0)
-            return refuse(ExitBadSignature, spbPackage + ": the signature is not valid");
+            return refuse(ToolBadSignature, spbPackage + ": the signature is not valid");
         log_.line("signed by " + signer);
-        return ExitAsAsked;
+        return ToolOk;
     }
 
     /// The first name in `signers` under which the key of `signature` may sign; empty if there is
@@ -264,14 +264,14 @@ private:
     {
         const std::string tool = findProgram("spb");
         if (tool.empty())
-            return refuse(ExitCouldNotCheck, "spb is neither next to zorctl nor in PATH");
+            return refuse(ToolTrouble, "spb is neither next to zorctl nor in PATH");
         const int status =
             runProgram({tool, "check", package_}, {-1, log_.descriptor(), log_.descriptor(), -1});
         if (status < 0 || !WIFEXITED(status) || WEXITSTATUS(status) > PackageFails)
-            return refuse(ExitCouldNotCheck, "spb check could not be run");
+            return refuse(ToolTrouble, "spb check could not be run");
         if (WEXITSTATUS(status) == PackageFails)
-            return refuse(ExitBadPackage, spbPackage + " cannot be installed; see " + log_.path());
-        return ExitAsAsked;
+            return refuse(ToolBadPackage, spbPackage + " cannot be installed; see " + log_.path());
+        return ToolOk;
     }
 
     void logPlan(const PlannedRun& asked)
@@ -311,14 +311,14 @@ private:
         const int status = runProgramTwofold(commandLine(), {STDIN_FILENO, -1, -1, lock_.get()},
                                              STDOUT_FILENO, log_.descriptor());
         if (status < 0)
-            return refuse(ExitCouldNotCheck, "cannot start " + installer_);
+            return refuse(ToolTrouble, "cannot start " + installer_);
         if (WIFSIGNALED(status)) {
             log_.line("wzorinst was ended by signal " + std::to_string(WTERMSIG(status)));
             endedBy_ = WTERMSIG(status);
-            return ExitDifferences;
+            return ToolDiffers;
         }
         log_.line("wzorinst ended with status " + std::to_string(WEXITSTATUS(status)));
-        return WEXITSTATUS(status) == 127 ? ExitCouldNotCheck : WEXITSTATUS(status);
+        return WEXITSTATUS(status) == 127 ? ToolTrouble : WEXITSTATUS(status);
     }
 
 public:
@@ -340,7 +340,7 @@ private:
 int runInstaller(const RunOptions& options)
 {
     int signalNumber = 0;
-    int status = ExitAsAsked;
+    int status = ToolOk;
     {
         GuardedRun run(options);
         status = run.run();

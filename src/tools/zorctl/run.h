@@ -12,9 +12,9 @@ struct RunOptions {
     std::string signers;      ///< file of allowed signers; empty: no signature is asked for
     std::string signature;    ///< its file; empty: that of the package with ".sig"
     std::string logDirectory; ///< empty: the usual one
-    long wait = 600;          ///< seconds to wait for the lock
+    int wait = 600;           ///< seconds to wait for the lock
 };
 
-/// Runs the installer. Returns its exit status (0 or 1), or ExitCouldNotCheck, ExitBadPackage,
-/// ExitLocked or ExitBadSignature: it was not started then.
+/// Runs the installer. Returns its exit status (0 or 1), or ToolTrouble, ToolBadPackage,
+/// ToolLocked or ToolBadSignature: it was not started then.
 [[nodiscard]] int runInstaller(const RunOptions& options);

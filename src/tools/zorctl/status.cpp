@@ -6,8 +6,10 @@
 #include "json_report.h"
 #include "locations.h"
 #include "other_users.h"
+#include "shown_text.h"
 #include "survey.h"
 #include "text_output.h"
+#include "tool_output.h"
 
 #include <algorithm>
 #include <cctype>
@@ -25,26 +27,26 @@ constexpr int Yellow = 33;
 /// The text of a member: a list is joined by blanks, null is `-`.
 std::string textOf(const Json& value)
 {
-    if (value.is_string())
-        return shown(value.get_ref<const std::string&>());
-    if (value.is_null())
+    if (value.text() != nullptr)
+        return shown(*value.text());
+    if (value.isNull())
         return "-";
-    if (value.is_boolean())
-        return value.get<bool>() ? "yes" : "no";
+    if (value.boolean() != nullptr)
+        return *value.boolean() ? "yes" : "no";
     return value.dump();
 }
 
 bool isUsedBy(const Json& installation, const std::string& exploiter)
 {
-    const Json& list = installation["exploiters"];
-    return list.is_array() &&
-           std::find(list.begin(), list.end(), jsonText(exploiter)) != list.end();
+    const auto* const list = installation["exploiters"].list();
+    return list != nullptr &&
+           std::find(list->begin(), list->end(), jsonText(exploiter)) != list->end();
 }
 
 /// The installations that `options` ask for.
-Json collect(const StatusOptions& options)
+std::vector<Json> collect(const StatusOptions& options)
 {
-    Json found = Json::array();
+    std::vector<Json> found;
     if (options.type != valueInstallLocal)
         found.push_back(toJson(surveyShared()));
     if (options.type != valueInstallGlobal)
@@ -55,29 +57,26 @@ Json collect(const StatusOptions& options)
             if (account.home == own)
                 continue;
             Json other = surveyOther(account);
-            if (other["health"] != "absent")
+            if (!(other["health"] == "absent"))
                 found.push_back(std::move(other));
         }
     }
-    if (options.exploiter.empty())
-        return found;
-    Json used = Json::array();
-    std::copy_if(found.begin(), found.end(), std::back_inserter(used),
-                 [&](const Json& one) { return isUsedBy(one, options.exploiter); });
-    return used;
+    if (!options.exploiter.empty())
+        std::erase_if(found, [&](const Json& one) { return !isUsedBy(one, options.exploiter); });
+    return found;
 }
 
-int exitStatusOf(const Json& installations)
+int exitStatusOf(const std::vector<Json>& installations)
 {
     const auto any = [&](const char* health) {
         return std::any_of(installations.begin(), installations.end(),
                            [&](const Json& one) { return one["health"] == health; });
     };
     if (any("damaged"))
-        return ExitDifferences;
+        return ToolDiffers;
     if (any("intact"))
-        return ExitAsAsked;
-    return any("unknown") ? ExitCouldNotCheck : ExitNoInstallation;
+        return ToolOk;
+    return any("unknown") ? ToolTrouble : ToolNotInstalled;
 }
 
 std::string titleOf(const Json& one)
@@ -95,33 +94,34 @@ std::string colouredHealth(const std::string& health)
 }
 
 /// The texts of a list, of problems their codes, with `separator` between them.
-std::string joined(const Json& list, char separator)
+std::string joined(const std::vector<Json>& list, char separator)
 {
     std::string text;
     for (const Json& one : list) {
         if (!text.empty())
             text += separator;
-        text += textOf(one.is_object() ? one["code"] : one);
+        text += textOf(one.members() != nullptr ? one["code"] : one);
     }
     return text;
 }
 
-std::string listText(const Json& list)
+std::string listText(const Json& value)
 {
-    if (!list.is_array())
-        return textOf(list);
-    return list.empty() ? "none" : joined(list, ' ');
+    if (value.list() == nullptr)
+        return textOf(value);
+    return value.list()->empty() ? "none" : joined(*value.list(), ' ');
 }
 
 void printInstallation(const Json& one)
 {
-    std::cout << "\nStatus of " << titleOf(one) << ": "
-              << colouredHealth(one["health"].get<std::string>()) << '\n'
+    std::cout << "\nStatus of " << titleOf(one) << ": " << colouredHealth(textOf(one["health"]))
+              << '\n'
               << "INI file = " << textOf(one["registry"]["path"]) << '\n';
-    for (const Json& problem : one["problems"])
+    const auto* const problems = one["problems"].list();
+    for (const Json& problem : problems != nullptr ? *problems : std::vector<Json>())
         std::cout << coloured("Problem", Red) << " = " << textOf(problem["code"]) << ": "
                   << textOf(problem["text"]) << '\n';
-    if (one["home"].is_null() || one["health"] == "unknown") {
+    if (one["home"].isNull() || one["health"] == "unknown") {
         std::cout << (one["health"] == "unknown" ? "Cannot be read\n" : "Not installed\n");
         return;
     }
@@ -134,19 +134,20 @@ void printInstallation(const Json& one)
               << textOf(one["index"]["files"]) << " files\n"
               << "Recorded type = " << textOf(one["recorded_type"]) << '\n'
               << "Single-user mode = " << textOf(one["single_user_mode"]) << '\n';
-    if (!one["backups"].is_array() || one["backups"].empty())
+    const auto* const backups = one["backups"].list();
+    if (backups == nullptr || backups->empty())
         std::cout << "Leftover backups = " << listText(one["backups"]) << '\n';
     else
-        for (const Json& backup : one["backups"])
+        for (const Json& backup : *backups)
             std::cout << "Leftover backup = " << textOf(backup) << '\n';
 }
 
-void printText(const Json& report)
+void printText(const Json& report, const std::vector<Json>& installations)
 {
     std::cout << "ZOR installer version: " << zorBuildStamp << '\n'
               << "Default install type: " << textOf(report["default_install_type"]) << '\n'
               << "Corvan common dir = " << textOf(report["common_directory"]) << '\n';
-    for (const Json& one : report["installations"])
+    for (const Json& one : installations)
         printInstallation(one);
 }
 
@@ -154,8 +155,8 @@ void printText(const Json& report)
 /// A list becomes one line per value, in which a newline is escaped.
 void printAssignments(const std::string& name, const Json& value)
 {
-    if (value.is_object()) {
-        for (const auto& [key, member] : value.items())
+    if (value.members() != nullptr) {
+        for (const auto& [key, member] : *value.members())
             printAssignments(name + "_" + key, member);
         return;
     }
@@ -164,20 +165,20 @@ void printAssignments(const std::string& name, const Json& value)
         return static_cast<char>(std::toupper(c)); // in the "C" locale
     });
     std::string text;
-    if (value.is_array())
-        text = joined(value, '\n');
-    else if (!value.is_null())
+    if (value.list() != nullptr)
+        text = joined(*value.list(), '\n');
+    else if (!value.isNull())
         text = textOf(value);
     std::cout << variable << "=" << shellQuoted(text) << '\n';
 }
 
-void printShell(const Json& report)
+void printShell(const Json& report, const std::vector<Json>& installations)
 {
     printAssignments("zorctl_schema", report["schema"]);
     printAssignments("zorctl_common_directory", report["common_directory"]);
-    printAssignments("zorctl_count", report["installations"].size());
+    printAssignments("zorctl_count", installations.size());
     std::size_t number = 0;
-    for (const Json& one : report["installations"])
+    for (const Json& one : installations)
         printAssignments("zorctl_" + std::to_string(number++), one);
 }
 
@@ -188,13 +189,17 @@ int showStatusReport(const StatusOptions& options)
     Json report = reportHead("status", StatusSchema);
     report["default_install_type"] = installTypeName(!isRoot());
     report["common_directory"] = jsonText(readCommonDirectory(true));
-    report["installations"] = collect(options);
+    const std::vector<Json> installations = collect(options);
 
-    if (options.format == "json")
+    if (options.format == "json") {
+        report["installations"] = Json::array();
+        for (const Json& one : installations)
+            report["installations"].push_back(one);
         printJson(report);
-    else if (options.format == "shell")
-        printShell(report);
-    else
-        printText(report);
-    return exitStatusOf(report["installations"]);
+    } else if (options.format == "shell") {
+        printShell(report, installations);
+    } else {
+        printText(report, installations);
+    }
+    return exitStatusOf(installations);
 }

@@ -10,7 +10,7 @@ struct StatusOptions {
     std::string exploiter; ///< only installations that it uses; empty: all
 };
 
-/// Prints the report on standard output; changes nothing. Returns an ExitStatus: ExitDifferences if
-/// an installation is damaged, ExitNoInstallation if there is none, ExitCouldNotCheck if the only
+/// Prints the report on standard output; changes nothing. Returns a ToolStatus: ToolDiffers if
+/// an installation is damaged, ToolNotInstalled if there is none, ToolTrouble if the only
 /// registries there are cannot be read.
 [[nodiscard]] int showStatusReport(const StatusOptions& options);

@@ -15,11 +15,12 @@
 #include "property_file.h"
 #include "settings.h"
 #include "settings_upgrade.h"
+#include "shown_text.h"
 #include "single_user_mode.h"
 #include "survey.h"
 #include "template_variables.h"
 #include "text.h"
-#include "text_output.h"
+#include "tool_output.h"
 #include "zip_file.h"
 
 #include <algorithm>
@@ -482,20 +483,20 @@ bool counts(const Difference& difference, const VerifyOptions& options)
 
 int exitStatusOf(const std::vector<Difference>& differences, const VerifyOptions& options)
 {
-    int status = ExitAsAsked;
+    int status = ToolOk;
     for (const Difference& difference : differences) {
         if (!counts(difference, options))
             continue;
         if (difference.kind != "unknown")
-            return ExitDifferences;
-        status = ExitCouldNotCheck;
+            return ToolDiffers;
+        status = ToolTrouble;
     }
     return status;
 }
 
-int complain(const std::string& what, int status)
+int refuse(const std::string& what, int status)
 {
-    std::cerr << "zorctl: " << shown(what) << '\n';
+    complain(shown(what));
     return status;
 }
 
@@ -507,20 +508,20 @@ int verifyInstallation(const VerifyOptions& options)
     const ScopedFd lock = lockForReading(localInstall);
     const Installation found = localInstall ? surveyOwn() : surveyShared();
     if (found.registryState == "missing")
-        return complain(found.registryPath + ": nothing is installed", ExitNoInstallation);
+        return refuse(found.registryPath + ": nothing is installed", ToolNotInstalled);
     if (found.registryState != "complete")
-        return complain(found.registryPath + ": " + found.registryState,
-                        found.registryState == "unreadable" ? ExitCouldNotCheck : ExitDifferences);
+        return refuse(found.registryPath + ": " + found.registryState,
+                      found.registryState == "unreadable" ? ToolTrouble : ToolDiffers);
     if (found.singleUserMode.value_or(false))
         enterSingleUserMode();
 
     Verification verification(found, options);
     if (!options.spb.empty() && !verification.withPackage())
-        return complain(options.spb + ": package not found or not valid", ExitCouldNotCheck);
+        return refuse(options.spb + ": package not found or not valid", ToolTrouble);
     if (options.spb.empty() && !verification.withIndex())
-        return complain(fileIndexPath(found.registry.homeDirectory) + ": " + found.indexState +
-                            "; name the package to compare with it",
-                        ExitCouldNotCheck);
+        return refuse(fileIndexPath(found.registry.homeDirectory) + ": " + found.indexState +
+                          "; name the package to compare with it",
+                      ToolTrouble);
 
     const int status = exitStatusOf(verification.differences(), options);
     if (!options.json) {

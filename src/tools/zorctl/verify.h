@@ -12,5 +12,5 @@ struct VerifyOptions {
     bool strict = false;       ///< these two count as differences, too
 };
 
-/// Prints what differs; changes nothing. Returns an ExitStatus.
+/// Prints what differs; changes nothing. Returns a ToolStatus.
 [[nodiscard]] int verifyInstallation(const VerifyOptions& options);

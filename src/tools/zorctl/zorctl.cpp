@@ -1,6 +1,6 @@
 // zorctl: looks at, checks, plans and repairs installations of the ZOR toolkit.
 
-#include "build_stamp.h"
+#include "command_line_tool.h"
 #include "doctor.h"
 #include "exit_status.h"
 #include "plan.h"
@@ -9,10 +9,8 @@
 #include "status.h"
 #include "verify.h"
 
-#include <CLI/CLI.hpp>
 #include <clocale>
 #include <csignal>
-#include <iostream>
 #include <ostream>
 #include <string>
 #include <string_view>
@@ -21,7 +19,7 @@
 namespace {
 
 constexpr const char* ExitTable =
-    "Exit status: 0 as asked, 1 differences or damage, 2 could not check or wrong usage,\n"
+    "Exit status: 0 as asked, 1 differences or damage, 2 could not check or wrong usage, "
     "3 no installation; of \"run\" also 65 package, 75 lock, 77 signature.";
 
 /// The installer's library reports on its log stream; here, reports are our own.
@@ -46,103 +44,126 @@ int cutAfterDashes(int argc, char** argv)
 }
 
 /// The command line of the installer: what `command` did not know, and what follows "--".
-std::vector<std::string> installerArguments(const CLI::App& command)
+std::vector<std::string> installerArguments(const CLI::App* command)
 {
-    std::vector<std::string> arguments = command.remaining();
+    std::vector<std::string> arguments = remaining(command);
     arguments.insert(arguments.end(), afterDashes.begin(), afterDashes.end());
     return arguments;
 }
 
-/// Adds the subcommand "status", which puts its result into `status`.
-void addStatus(CLI::App& app, int& status)
+/// The options of all commands.
+struct Options {
+    StatusOptions status;
+    bool statusJson = false;
+    VerifyOptions verify;
+    PlanOptions plan;
+    RunOptions run;
+    DoctorOptions doctor;
+};
+
+void addJson(CLI::App* command, bool& json)
 {
-    CLI::App* const command =
-        app.add_subcommand("status", "Show what is installed and whether it is intact");
-    static StatusOptions options;
-    static bool json = false;
-    command->add_option("--format", options.format, "text (the default), json or shell")
-        ->check(CLI::IsMember({"text", "json", "shell"}));
-    command->add_flag("--json", json, "the same as --format json");
-    command->add_flag("--all-users", options.allUsers, "also the installations of all users");
-    command->add_option("--type", options.type, "only the shared (global) or per-user (local) ones")
-        ->check(CLI::IsMember({"global", "local"}));
-    command->add_option("--exploiter", options.exploiter, "only installations that it uses");
-    command->callback([&status] {
-        if (json)
-            options.format = "json";
-        status = showStatusReport(options);
-    });
+    addFlag(command, "--json", json, "print JSON");
 }
 
-/// Adds the subcommand "verify".
-void addVerify(CLI::App& app, int& status)
+void addType(CLI::App* command, std::string& type, const char* text)
 {
-    CLI::App* const command =
-        app.add_subcommand("verify", "Compare the installation with its package or its index");
-    static VerifyOptions options;
-    command->add_option("SPB", options.spb, "the package; without it, the index is compared with");
-    command->add_flag("--json", options.json, "print JSON");
-    command->add_option("--type", options.type, "the shared (global) or your own (local) one")
-        ->check(CLI::IsMember({"global", "local"}));
-    command->add_flag("--no-foreign", options.noForeign, "leave out files that nobody installed");
-    command->add_flag("--no-customised", options.noCustomised, "leave out changed settings");
-    command->add_flag("--strict", options.strict, "end with 1 for these two as well");
-    command->callback([&status] { status = verifyInstallation(options); });
+    addOption(command, "--type", type, text,
+              {.argument = "global|local", .choices = {"global", "local"}});
 }
 
-/// Adds the subcommand "plan".
-void addPlan(CLI::App& app, int& status)
+ToolCommand addStatus(CLI::App& app, StatusOptions& options, bool& json)
 {
     CLI::App* const command =
-        app.add_subcommand("plan", "Tell what a run of wzorinst would do, without doing it");
-    static PlanOptions options;
-    command->add_flag("--json", options.json, "print JSON");
-    command->add_flag("--files", options.files, "name all files");
-    command
-        ->add_option("--unchanged-exit", options.unchangedExit,
-                     "the exit status if nothing would change")
-        ->check(CLI::Range(0, 255));
-    command->footer("Behind the options: i|r EXPLOITER and the options of wzorinst.");
-    command->prefix_command();
-    command->callback([command, &status] {
-        options.arguments = installerArguments(*command);
-        status = planRun(options);
-    });
+        addCommand(app, "status", "show what is installed and whether it is intact",
+                   "Shows what is installed, for whom, and whether it is intact.");
+    addOption(command, "--format", options.format,
+              "text (the default), JSON, or assignments for eval",
+              {.argument = "text|json|shell", .choices = {"text", "json", "shell"}});
+    addFlag(command, "--json", json, "the same as --format json");
+    addFlag(command, "--all-users", options.allUsers, "also the installations of all users");
+    addType(command, options.type, "only the shared (global) or per-user (local) ones");
+    addOption(command, "--exploiter", options.exploiter, "only installations that it uses",
+              {.argument = "ID"});
+    return {command,
+            [&options, &json] {
+                if (json)
+                    options.format = "json";
+                return showStatusReport(options);
+            },
+            ToolTrouble};
 }
 
-/// Adds the subcommand "run".
-void addRun(CLI::App& app, int& status)
-{
-    CLI::App* const command = app.add_subcommand(
-        "run", "Run wzorinst under a lock, with a log, on a package that was checked");
-    static RunOptions options;
-    command->add_option("--signers", options.signers,
-                        "ask for a signature by one of these (see ssh-keygen(1), ALLOWED SIGNERS)");
-    command->add_option("--signature", options.signature, "the signature, if not SPB.sig");
-    command->add_option("--log-dir", options.logDirectory, "the directory of the log");
-    command->add_option("--wait", options.wait, "how many seconds to wait for the lock")
-        ->check(CLI::Range(0L, 1'000'000L));
-    command->footer("Behind the options: -- i|r EXPLOITER and the options of wzorinst.");
-    command->prefix_command();
-    command->callback([command, &status] {
-        options.arguments = installerArguments(*command);
-        status = runInstaller(options);
-    });
-}
-
-/// Adds the subcommand "doctor".
-void addDoctor(CLI::App& app, int& status)
+ToolCommand addVerify(CLI::App& app, VerifyOptions& options)
 {
     CLI::App* const command =
-        app.add_subcommand("doctor", "Tell what an interrupted run left, and put it right");
-    static DoctorOptions options;
-    command->add_flag("--apply", options.apply, "do what is to be done");
-    command->add_flag("--json", options.json, "print JSON");
-    command->add_option("--type", options.type, "the shared (global) or your own (local) one")
-        ->check(CLI::IsMember({"global", "local"}));
-    command->add_option("--home", options.home,
-                        "where a first installation was interrupted, if not in the usual place");
-    command->callback([&status] { status = examine(options); });
+        addCommand(app, "verify", "compare the installation with its package or its index",
+                   "Compares the installation with its package or, without one, with its index.");
+    addOption(command, "SPB", options.spb, "the package; without it, the index is compared with");
+    addJson(command, options.json);
+    addType(command, options.type, "the shared (global) or your own (local) one");
+    addFlag(command, "--no-foreign", options.noForeign, "leave out files that nobody installed");
+    addFlag(command, "--no-customised", options.noCustomised, "leave out changed settings");
+    addFlag(command, "--strict", options.strict, "end with 1 for these two as well");
+    return {command, [&options] { return verifyInstallation(options); }, ToolTrouble};
+}
+
+ToolCommand addPlan(CLI::App& app, PlanOptions& options)
+{
+    CLI::App* const command =
+        addCommand(app, "plan", "tell what a run of wzorinst would do, without doing it",
+                   "Tells what a run of wzorinst would do, without doing it. Behind the options: "
+                   "i|r EXPLOITER and the options of wzorinst.");
+    addJson(command, options.json);
+    addFlag(command, "--files", options.files, "name all files");
+    addNumber(command, "--unchanged-exit", options.unchangedExit,
+              "the exit status if nothing would change", 255, "N");
+    allowMore(command);
+    return {command,
+            [command, &options] {
+                options.arguments = installerArguments(command);
+                return planRun(options);
+            },
+            ToolTrouble};
+}
+
+ToolCommand addRun(CLI::App& app, RunOptions& options)
+{
+    CLI::App* const command =
+        addCommand(app, "run", "run wzorinst under a lock, with a log, on a checked package",
+                   "Runs wzorinst under a lock, with a log, on a package that was checked. Behind "
+                   "the options: -- i|r EXPLOITER and the options of wzorinst.");
+    addOption(command, "--signers", options.signers,
+              "ask for a signature by one of these (see ssh-keygen(1), ALLOWED SIGNERS)",
+              {.argument = "FILE"});
+    addOption(command, "--signature", options.signature, "the signature, if not SPB.sig",
+              {.argument = "FILE"});
+    addOption(command, "--log-dir", options.logDirectory, "the directory of the log",
+              {.argument = "DIR"});
+    addNumber(command, "--wait", options.wait, "how many seconds to wait for the lock", 1'000'000,
+              "SECONDS");
+    allowMore(command);
+    return {command,
+            [command, &options] {
+                options.arguments = installerArguments(command);
+                return runInstaller(options);
+            },
+            ToolTrouble};
+}
+
+ToolCommand addDoctor(CLI::App& app, DoctorOptions& options)
+{
+    CLI::App* const command =
+        addCommand(app, "doctor", "tell what an interrupted run left, and put it right",
+                   "Tells what an interrupted run left, and what to do. Changes nothing without "
+                   "--apply.");
+    addFlag(command, "--apply", options.apply, "do what is to be done");
+    addJson(command, options.json);
+    addType(command, options.type, "the shared (global) or your own (local) one");
+    addOption(command, "--home", options.home,
+              "where a first installation was interrupted, if not in the usual place",
+              {.argument = "DIR"});
+    return {command, [&options] { return examine(options); }, ToolTrouble};
 }
 
 } // namespace
@@ -154,22 +175,17 @@ int main(int argc, char** argv)
     completeLayoutNames();
     (void)std::signal(SIGPIPE, SIG_IGN); // writes fail instead; programs we start get theirs back
 
-    CLI::App app("Looks at, checks, plans and repairs installations of the ZOR toolkit.", "zorctl");
-    app.footer(ExitTable);
-    app.set_version_flag("--version", "zorctl " + zorBuildStamp);
-    app.require_subcommand(1);
-    int status = ExitAsAsked;
-    addStatus(app, status);
-    addVerify(app, status);
-    addPlan(app, status);
-    addRun(app, status);
-    addDoctor(app, status);
-
-    try {
-        app.parse(cutAfterDashes(argc, argv), argv);
-    } catch (const CLI::ParseError& error) {
-        return app.exit(error) == 0 ? ExitAsAsked : ExitCouldNotCheck;
-    }
-    std::cout.flush();
-    return std::cout ? status : ExitCouldNotCheck;
+    const auto app = makeCommandLine(
+        "zorctl", "Looks at, checks, plans and repairs installations of the ZOR toolkit.",
+        ExitTable);
+    Options options;
+    return runTool(*app,
+                   {
+                       addStatus(*app, options.status, options.statusJson),
+                       addVerify(*app, options.verify),
+                       addPlan(*app, options.plan),
+                       addRun(*app, options.run),
+                       addDoctor(*app, options.doctor),
+                   },
+                   cutAfterDashes(argc, argv), argv);
 }
