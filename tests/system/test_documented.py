@@ -10,7 +10,7 @@ import pytest
 from harness.checks import not_printed, printed_lines
 from harness.machine import ANN as USER
 from harness.machine import SPB
-from harness.shared_machine import ANN, GUEST, SharedMachine, why_not
+from harness.shared_machine import ANN, GUEST, KEY, SharedMachine, why_not
 
 HOME = "/opt/corvan/zor"
 REGISTRY = "/etc/zor/zor.ini"
@@ -31,6 +31,11 @@ def install(machine, *options, exploiter="ABC", **how):
     outcome = machine.run("i", exploiter, "-s", SPB, *options, **how)
     assert outcome.status == 0, outcome.stdout
     return outcome
+
+
+def with_control(machine, script):
+    """A package whose scanner control runs `script`."""
+    machine.pack({"bin/trawlcfg": b"#!/bin/sh\n" + script})
 
 
 # Failures.
@@ -167,6 +172,15 @@ def test_a_newline_in_a_name_forges_a_line_of_the_log(machine):
     assert outcome.status == 0
 
 
+def test_the_trace_directory_of_c_stays_after_the_last_removal(machine):
+    install(machine, "-c", "/srv/traces")
+    machine.plant("/srv/traces/zor.log", "mine\n")
+
+    assert machine.run("r", "ABC").status == 0
+
+    assert machine.read("/srv/traces/zor.log") == "mine\n"
+
+
 # Untrusted users.
 
 
@@ -200,6 +214,13 @@ def test_with_r_from_the_first_installation_nothing_is_open_to_everybody(machine
     assert writable_by_others(machine) == []
 
 
+def test_with_r_the_directories_of_the_setting_are_closed_to_the_group_too(machine):
+    install(machine, "-r")
+
+    assert machine.mode("/etc/kel/corvan/common/cfg") == 0o755
+    assert machine.mode("/etc/kel/corvan/common/cfg/log.properties") == 0o664
+
+
 def test_r_in_a_later_run_leaves_the_common_directory_open(machine):
     install(machine)
 
@@ -226,6 +247,35 @@ def test_a_file_of_root_that_another_user_renames_gets_the_mode_of_its_new_name(
     assert machine.mode(HOME + "/bin/etc/trawlfs") == 0o777
 
 
+def test_a_directory_that_a_group_can_write_to_counts_as_one_where_others_can_plant(shared_machine):
+    machine = shared_machine
+    install(machine)
+    machine.remove(HOME + "/ZOR_files")
+    os.link(machine.at(KEY), machine.at(HOME + "/ZOR_files"))
+    machine.change_mode(HOME, 0o775)
+
+    install(machine)
+
+    assert machine.read(KEY) == "the key\n"
+
+
+def test_a_rollback_restores_owner_group_and_mode_of_the_registry(shared_machine):
+    machine = shared_machine
+    install(machine)
+    machine.register(version="9.1.0.0000", date="20/01/01")
+    os.chown(machine.at(REGISTRY), ANN.uid, GUEST.uid)
+    machine.change_mode(REGISTRY, 0o640)
+    before = machine.state(REGISTRY)
+    # After the registry was saved, the command that enables the scanners is interrupted.
+    with_control(machine, b'case "$*" in *enable*) kill -INT $$ ;; esac\n')
+
+    outcome = machine.run("i", "XYZ", "-s", SPB)
+
+    printed_lines(outcome, "Saving INI file to /etc/zor/zor.ini")
+    printed_lines(outcome, "Installation failed, rolling back")
+    assert machine.state(REGISTRY) == before
+
+
 def test_an_index_that_the_owner_of_the_home_made_first_stays_theirs(shared_machine):
     machine = shared_machine
     machine.as_user(ANN, lambda: os.mkdir(machine.at("/home/ann/zor")))
@@ -249,6 +299,15 @@ def test_a_directory_with_this_character_is_not_called_by_its_name(machine, char
 def test_a_directory_can_run_a_command(machine):
     assert machine.run("i", "ABC", "-s", SPB, "-d", "/opt/a;b", "-c", "/srv/c;d").status == 1
     assert machine.run("i", "ABC", "-s", SPB, "-c", "/srv/$(id>/var/scanners/ran)").status == 0
+
+    assert machine.read("/var/scanners/ran").startswith("uid=0(root)")
+
+
+def test_the_value_of_the_common_directory_can_run_a_command(machine):
+    setting = "corvan_common_dir=/srv/`id>/var/scanners/ran`\n"
+    machine.plant("/etc/kel/corvan/common/cfg/log.properties", setting)
+
+    machine.run("i", "ABC", "-s", SPB)
 
     assert machine.read("/var/scanners/ran").startswith("uid=0(root)")
 
@@ -290,3 +349,41 @@ def test_programs_run_through_the_shell_follow_links_of_strangers(shared_machine
     assert outcome.commands == [
         f"{HOME}/bin/trawlcfg [-s] [common_trace_path] [/home/guest/traces]"
     ]
+
+
+def test_an_error_of_the_command_line_empties_the_log_before_it(machine):
+    machine.plant("/var/log", "of an earlier run\n")
+
+    assert machine.run("i", "ABC", "-o", "/var/log", "--wrong").status == 1
+
+    assert machine.read("/var/log") == ""
+
+
+# Descriptors.
+
+
+def test_commands_inherit_the_standard_descriptors_only(machine):
+    with_control(machine, b"ls /proc/self/fd >/var/scanners/open\n")
+
+    script = 'exec "$0" i ABC -o /var/log -s /media/toolkit.spb 7</etc/passwd'
+    assert machine.run_in_shell(script).status == 0
+
+    assert machine.read("/var/scanners/open") == "0\n1\n2\n3\n"  # 3 is the directory itself
+
+
+def test_a_daemon_of_a_scanner_does_not_keep_the_lock(machine):
+    with_control(machine, b"exec >/dev/null 2>&1 </dev/null; setsid sleep 60 &\n")
+
+    outcome = machine.run_in_shell(
+        'flock -F /var/lock "$0" i ABC -o /var/log -s /media/toolkit.spb;'
+        "flock -n /var/lock echo free"
+    )
+
+    assert outcome.stdout == "free\n"
+
+
+def test_standard_output_that_is_closed_does_not_become_another_file(machine):
+    outcome = machine.run_in_shell('"$0" i ABC -s /media/toolkit.spb >&-')
+
+    assert outcome.status == 0
+    assert machine.read(REGISTRY).startswith("ZOR_Version = 9.2.30.0000\n")
