@@ -327,6 +327,9 @@ def test_an_exploiter_with_a_newline_forges_lines_of_the_registry(machine):
 
 
 def test_without_proc_modes_of_what_cannot_be_read_stay(machine):
+    with open(machine.binary, "rb") as program:
+        if b"__asan_init" in program.read():
+            pytest.skip("the leak checker of the sanitized program needs /proc")
     install(machine, user=USER)
     home = "/home/ann/corvan/zor"
     machine.plant(home + "/_uninst", "", 0o100)
