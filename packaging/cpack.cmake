@@ -66,7 +66,7 @@ set(CPACK_DEBIAN_WZORINST_PACKAGE_SUGGESTS "wzorinst-spb, wzorinst-zorctl")
 set(CPACK_DEBIAN_SPB_PACKAGE_NAME wzorinst-spb)
 set(CPACK_DEBIAN_SPB_PACKAGE_SECTION "devel\nMulti-Arch: foreign")
 set(CPACK_DEBIAN_SPB_PACKAGE_DEPENDS "libc6 (>= ${c_library})")
-set(CPACK_DEBIAN_SPB_PACKAGE_SUGGESTS openssh-client)
+set(CPACK_DEBIAN_SPB_PACKAGE_SUGGESTS "debhelper, openssh-client")
 # zorctl shares the installer's library and starts both programs: all are of one version.
 set(CPACK_DEBIAN_ZORCTL_PACKAGE_NAME wzorinst-zorctl)
 set(CPACK_DEBIAN_ZORCTL_PACKAGE_SECTION "admin\nMulti-Arch: foreign")
@@ -98,12 +98,21 @@ set(CPACK_RPM_DEBUG_PACKAGE_NAME wzorinst-debuginfo)
 set(CPACK_RPM_DEBUG_PACKAGE_GROUP Development/Debug)
 set(CPACK_RPM_DEBUG_PACKAGE_REQUIRES "wzorinst = ${PROJECT_VERSION}-1")
 # Directories that belong to the system's own packages; and rpm neither changes files nor adds any.
+# The Perl files serve machines with debhelper alone, so they require nothing.
 set(CPACK_RPM_EXCLUDE_FROM_AUTO_FILELIST_ADDITION
     /usr/share/bash-completion
     /usr/share/bash-completion/completions
+    /usr/lib/rpm
+    /usr/lib/rpm/macros.d
+    /usr/share/debhelper
+    /usr/share/debhelper/autoscripts
     /usr/share/man
     /usr/share/man/man1
     /usr/share/man/man8
+    /usr/share/perl5
+    /usr/share/perl5/Debian
+    /usr/share/perl5/Debian/Debhelper
+    /usr/share/perl5/Debian/Debhelper/Sequence
     /usr/lib/debug
     /usr/lib/debug/usr
     /usr/lib/debug/usr/bin)
@@ -111,6 +120,8 @@ set(CPACK_RPM_SPEC_MORE_DEFINE
     "%define __os_install_post %{nil}
 %define _build_id_links none
 %define _buildhost localhost
+%define __requires_exclude ^perl|^/usr/bin/perl
+%define __provides_exclude ^perl
 %define use_source_date_epoch_as_buildtime 1
 %define clamp_mtime_to_source_date_epoch 1")
 

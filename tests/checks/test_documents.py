@@ -8,7 +8,7 @@ import subprocess
 import pytest
 
 from harness import REPOSITORY
-from harness.machine import ROOT, SPB, Machine
+from harness.machine import SPB, Machine
 
 DOCUMENTS = sorted([*REPOSITORY.glob("*.md"), *REPOSITORY.glob("docs/*.md")])
 IDS = [str(path.relative_to(REPOSITORY)) for path in DOCUMENTS]
@@ -212,81 +212,3 @@ def test_the_transcript_of_the_readme_is_what_the_example_toolkit_gives(machine,
 
     assert outcome.stdout.splitlines() == expected
     assert outcome.status == 0 and lines[-2:] == ["$ echo $?", "0"]
-
-
-SHELL_EXAMPLE, POSTINST, PRERM = [
-    block for block in code_blocks("docs/exploiters.md", "sh") if block.startswith("#!")
-]
-[RPM_EXAMPLE] = [
-    block for block in code_blocks("docs/exploiters.md", "sh") if block.startswith("%")
-]
-
-
-def rpm_script(section):
-    return RPM_EXAMPLE.split(f"%{section}\n")[1].split("\n%")[0]
-
-
-def exploiters(machine):
-    lines = [line for line in machine.run("t").stdout.splitlines() if line.startswith("Exploiter")]
-    return [line.removeprefix("Exploiter list = ") for line in lines]
-
-
-def with_media(machine):
-    """Puts the installer and the package where the packages of the examples carry them."""
-    machine.make_directory("/var/log")
-    machine.make_directory("/run")
-    machine.link("/opt/shop/media", "/media")
-    return machine
-
-
-def run_script(machine, script, *arguments):
-    machine.plant("/media/script.sh", script, 0o755)
-    return machine.execute(
-        ["/bin/sh", "/media/script.sh", *arguments],
-        user=ROOT,
-        umask=0o022,
-        environment=None,
-        options=(),
-        everywhere=False,
-    )
-
-
-def test_the_shell_example_installs(machine):
-    outcome = run_script(with_media(machine), SHELL_EXAMPLE)
-
-    assert (outcome.status, outcome.stderr) == (0, "")
-    assert exploiters(machine) == ["SHOP:"]
-    assert machine.read("/var/log/shop-zor.log").endswith("committing changes\nDone.\n")
-
-
-def test_the_shell_example_tells_a_failure(machine):
-    machine.plant(SPB, b"no package")
-
-    outcome = run_script(with_media(machine), SHELL_EXAMPLE)
-
-    assert outcome.status == 1
-    assert outcome.stderr == (
-        "The inventory toolkit could not be installed; see /var/log/shop-zor.log\n"
-    )
-
-
-def test_the_rpm_example_installs_keeps_and_removes(machine):
-    with_media(machine)
-
-    assert run_script(machine, rpm_script("post"), "1").status == 0
-    assert exploiters(machine) == ["SHOP:"]
-    assert run_script(machine, rpm_script("preun"), "1").status == 0
-    assert exploiters(machine) == ["SHOP:"]
-    assert run_script(machine, rpm_script("preun"), "0").status == 0
-    assert exploiters(machine) == []
-
-
-def test_the_debian_example_installs_and_removes(machine):
-    with_media(machine)
-
-    assert run_script(machine, POSTINST, "configure").status == 0
-    assert exploiters(machine) == ["SHOP:"]
-    assert run_script(machine, PRERM, "upgrade").status == 0
-    assert exploiters(machine) == ["SHOP:"]
-    assert run_script(machine, PRERM, "remove").status == 0
-    assert exploiters(machine) == []

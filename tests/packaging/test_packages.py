@@ -32,9 +32,15 @@ INSTALLED = """\
 """
 
 SPB_INSTALLED = """\
+755 /usr/bin/dh_wzorinst
 755 /usr/bin/spb
+644 /usr/lib/rpm/macros.d/macros.wzorinst
 644 /usr/share/bash-completion/completions/spb
+644 /usr/share/debhelper/autoscripts/postinst-wzorinst
+644 /usr/share/debhelper/autoscripts/postrm-wzorinst
+644 /usr/share/debhelper/autoscripts/prerm-wzorinst
 644 /usr/share/man/man1/spb.1.gz
+644 /usr/share/perl5/Debian/Debhelper/Sequence/wzorinst.pm
 """
 
 ZORCTL_INSTALLED = """\
