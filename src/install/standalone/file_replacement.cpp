@@ -156,11 +156,14 @@ int fill(int file, const ContentWriter& write)
     return std::fclose(stream.release()) == 0 && written ? 0 : error;
 }
 
-void noteIdentity(const ScopedFd& file, FileIdentity* identity)
+/// Reads which file is open. Returns 0 or an `errno`.
+int readIdentity(const ScopedFd& file, FileIdentity& identity)
 {
     struct stat status = {};
-    if (identity != nullptr && fstat(file.get(), &status) == 0)
-        *identity = identityOf(status);
+    if (fstat(file.get(), &status) != 0)
+        return errno;
+    identity = identityOf(status);
+    return 0;
 }
 
 int truncated(int file)
@@ -173,10 +176,14 @@ int truncated(int file)
 
 int writeInPlace(ScopedFd& existing, const ContentWriter& write, FileIdentity* written)
 {
-    noteIdentity(existing, written);
-    int error = truncated(existing.get());
+    FileIdentity identity;
+    int error = readIdentity(existing, identity);
+    if (error == 0)
+        error = truncated(existing.get());
     if (error == 0)
         error = fill(existing.get(), write);
+    if (error == 0 && written != nullptr)
+        *written = identity;
     return error == 0 ? closeWritten(existing) : writeErrorCode(error);
 }
 
@@ -193,6 +200,9 @@ int finish(const Place& place, ScopedFd& temporary, const ContentWriter& write,
         error = CannotPassOn;
     if (error == 0)
         error = syncFile(temporary.get());
+    FileIdentity identity;
+    if (error == 0)
+        error = readIdentity(temporary, identity);
     const ScopedFd lock(fcntl(temporary.get(), F_DUPFD_CLOEXEC, 0)); // held until the renaming
     if (error == 0 && close(temporary.release()) != 0)
         error = errno;
@@ -201,8 +211,8 @@ int finish(const Place& place, ScopedFd& temporary, const ContentWriter& write,
         error = errno;
     if (error != 0)
         deleteTemporary(place);
-    else
-        noteIdentity(lock, written);
+    else if (written != nullptr)
+        *written = identity;
     return error;
 }
 
@@ -268,7 +278,7 @@ int replaceFile(const std::string& path, mode_t mode, const ContentWriter& write
         return errno == ENOENT ? createNew(place, mode, write, written) : CannotOpenForWriting;
 
     struct stat status = {};
-    if (fstat(existing.get(), &status) == 0 && S_ISREG(status.st_mode))
+    if (!place.isMagic && fstat(existing.get(), &status) == 0 && S_ISREG(status.st_mode))
         return replaceExisting(place, existing, write, written);
     return writeInPlace(existing, write, written);
 }

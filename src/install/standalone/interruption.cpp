@@ -9,10 +9,18 @@
 
 namespace {
 
+constexpr int WatchedSignals[] = {SIGINT, SIGQUIT, SIGTERM, SIGHUP};
+
 constexpr int ShellSignalBase = 128; // a shell's exit status for a command that a signal killed
 
 volatile std::sig_atomic_t noted = 0;
 bool interruptible = false;
+
+bool isIgnored(int signal)
+{
+    struct sigaction action = {};
+    return sigaction(signal, nullptr, &action) == 0 && action.sa_handler == SIG_IGN;
+}
 
 void note(int signal)
 {
@@ -24,11 +32,10 @@ void note(int signal)
 
 void watchForSignals()
 {
-    for (const int signal : {SIGINT, SIGQUIT, SIGTERM, SIGHUP}) {
-        struct sigaction action = {};
-        if (sigaction(signal, nullptr, &action) != 0 || action.sa_handler == SIG_IGN)
+    for (const int signal : WatchedSignals) {
+        if (isIgnored(signal))
             continue;
-        action = {};
+        struct sigaction action = {};
         action.sa_handler = note;
         action.sa_flags = SA_RESTART;              // no step fails because of a signal
         (void)sigaction(signal, &action, nullptr); // cannot fail
@@ -54,17 +61,21 @@ void noteStatusOfCommand(int status)
 {
     for (const int signal : {SIGINT, SIGQUIT}) {
         const bool killed = WIFSIGNALED(status) && WTERMSIG(status) == signal;
-        if (killed || (WIFEXITED(status) && WEXITSTATUS(status) == ShellSignalBase + signal))
+        const bool reported = WIFEXITED(status) && WEXITSTATUS(status) == ShellSignalBase + signal;
+        if ((killed || reported) && !isIgnored(signal))
             note(signal);
     }
 }
 
 void endBySignal()
 {
-    if (noted == 0)
-        return;
     std::cout.flush();
     logstream->flush();
-    (void)std::signal(noted, SIG_DFL); // cannot fail
-    (void)std::raise(noted);
+    // From here on a signal ends the process by itself, so that none gets lost.
+    for (const int signal : WatchedSignals) {
+        if (!isIgnored(signal))
+            (void)std::signal(signal, SIG_DFL); // cannot fail
+    }
+    if (noted != 0)
+        (void)std::raise(noted);
 }
