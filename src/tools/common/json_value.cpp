@@ -77,6 +77,8 @@ Json::Json(const char* text) : value_(std::string(text)) {}
 Json::Json(std::string text) : value_(std::move(text)) {}
 Json::Json(std::string_view text) : value_(std::string(text)) {}
 Json::Json(std::initializer_list<Member> members) : value_(std::vector<Member>(members)) {}
+Json::Json(Signed number) : value_(number.value) {}
+Json::Json(Unsigned number) : value_(number.value) {}
 Json::Json(const Json& other) = default;
 Json::Json(Json&& other) noexcept = default;
 Json& Json::operator=(const Json& other) = default;

@@ -18,8 +18,7 @@
 #include <vector>
 
 /// A JSON value. The members of an object keep the order in which they were added. Texts must be
-/// valid UTF-8: those of
-/// shown() and jsonText() are.
+/// valid UTF-8: those of shown() and jsonText() are.
 class Json {
 public:
     struct Member;
@@ -32,12 +31,8 @@ public:
     /// An object of these members, with different names.
     Json(std::initializer_list<Member> members);
     template <std::integral Number>
-    Json(Number number)
+    Json(Number number) : Json(widened(number))
     {
-        if constexpr (std::signed_integral<Number>)
-            value_ = std::int64_t{number};
-        else
-            value_ = std::uint64_t{number};
     }
     Json(const Json& other);
     Json(Json&& other) noexcept;
@@ -74,6 +69,25 @@ public:
 
 private:
     friend struct JsonConversion; // to and from the library's values
+
+    // What the template above delegates to: here, where Member is incomplete, nothing can be made.
+    struct Signed {
+        std::int64_t value;
+    };
+    struct Unsigned {
+        std::uint64_t value;
+    };
+    explicit Json(Signed number);
+    explicit Json(Unsigned number);
+
+    template <std::integral Number>
+    static auto widened(Number number)
+    {
+        if constexpr (std::signed_integral<Number>)
+            return Signed{number};
+        else
+            return Unsigned{number};
+    }
 
     std::variant<std::nullptr_t, bool, std::int64_t, std::uint64_t, std::string, std::vector<Json>,
                  std::vector<Member>>
