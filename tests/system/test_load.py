@@ -8,7 +8,7 @@ from harness.machine import SPB
 
 # What the installer may hold for one entry, sanitizers included, and for everything else.
 KIB_AN_ENTRY = 1
-KIB_OTHERWISE = 1024
+KIB_OTHERWISE = 2048
 
 LOADS = (
     Load("many_files", small_files=2_000),

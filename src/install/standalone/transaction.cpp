@@ -55,37 +55,49 @@ bool isInTheWay(const Place& place, const std::string& path)
     return !pathIsMissing(path);
 }
 
-/// True unless `entry` is claimed and another run has put a file of its own at its path.
-bool isOurs(const JournalEntry& entry)
+/// True unless `path` is claimed and another run has put a file of its own there.
+bool isOurs(const FileTransaction& transaction, const std::string& path)
 {
+    const auto claimed = transaction.claims.find(path);
     struct stat status = {};
-    return !entry.ours || statPath(entry.path, status) != 0 || identityOf(status) == *entry.ours;
+    return claimed == transaction.claims.end() || statPath(path, status) != 0 ||
+           identityOf(status) == claimed->second;
 }
 
-/// Renames the backup back. What cannot be renamed stays where it is.
-void restoreBackup(const JournalEntry& entry)
+/// Renames the backup of `path` back. What cannot be renamed stays where it is.
+void restoreBackup(const std::string& path)
 {
     Place place;
-    if (isOurs(entry) && findPlace(entry.path, LastLink::Keep, place) == 0)
+    if (findPlace(path, LastLink::Keep, place) == 0)
         (void)renameat(place.fd(), backupName(place.name).c_str(), place.fd(), place.name.c_str());
 }
 
-/// Undoes `entry`; `previous` is the entry before it, null for the first.
-void undo(const JournalEntry& entry, const JournalEntry* previous)
+/// True if the entry at `index` is a claimed file whose backup the entry before it will restore.
+bool isReplacedByBackup(const FileTransaction& transaction, std::size_t index)
 {
-    // A claimed file is replaced by its backup in one step, so that there is one at any time.
-    const bool isReplaced = entry.ours && previous != nullptr && previous->kind == BackedUp &&
-                            previous->path == entry.path;
-    switch (entry.kind) {
+    if (index == 0)
+        return false;
+    const JournalEntry& previous = transaction.journal[index - 1];
+    return previous.kind == BackedUp && previous.path == transaction.journal[index].path &&
+           transaction.claims.contains(previous.path);
+}
+
+/// Undoes the entry at `index` of the journal.
+void undo(const FileTransaction& transaction, std::size_t index)
+{
+    const auto& [kind, path] = transaction.journal[index];
+    switch (kind) {
     case BackedUp:
-        restoreBackup(entry);
+        if (isOurs(transaction, path))
+            restoreBackup(path);
         break;
     case Created:
-        if (!isReplaced && isOurs(entry))
-            (void)unlinkPath(entry.path);
+        // A claimed file is replaced by its backup in one step, so that there is one at any time.
+        if (!isReplacedByBackup(transaction, index) && isOurs(transaction, path))
+            (void)unlinkPath(path);
         break;
     case DirectoryCreated:
-        (void)removeDirectoryPath(entry.path); // remains if it contains anything else
+        (void)removeDirectoryPath(path); // remains if it contains anything else
         break;
     default:
         break;
@@ -101,10 +113,7 @@ void record(FileTransaction& transaction, int kind, const std::string& path)
 
 void claim(FileTransaction& transaction, const std::string& path, const FileIdentity& ours)
 {
-    for (JournalEntry& entry : transaction.journal) {
-        if (entry.path == path)
-            entry.ours = ours;
-    }
+    transaction.claims[path] = ours;
 }
 
 int backupFile(FileTransaction& transaction, const std::string& path)
@@ -162,16 +171,17 @@ int commit(FileTransaction& transaction)
             (void)unlinkPath(backupName(entry->path)); // remains if this fails
     }
     transaction.journal.clear();
+    transaction.claims.clear();
     return FileOk;
 }
 
 int rollback(FileTransaction& transaction)
 {
     const ScopedDirectoryReuse reuse;
-    const auto& journal = transaction.journal;
-    for (std::size_t i = journal.size(); i-- != 0;)
-        undo(journal[i], i == 0 ? nullptr : &journal[i - 1]);
+    for (std::size_t index = transaction.journal.size(); index-- != 0;)
+        undo(transaction, index);
     transaction.journal.clear();
+    transaction.claims.clear();
     return FileOk;
 }
 

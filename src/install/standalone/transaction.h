@@ -9,7 +9,7 @@
 #include "safe_path.h"
 
 #include <cstddef>
-#include <optional>
+#include <map>
 #include <string>
 #include <utility>
 #include <vector>
@@ -24,7 +24,6 @@ enum JournalKind : int {
 struct JournalEntry {
     int kind = 0; ///< a JournalKind; others are skipped by commit and rollback
     std::string path;
-    std::optional<FileIdentity> ours = std::nullopt; ///< see claim()
 };
 
 /// The state of one run; owned by the driver, passed by reference to every file operation.
@@ -35,6 +34,7 @@ struct FileTransaction {
     bool journalled = true; ///< set together with `backup`; nothing reads it
     std::vector<JournalEntry> journal;
     std::vector<std::pair<std::string, std::string>> variables; ///< name and value
+    std::map<std::string, FileIdentity> claims;                 ///< by path; see claim()
 };
 
 /// Precedes the name of a variable in a text.
