@@ -600,10 +600,11 @@ def test_nothing_to_tell_is_told_by_silence(spb):
     assert (done.returncode, done.stdout, done.stderr) == (0, "", "")
 
 
-def test_only_directories_without_a_finding_are_gone_after_the_removal(empty_machine):
+def test_only_directories_without_a_finding_are_gone_after_removal(empty_machine):
     directories = ["bin/plugins/", "bin/customscanners/", "bin/etc/", "bin/etc/trawlfs/",
                    "bin/etc/trawlhw/", "bin/etc/trawlsw/", "bin/etc/trawlvpd/", "config/any/",
-                   "properties/any/", "install/QMX_CLI/", "bin/tools/", "install/tools/"]  # fmt: skip
+                   "properties/any/", "install/QMX_CLI/", "bin/tools/",
+                   "install/tools/"]  # fmt: skip
     package_of_them = spb_tool.archive({name: b"" for name in directories}).content()
     empty_machine.plant(SPB, package_of_them)
     _, findings = spb_tool.check(empty_machine.at(SPB))

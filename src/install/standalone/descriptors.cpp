@@ -20,9 +20,10 @@ void closeOnExecOneByOne()
     if (!open)
         return;
     while (const dirent* entry = readdir(open.get())) {
-        const int fd = std::atoi(entry->d_name); // 0 for "." and ".."
+        const long fd = std::strtol(entry->d_name, nullptr, 10); // 0 for "." and ".."
         if (fd >= FirstPrivate)
-            (void)fcntl(fd, F_SETFD, FD_CLOEXEC); // it is open, so this cannot fail
+            (void)fcntl(static_cast<int>(fd), F_SETFD,
+                        FD_CLOEXEC); // it is open, so this cannot fail
     }
 }
 

@@ -4,6 +4,7 @@
 #include <cerrno>
 #include <climits>
 #include <cstdio>
+#include <cstdlib>
 #include <cstring>
 #include <optional>
 #include <utility>
@@ -42,11 +43,14 @@ Reuse& reuse()
 bool namespaceMapsEverybody()
 {
     const ScopedFile map(std::fopen("/proc/self/uid_map", "re"));
-    unsigned inside = 0;
-    unsigned outside = 0;
-    unsigned count = 0;
-    return map && std::fscanf(map.get(), "%u %u %u", &inside, &outside, &count) == 3 &&
-           inside == 0 && outside == 0 && count == UINT_MAX;
+    char line[64] = {};
+    if (!map || std::fgets(line, sizeof line, map.get()) == nullptr)
+        return false;
+    char* rest = line; // "inside outside count": everybody is 0, 0 and the largest number
+    const unsigned long inside = std::strtoul(rest, &rest, 10);
+    const unsigned long outside = std::strtoul(rest, &rest, 10);
+    const unsigned long count = std::strtoul(rest, &rest, 10);
+    return inside == 0 && outside == 0 && count == UINT_MAX;
 }
 
 /// Opens `path` in one system call, provided that no link is on it; see takesWalk().
@@ -353,7 +357,7 @@ bool othersCanPlant(const struct stat& status)
 
 int findPlace(const std::string& path, LastLink lastLink, Place& place)
 {
-    const std::string text = path.c_str(); // the system reads no further than a NUL
+    const std::string text = path.substr(0, path.find('\0')); // the system reads no further
     if (text.size() >= PATH_MAX)
         return ENAMETOOLONG;
     const int code = findPlaceWithoutLinks(text, lastLink, place);

@@ -79,11 +79,11 @@ bool beginsWithTinyBlocks(const unsigned char* packed)
     stream.next_out = content;
     stream.avail_out = ProbeContentSize;
 
-    constexpr int AtBlockEnd = 128; // of data_type, see inflate()
+    constexpr int atBlockEnd = 128; // of data_type, see inflate()
     std::size_t blocks = 0;
     std::size_t used = 0;
     while (inflate(&stream, Z_BLOCK) == Z_OK && stream.avail_out != 0) {
-        if ((stream.data_type & AtBlockEnd) != 0) {
+        if ((stream.data_type & atBlockEnd) != 0) {
             ++blocks;
             used = ProbeSize - stream.avail_in;
         }
