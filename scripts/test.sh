@@ -24,7 +24,7 @@ for preset in "$@"; do
     cmake --preset "$preset" >/dev/null
     # The 64-bit release is not built with unit tests: those of dev and test-i686 are the same.
     case $preset in
-    test) targets='wzorinst zorctl manual_pages unwind_test' ;;
+    test) targets='wzorinst zorctl spb manual_pages unwind_test' ;;
     *) targets=all ;;
     esac
     # shellcheck disable=SC2086 # a list of words
