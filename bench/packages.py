@@ -272,7 +272,7 @@ def build_deb(tree, path):
     shutil.rmtree(os.path.join(tree, "DEBIAN"))
 
 
-SPECIFICATION = f"""
+RPM_BUILD_FILE = f"""
 %define __os_install_post %{{nil}}
 %define _build_id_links none
 %define _binaries_in_noarch_packages_terminate_build 0
@@ -296,7 +296,7 @@ def build_rpm(tree, path):
     """A package of rpm of the files in `tree`, which rpmbuild deletes, compressed like the zip."""
     with tempfile.TemporaryDirectory() as work:
         with open(os.path.join(work, "toolkit.spec"), "w", encoding="ascii") as file:
-            file.write(SPECIFICATION)
+            file.write(RPM_BUILD_FILE)
         run(
             "rpmbuild",
             "-bb",

@@ -4,11 +4,11 @@
 // The image root is "/" here, so that entries are called "/bin/x" and not by a long name that the
 // fuzzer would have to keep.
 #include "checker.h"
-#include "subcommands.h"
 #include "fuzz_support.h"
 #include "landed_files.h"
 #include "package_layout.h"
 #include "settings.h"
+#include "subcommands.h"
 
 #include <filesystem>
 #include <iostream>

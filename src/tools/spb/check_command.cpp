@@ -1,7 +1,7 @@
 #include "checker.h"
-#include "subcommands.h"
 #include "exit_status.h"
 #include "shown_text.h"
+#include "subcommands.h"
 #include "tool_output.h"
 
 #include <algorithm>

@@ -1,7 +1,7 @@
-#include "subcommands.h"
 #include "exit_status.h"
 #include "landed_files.h"
 #include "shown_text.h"
+#include "subcommands.h"
 #include "tool_output.h"
 
 #include <iostream>

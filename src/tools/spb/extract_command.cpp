@@ -1,7 +1,6 @@
 // Unpacks a package into a directory, and writes nothing outside of it: a name that leads out is
 // refused, and every directory on the way is opened in the one before, without following links. So
 // it does not matter what somebody else puts into the directory meanwhile. No file is replaced.
-#include "subcommands.h"
 #include "exit_status.h"
 #include "file_codes.h"
 #include "file_writing.h"
@@ -9,6 +8,7 @@
 #include "package_layout.h"
 #include "progress.h"
 #include "shown_text.h"
+#include "subcommands.h"
 #include "tool_output.h"
 
 #include <cerrno>

@@ -1,4 +1,3 @@
-#include "subcommands.h"
 #include "exit_status.h"
 #include "landed_files.h"
 #include "package_layout.h"
@@ -7,6 +6,7 @@
 #include "settings_upgrade.h"
 #include "sha256.h"
 #include "shown_text.h"
+#include "subcommands.h"
 #include "text.h"
 #include "tool_output.h"
 

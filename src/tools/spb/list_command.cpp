@@ -1,8 +1,8 @@
-#include "subcommands.h"
 #include "exit_status.h"
 #include "landed_files.h"
 #include "package_layout.h"
 #include "shown_text.h"
+#include "subcommands.h"
 #include "tool_output.h"
 
 #include <algorithm>

@@ -1,10 +1,10 @@
 #include "archive_writer.h"
 #include "checker.h"
-#include "subcommands.h"
 #include "exit_status.h"
 #include "package_layout.h"
 #include "shown_text.h"
 #include "source_tree.h"
+#include "subcommands.h"
 #include "temporary_file.h"
 #include "tool_output.h"
 

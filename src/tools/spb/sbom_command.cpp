@@ -1,9 +1,9 @@
-#include "subcommands.h"
 #include "exit_status.h"
 #include "landed_files.h"
 #include "package_layout.h"
 #include "sha256.h"
 #include "shown_text.h"
+#include "subcommands.h"
 #include "tool_output.h"
 
 namespace {

@@ -1,8 +1,8 @@
-#include "subcommands.h"
 #include "exit_status.h"
 #include "scoped.h"
 #include "shown_text.h"
 #include "ssh_signature.h"
+#include "subcommands.h"
 #include "temporary_file.h"
 #include "tool_output.h"
 

@@ -18,7 +18,7 @@ struct Source {
 struct SourceTree {
     std::vector<Source> sources;          ///< by name: every directory before what is in it
     std::vector<std::string> reasons;     ///< why the tree cannot be packed, to be shown
-    std::vector<std::string> leftOut;     ///< names beside the package directories
+    std::vector<std::string> leftOut;     ///< names outside the package directories
     std::vector<std::string> directories; ///< the package directories that are there
 };
 

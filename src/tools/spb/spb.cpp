@@ -1,9 +1,9 @@
 // spb: makes, lists, checks, compares, unpacks and signs SPBs, the packages that wzorinst installs.
 #include "command_line_tool.h"
-#include "subcommands.h"
 #include "exit_status.h"
 #include "findings.h"
 #include "settings.h"
+#include "subcommands.h"
 
 #include <csignal>
 #include <ostream>

@@ -112,7 +112,7 @@ ToolCommand addPlan(CLI::App& app, PlanOptions& options)
 {
     CLI::App* const command =
         addCommand(app, "plan", "tell what a run of wzorinst would do, without doing it",
-                   "Tells what a run of wzorinst would do, without doing it. Behind the options: "
+                   "Reports what a run of wzorinst would do, without doing it. After the options: "
                    "i|r EXPLOITER and the options of wzorinst.");
     addJson(command, options.json);
     addFlag(command, "--files", options.files, "name all files");
@@ -155,7 +155,7 @@ ToolCommand addDoctor(CLI::App& app, DoctorOptions& options)
 {
     CLI::App* const command =
         addCommand(app, "doctor", "tell what an interrupted run left, and put it right",
-                   "Tells what an interrupted run left, and what to do. Changes nothing without "
+                   "Reports what an interrupted run left, and what to do. Changes nothing without "
                    "--apply.");
     addFlag(command, "--apply", options.apply, "do what is to be done");
     addJson(command, options.json);

@@ -262,7 +262,7 @@ def with_entries(points):
     return result
 
 
-# What strace tells beside the calls: nothing, or only how the process ended.
+# What strace reports besides the calls: nothing, or only how the process ended.
 CALLS_ONLY = ("-qq", "-e", "signal=none")
 WITH_THE_END = ("-e", "quiet=attach,personality", "-e", "signal=all")
 
