@@ -1,6 +1,6 @@
 """The bash completion, in an interactive bash on a pseudo terminal.
 
-A test types a line and presses the key that puts in all completions; what then stands in the line
+A test types a line and presses the key that puts in all completions; what the line then holds
 is compared.
 """
 

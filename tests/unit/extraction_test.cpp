@@ -19,7 +19,7 @@ using Lines = std::vector<std::string>;
 
 const std::string Root = "/home/zorbuild/zor_src_dir/ZOR/zor_pkgs/images/linux-ix86/";
 
-/// `index` without the time in its first line, when a time stands there.
+/// `index` without the time in its first line, if there is one.
 std::string withoutTime(const std::string& index)
 {
     const std::size_t at = index.find(" installed on ");

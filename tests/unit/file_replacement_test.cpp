@@ -155,7 +155,7 @@ TEST_F(FileReplacementTest, AFileWhoseOwnerCannotBeKeptIsWrittenInPlace)
     const ino_t old = inodeOf(dir / "file");
 
     EXPECT_TRUE(passesInChild([&] {
-        failSystemCall(SYS_fchmod, EPERM); // stands for any attribute that cannot be passed on
+        failSystemCall(SYS_fchmod, EPERM); // as for any attribute that cannot be passed on
         ASSERT_EQ(0, replace(dir / "file", "new"));
     }));
 

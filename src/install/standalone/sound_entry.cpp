@@ -207,7 +207,7 @@ int copyDeflated(PackageWindow& package, const ZipEntry& entry, int destination)
     return copyInPieces(package, entry, destination);
 }
 
-/// The system copies by itself. Where it can't, or fails, the stream does it or tells what failed.
+/// Lets the system copy. Where it cannot, or fails, the stream does it or reports the failure.
 int copyStored(const PackageWindow& package, const ZipEntry& entry, int destination)
 {
     if (entry.uncompressedSize > std::numeric_limits<std::int32_t>::max())

@@ -471,7 +471,7 @@ void printLine(const Difference& difference)
         std::cout << "             customised: " << shown(key) << '\n';
 }
 
-/// Whether a line of this kind is a difference that the exit status tells.
+/// True if a line of this kind is a difference that sets the exit status.
 bool counts(const Difference& difference, const VerifyOptions& options)
 {
     if (difference.kind == "foreign")

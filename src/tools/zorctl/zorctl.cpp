@@ -111,7 +111,7 @@ ToolCommand addVerify(CLI::App& app, VerifyOptions& options)
 ToolCommand addPlan(CLI::App& app, PlanOptions& options)
 {
     CLI::App* const command =
-        addCommand(app, "plan", "tell what a run of wzorinst would do, without doing it",
+        addCommand(app, "plan", "report what a run of wzorinst would do, without doing it",
                    "Reports what a run of wzorinst would do, without doing it. After the options: "
                    "i|r EXPLOITER and the options of wzorinst.");
     addJson(command, options.json);
@@ -154,7 +154,7 @@ ToolCommand addRun(CLI::App& app, RunOptions& options)
 ToolCommand addDoctor(CLI::App& app, DoctorOptions& options)
 {
     CLI::App* const command =
-        addCommand(app, "doctor", "tell what an interrupted run left, and put it right",
+        addCommand(app, "doctor", "report what an interrupted run left, and put it right",
                    "Reports what an interrupted run left, and what to do. Changes nothing without "
                    "--apply.");
     addFlag(command, "--apply", options.apply, "do what is to be done");

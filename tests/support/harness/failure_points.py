@@ -267,13 +267,13 @@ CALLS_ONLY = ("-qq", "-e", "signal=none")
 WITH_THE_END = ("-e", "quiet=attach,personality", "-e", "signal=all")
 
 
-def strace(*options, tells=CALLS_ONLY):
+def strace(*options, reports=CALLS_ONLY):
     return (
         "/usr/bin/timeout",
         "--kill-after=1",
         str(TIME_LIMIT),
         "/usr/bin/strace",
-        *tells,
+        *reports,
         "-y",
         "-s",
         "512",
@@ -371,7 +371,7 @@ def run_signalled(scenario, machine, point, name):
             f"trace={point.name},{NAME_CHANGES},{STARTS}",
             "-e",
             f"inject={point.name}:signal={name}:when={point.count}",
-            tells=WITH_THE_END,
+            reports=WITH_THE_END,
         ),
     )
     trace = machine.read(TRACE)
