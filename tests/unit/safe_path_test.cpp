@@ -270,6 +270,21 @@ TEST_F(SafePathTest, ModesAreSetWithoutOpening)
     EXPECT_EQ(ModeChange::NothingThere, changeMode(dir / "missing", 0644));
 }
 
+TEST_F(SafePathTest, APlainDirectoryIsOneThatNoLinkLeadsTo)
+{
+    makeDirectories(dir / "real/below");
+    writeFile(dir / "file", "");
+    ASSERT_EQ(0, symlink("real", (dir / "link").c_str()));
+
+    EXPECT_TRUE(isPlainDirectory(dir / "real"));
+    EXPECT_TRUE(isPlainDirectory(dir / "real/below"));
+    EXPECT_FALSE(isPlainDirectory(dir / "link"));
+    EXPECT_FALSE(isPlainDirectory(dir / "link/below"));
+    EXPECT_FALSE(isPlainDirectory(dir / "file"));
+    EXPECT_FALSE(isPlainDirectory(dir / "missing"));
+    EXPECT_FALSE(isPlainDirectory(""));
+}
+
 TEST_F(SafePathTest, DirectoriesAreReusedOnlyWhileAGuardLives)
 {
     makeDirectories(dir / "a");

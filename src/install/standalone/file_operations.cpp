@@ -140,6 +140,10 @@ int removeDirectory(const std::string& path)
 
 int createPath(FileTransaction& transaction, const std::string& path, mode_t mode)
 {
+    const ScopedDirectoryReuse reuse;
+    if (isPlainDirectory(path.substr(0, path.rfind('/')))) // so everything above it exists too
+        return FileOk;
+
     // Shallowest first, so that a rollback removes the deepest first.
     for (std::size_t slash = path.find('/'); slash != std::string::npos;
          slash = path.find('/', slash + 1)) {
@@ -154,6 +158,7 @@ int createFullPath(FileTransaction& transaction, const std::string& path, mode_t
 {
     if (counter != nullptr)
         *counter = 0;
+    const ScopedDirectoryReuse reuse;
     const int code = createPath(transaction, path, mode);
     if (code != FileOk || path.empty() || endsWithSlash(path))
         return code;

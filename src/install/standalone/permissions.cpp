@@ -83,6 +83,7 @@ std::vector<Permission> permissionTable(const Discovery& found)
 void applyPermissions(const Discovery& found)
 {
     const ScopedUmask mask(globalFilesUmask);
+    const ScopedDirectoryReuse reuse;
     for (const Permission& permission : permissionTable(found))
         apply(permission);
 }

@@ -364,6 +364,11 @@ int findPlace(const std::string& path, LastLink lastLink, Place& place)
     return takesWalk(code) ? Walk(text, lastLink).run(place) : code;
 }
 
+bool isPlainDirectory(const std::string& path)
+{
+    return path.size() < PATH_MAX && directoryWithoutLinks(path) != nullptr;
+}
+
 int statPath(const std::string& path, struct stat& status)
 {
     for (const LastLink lastLink : {LastLink::Keep, LastLink::Follow}) {
@@ -425,6 +430,8 @@ ScopedFd openPath(const std::string& path, int flags)
         ScopedFd fd = openWithoutLinks(path, flags | CautiousFlags | O_LARGEFILE);
         struct stat status = {};
         if (fd.isOpen() && fstat(fd.get(), &status) == 0 && isPlainFile(status))
+            return fd;
+        if (!fd.isOpen() && errno == ENOENT) // no link comes before what is missing
             return fd;
     }
 

@@ -90,6 +90,10 @@ public:
 /// disk can cause it: the path is looked up a second time.
 [[nodiscard]] bool pathIsMissing(const std::string& path);
 
+/// True if `path` is a directory that no link leads to, in one system call. If false, it may still
+/// be a directory.
+[[nodiscard]] bool isPlainDirectory(const std::string& path);
+
 /// stat() of `path`. Returns 0, or -1 with `errno`.
 [[nodiscard]] int statPath(const std::string& path, struct stat& status);
 
