@@ -6,8 +6,11 @@ measured; but whatever happens, the registry must be whole, and not from before 
 """
 
 import json
+import os
 import random
-from dataclasses import dataclass, field, replace
+import signal
+from concurrent.futures import ThreadPoolExecutor
+from dataclasses import dataclass, field
 
 from harness.machine import ANN, BINARY, ROOT, SPB
 from harness.scenarios import (
@@ -24,6 +27,8 @@ from harness.scenarios import (
 LOCK = "/run/wzorinst.lock"
 USER_LOCK = "/home/ann/.wzorinst.lock"
 USER_REGISTRY = "/home/ann/.zor/zor.ini"
+TURN = "/tmp/turn"
+WAIT_FOR_TURN = f'read line <{TURN}; exec "$@"'
 
 
 @dataclass(frozen=True)
@@ -88,8 +93,8 @@ PAIRS = {
 }
 
 # Starts commands after a time each, in sessions of their own, and prints how they ended. With
-# "interrupt", the first one gets what Ctrl-C sends, after that time; the others then start only
-# when it has its lock. The last thing printed is how long it took.
+# "interrupt", the first one gets what Ctrl-C sends, after that time; the second then starts only
+# when the first one has its lock. The last thing printed is how long it took.
 DRIVER = """
 import json, os, signal, subprocess, sys, time
 plan = json.loads(sys.argv[1])
@@ -149,40 +154,55 @@ class Meeting:
             [[_, statuses[number]]], self.seconds[number] = start(machine, self.pair, [run])
         return statuses, tree_of(machine)
 
-    def meet(self, machine, number, lock=(), interrupts=False):
+    def meet(self, machine, number, lock=()):
         """Plays one round. `lock` is the command under which both run."""
         self.restore(machine, self.before)
         chance = random.Random(number)
         first, second = chance.sample((0, 1), 2)
-        length = max(self.seconds)
-        runs = [(0, self.pair.runs[first]), (chance.random() ** 2 * length, self.pair.runs[second])]
-        if interrupts:
-            runs[1] = (0, runs[1][1])
-        ended, _ = start(
-            machine, self.pair, runs, lock, chance.uniform(0, length) if interrupts else None
-        )
-        if lock:
-            machine.remove(self.pair.lock)
-        played = Round(self.pair, number, [None, None], [None, None], tree_of(machine))
-        for run, (output, status) in zip((first, second), ended):
-            played.statuses[run], played.outputs[run] = status, output
-        ends = self.in_order
-        if interrupts:
-            ends = [self.interrupted(self.alone[second], first), self.in_order[first]]
-            ends.append(self.interrupted(self.in_order[first], first))
-        if interrupts:
-            # The index of an interrupted run outlives its rollback: the next one adds to it.
-            ends = [(statuses, with_sorted_index(tree)) for statuses, tree in ends]
-            played.is_right = (played.statuses, with_sorted_index(played.tree)) in ends
-        else:
-            played.is_right = (played.statuses, played.tree) in ends
-        self.find(played)
+        delay = chance.random() ** 2 * max(self.seconds)
+        runs = [(0, self.pair.runs[first]), (delay, self.pair.runs[second])]
+        ended, _ = start(machine, self.pair, runs, lock)
+        played = self.round_of(machine, number, dict(zip((first, second), ended)))
+        played.is_right = (played.statuses, played.tree) in self.in_order
         return played
 
-    @staticmethod
-    def interrupted(end, number):
-        statuses, tree = end
-        return [-2 if run == number else status for run, status in enumerate(statuses)], tree
+    def interrupt(self, machine, number, lock):
+        """Plays one round in which the first run gets what Ctrl-C sends, at a random moment.
+
+        It is right if the second run finds what the first one left at its end, and nothing changes
+        afterwards but by that second run: its status and tree are those of a third one alone, from
+        there. What an interrupted run leaves is the subject of scripts/signal_sweep; here only its
+        registry is looked at, which must be the old or the new one.
+        """
+        self.restore(machine, self.before)
+        chance = random.Random(number)
+        first, second = chance.sample((0, 1), 2)
+        runs = [(0, self.pair.runs[first]), (0, self.pair.runs[second])]
+        moment = chance.uniform(0, max(self.seconds))
+        with Turn(machine) as turn, ThreadPoolExecutor(1) as pool:
+            ending = pool.submit(turn.ended_by, start, machine, self.pair, runs, lock, moment)
+            between = turn.tree_before_second(self.pair.lock)
+            ended, _ = ending.result()
+        played = self.round_of(machine, number, dict(zip((first, second), ended)))
+
+        self.restore(machine, between)
+        [[_, status]], _ = start(machine, self.pair, [runs[1]])
+        ends = [self.before, self.alone[first][1]]
+        played.is_right = (
+            (played.statuses[second], played.tree) == (status, tree_of(machine))
+            and played.statuses[first] in (0, -signal.SIGINT)
+            and between.get(self.pair.registry) in [end.get(self.pair.registry) for end in ends]
+        )
+        return played
+
+    def round_of(self, machine, number, ended):
+        """The round that ended with `ended`, an output and a status for each run."""
+        if machine.exists(self.pair.lock):
+            machine.remove(self.pair.lock)
+        outputs, statuses = zip(*(ended[run] for run in (0, 1)))
+        played = Round(self.pair, number, list(statuses), list(outputs), tree_of(machine))
+        self.find(played)
+        return played
 
     def find(self, played):
         """Names what is not as it would be one after the other."""
@@ -209,16 +229,38 @@ class Meeting:
             played.findings.append("other files")
 
 
-def with_sorted_index(tree):
-    """The tree with each line of a file index once, in order."""
-    return {
-        path: (
-            replace(node, content=b"\n".join(sorted(set(node.content.split(b"\n")))))
-            if path.endswith("/ZOR_files")
-            else node
-        )
-        for path, node in tree.items()
-    }
+class Turn:
+    """Holds back the second run when it has the lock, until the tree that it finds was read."""
+
+    def __init__(self, machine):
+        self.machine = machine
+        self.fifo = machine.at(TURN)
+
+    def __enter__(self):
+        os.mkfifo(self.fifo)
+        os.chmod(self.fifo, 0o666)
+        return self
+
+    def __exit__(self, *_):
+        if os.path.exists(self.fifo):
+            os.unlink(self.fifo)
+
+    def ended_by(self, function, *arguments):
+        """Calls `function`; whatever comes of it, tree_before_second() does not wait any longer."""
+        try:
+            return function(*arguments)
+        finally:
+            if os.path.exists(self.fifo):
+                os.close(os.open(self.fifo, os.O_RDONLY | os.O_NONBLOCK))
+
+    def tree_before_second(self, lock):
+        """The machine's tree at the moment when the second run has the lock; then lets it go on."""
+        with open(self.fifo, "w", encoding="ascii") as fifo:  # waits for the reader
+            os.unlink(self.fifo)
+            tree = tree_of(self.machine)
+            fifo.write("go\n")
+        tree.pop(lock)
+        return tree
 
 
 def is_whole(content):
@@ -239,7 +281,10 @@ def start(machine, pair, runs, lock=(), interrupt=None):
 
     Returns the output and the status of each, and how long they took.
     """
-    plan = {"runs": [[delay, [*lock, BINARY, *run]] for delay, run in runs], "interrupt": interrupt}
+    commands = [[delay, [*lock, BINARY, *run]] for delay, run in runs]
+    if interrupt is not None:
+        commands[1][1] = [*lock, "/bin/sh", "-c", WAIT_FOR_TURN, "sh", BINARY, *runs[1][1]]
+    plan = {"runs": commands, "interrupt": interrupt}
     outcome = machine.execute(
         ["/usr/bin/python3", "-I", "-c", DRIVER, json.dumps(plan)],
         pair.user,
