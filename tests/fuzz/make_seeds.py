@@ -197,6 +197,19 @@ def file_index():
     }
 
 
+def hostile_stream():
+    def seed(kind, letters, block_size, content):
+        return struct.pack("<BBH", kind, letters, block_size) + content
+
+    return {
+        "tiny_blocks": seed(1, 1, 40, b"a"),
+        "many_letters": seed(1, 250, 40, NOISE),
+        "one_block": seed(1, 100, 0, NOISE),
+        "stored": seed(0, 0, 65535, TEXT),
+        "tiny_stored": seed(0, 0, 5, TEXT),
+    }
+
+
 def journal():
     return {
         "written": b"D /opt/corvan/zor\nB /opt/corvan/zor/bin/x\nC /opt/corvan/zor/bin/x\n",
@@ -212,6 +225,7 @@ def main():
         entry_stream,
         extraction,
         file_index,
+        hostile_stream,
         journal,
         property_file,
         registry,
