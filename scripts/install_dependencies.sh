@@ -41,6 +41,7 @@ test='
     nettle-dev
     nettle-dev:i386
     nlohmann-json3-dev
+    perl
     pylint
     python3-jsonschema
     python3-pytest

@@ -39,6 +39,7 @@ SPB_INSTALLED = """\
 644 /usr/share/debhelper/autoscripts/postinst-wzorinst
 644 /usr/share/debhelper/autoscripts/postrm-wzorinst
 644 /usr/share/debhelper/autoscripts/prerm-wzorinst
+644 /usr/share/man/man1/dh_wzorinst.1.gz
 644 /usr/share/man/man1/spb.1.gz
 644 /usr/share/perl5/Debian/Debhelper/Sequence/wzorinst.pm
 """
