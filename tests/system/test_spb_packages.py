@@ -286,6 +286,37 @@ def test_a_signature_of_an_allowed_signer_is_good(tmp_path, spb, signers):
         )
 
 
+def test_who_is_excluded_has_not_signed(tmp_path, spb, signers):
+    planted(spb, ("bin/a", b"1"))
+    signers.write_text("!other@example.org,*@example.org " + (tmp_path / "key.pub").read_text())
+    assert spb_tool.run("sign", spb, "-k", tmp_path / "key").returncode == 0
+
+    done = spb_tool.run("verify", spb, "-s", signers)
+
+    assert (done.returncode, done.stdout) == (0, f"{spb}: signed by *@example.org\n")
+
+
+@pytest.mark.parametrize(
+    "program, message",
+    [
+        (None, "spb: ssh-keygen: No such file or directory\n"),
+        (b"no program", "spb: {path}/ssh-keygen could not be run\n"),
+    ],
+    ids=["missing", "not executable"],
+)
+def test_without_ssh_keygen_nothing_is_known(tmp_path, spb, signers, program, message):
+    planted(spb, ("bin/a", b"1"))
+    assert spb_tool.run("sign", spb, "-k", tmp_path / "key").returncode == 0
+    if program:
+        (tmp_path / "ssh-keygen").write_bytes(program)
+        (tmp_path / "ssh-keygen").chmod(0o755)
+
+    done = spb_tool.run("verify", spb, "-s", signers, env={"PATH": str(tmp_path)})
+
+    assert (done.returncode, done.stdout) == (2, "")
+    assert done.stderr == message.format(path=tmp_path)
+
+
 @pytest.mark.parametrize(
     "key, changed", [("key", True), ("other", False)], ids=["changed package", "other signer"]
 )

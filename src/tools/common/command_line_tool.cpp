@@ -214,7 +214,7 @@ std::optional<int> parseCommandLine(CLI::App& app, int argc, const char* const* 
     toolName = app.get_name();
     app.set_help_flag("-h,--help", "show this help and end");
     app.set_version_flag("--version", toolName + " " TOOL_VERSION, "show the version and end");
-    app.require_subcommand(0, 1); // none is told below: an unknown one is named that way
+    app.require_subcommand(0, 1); // none is reported below: so an unknown one is named
     app.formatter_fn(helpOf);
     for (CLI::App* command : app.get_subcommands([](CLI::App*) { return true; }))
         command->formatter_fn(helpOf);

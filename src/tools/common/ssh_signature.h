@@ -13,9 +13,11 @@ enum SignatureCode : int {
 };
 
 /// Verifies the signature at `signature` of the open file `fd` by the ssh-keygen(1) list
-/// `allowedSigners`. Of a good one, `principal` gets who has signed.
+/// `allowedSigners`. Of a good one, `principal` gets who has signed. What ssh-keygen prints goes to
+/// the descriptor `messages`.
 [[nodiscard]] int verifySignature(int fd, const std::string& signature,
-                                  const std::string& allowedSigners, std::string& principal);
+                                  const std::string& allowedSigners, int messages,
+                                  std::string& principal);
 
 /// Signs the open file `fd` with the key at `key`, for which ssh-keygen may ask; writes the
 /// signature to `output`. Returns true, or false when ssh-keygen has complained.

@@ -12,6 +12,7 @@
 #include "settings.h"
 #include "shown_text.h"
 #include "simulation.h"
+#include "ssh_signature.h"
 #include "time_stamps.h"
 #include "tool_output.h"
 
@@ -29,7 +30,6 @@
 
 namespace {
 
-constexpr const char* SignatureNamespace = "spb";
 constexpr const char* SharedLogDirectory = "/var/log/zorctl";
 constexpr const char* LocalLogDirectory = ".local/state/zorctl";
 constexpr off_t SmallFileLimit = off_t{1} << 20; // a signature, a list of signers
@@ -219,45 +219,18 @@ private:
         const int error = copyPrivately(source, signature, SmallFileLimit);
         if (error != 0)
             return refuse(ToolBadSignature, source + ": " + std::strerror(error));
-        const std::string tool = findProgram("ssh-keygen");
-        if (tool.empty())
-            return refuse(ToolTrouble, "ssh-keygen is not in PATH");
-
-        const std::string signer = findSigner(tool, signature, signers);
-        if (signer.empty())
-            return refuse(ToolBadSignature,
-                          spbPackage + ": signed by nobody of " + options_.signers);
         const ScopedFd content(open(package_.c_str(), O_RDONLY | O_CLOEXEC));
-        const ChildSetup setup = {content.get(), log_.descriptor(), log_.descriptor(), -1};
-        const int status = runProgram({tool, "-Y", "verify", "-f", signers, "-I", signer, "-n",
-                                       SignatureNamespace, "-s", signature},
-                                      setup);
-        if (status != 0)
-            return refuse(ToolBadSignature, spbPackage + ": the signature is not valid");
-        log_.line("signed by " + signer);
-        return ToolOk;
-    }
-
-    /// The first name in `signers` under which the key of `signature` may sign; empty if there is
-    /// none.
-    std::string findSigner(const std::string& tool, const std::string& signature,
-                           const std::string& signers)
-    {
-        int ends[2];
-        if (pipe2(ends, O_CLOEXEC) != 0)
-            return {};
-        const ScopedFd readEnd(ends[0]);
-        ScopedFd writeEnd(ends[1]);
-        // The names fit the pipe, or what does not is cut off: only the first line counts.
-        (void)fcntl(writeEnd.get(), F_SETFL, O_NONBLOCK);
-        const ChildSetup setup = {-1, writeEnd.get(), log_.descriptor(), -1};
-        const int status =
-            runProgram({tool, "-Y", "find-principals", "-s", signature, "-f", signers}, setup);
-        writeEnd = ScopedFd(-1);
-        char text[4096];
-        const ssize_t count = status == 0 ? read(readEnd.get(), text, sizeof text) : 0;
-        const std::string names(text, count > 0 ? static_cast<std::size_t>(count) : 0);
-        return names.substr(0, names.find_first_of("\n,"));
+        std::string signer;
+        switch (verifySignature(content.get(), signature, signers, log_.descriptor(), signer)) {
+        case SignatureGood:
+            log_.line("signed by " + signer);
+            return ToolOk;
+        case SignatureBad:
+            return refuse(ToolBadSignature,
+                          spbPackage + ": no good signature of a signer in " + options_.signers);
+        default:
+            return refuse(ToolTrouble, "the signature could not be checked");
+        }
     }
 
     int checkContent()

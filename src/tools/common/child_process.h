@@ -4,11 +4,11 @@
 #include <string>
 #include <vector>
 
-/// The program `name` as zorctl uses it: next to zorctl's own file, else in a directory of PATH
+/// The program `name` as the tools use it: next to the tool's own file, else in a directory of PATH
 /// that is absolute. Empty if there is none.
 [[nodiscard]] std::string findProgram(const std::string& name);
 
-/// What a child is started with, besides its arguments.
+/// What a child is started with, in addition to its arguments.
 struct ChildSetup {
     int input = -1;  ///< its standard input; -1: /dev/null
     int output = -1; ///< its standard output; -1: ours
