@@ -465,7 +465,7 @@ NOTHING = {
 }  # fmt: skip
 
 
-def told(findings, last_kind):
+def reported(findings, last_kind):
     """`findings` with their kinds: what makes a package fail comes last in its case."""
     triples = [("surprises", code, entry) for code, entry in findings]
     return [*triples[:-1], (last_kind, *findings[-1])]
@@ -494,19 +494,19 @@ def spb(tmp_path):
 
 
 @pytest.mark.parametrize("case", FAILS)
-def test_what_fails_is_told_with_exit_status_2(spb, case):
+def test_what_fails_ends_with_exit_status_2(spb, case):
     content, findings = FAILS[case]
     spb.write_bytes(content)
 
-    assert spb_tool.check(spb) == (2, told(findings, "fails"))
+    assert spb_tool.check(spb) == (2, reported(findings, "fails"))
 
 
 @pytest.mark.parametrize("case", SURPRISES)
-def test_what_surprises_is_told_with_exit_status_1(spb, case):
+def test_what_surprises_ends_with_exit_status_1(spb, case):
     content, findings = SURPRISES[case]
     spb.write_bytes(content)
 
-    assert spb_tool.check(spb) == (1, told(findings, "surprises"))
+    assert spb_tool.check(spb) == (1, reported(findings, "surprises"))
 
 
 @pytest.mark.parametrize("case", DAMAGED)
@@ -514,7 +514,7 @@ def test_damage_is_reported_with_exit_status_2(spb, case):
     content, findings = DAMAGED[case]
     spb.write_bytes(content)
 
-    assert spb_tool.check(spb) == (2, told(findings, "damaged"))
+    assert spb_tool.check(spb) == (2, reported(findings, "damaged"))
 
 
 @pytest.mark.parametrize("case", NOTHING)
@@ -579,7 +579,7 @@ def test_the_packed_example_toolkit_has_nothing_to_tell_and_installs(empty_machi
     assert install(empty_machine, content.read_bytes()).status == 0
 
 
-def test_findings_are_told_one_a_line(spb):
+def test_findings_are_printed_one_a_line(spb):
     spb.write_bytes(spb_tool.archive().add("x", b"x").add(IMAGE_ROOT + "bin/e").content())
 
     done = spb_tool.run("check", spb)
@@ -592,7 +592,7 @@ def test_findings_are_told_one_a_line(spb):
     )
 
 
-def test_nothing_to_tell_is_told_by_silence(spb):
+def test_without_findings_nothing_is_printed(spb):
     spb.write_bytes(package())
 
     done = spb_tool.run("check", spb)
@@ -660,7 +660,7 @@ def test_a_damaged_package_does_not_count_as_one_that_installs(spb):
     assert json.loads(spb_tool.run("check", "--json", spb).stdout)["installs"] is False
 
 
-def test_json_tells_whether_the_package_installs(spb):
+def test_json_says_whether_the_package_installs(spb):
     spb.write_bytes(with_comment(1))
 
     done = spb_tool.run("check", "--json", spb)
@@ -715,10 +715,10 @@ def test_every_code_has_a_case():
     """So that no code is without its proof against the installer."""
     met = {}
     for findings in [findings for _, findings in FAILS.values()]:
-        met.update({code: kind for kind, code, _ in told(findings, "fails")})
+        met.update({code: kind for kind, code, _ in reported(findings, "fails")})
     for findings in [findings for _, findings in DAMAGED.values()]:
-        met.update({code: kind for kind, code, _ in told(findings, "damaged")})
+        met.update({code: kind for kind, code, _ in reported(findings, "damaged")})
     for findings in [findings for _, findings in SURPRISES.values()]:
-        met.update({code: kind for kind, code, _ in told(findings, "surprises")})
+        met.update({code: kind for kind, code, _ in reported(findings, "surprises")})
 
     assert met == spb_tool.codes()

@@ -234,7 +234,7 @@ def test_a_name_beyond_ascii_keeps_its_bytes(tree, spb):
         assert struct.unpack_from("<H", image, at - 24) == (utf8,)
 
 
-def test_what_lies_beside_the_package_directories_is_left_out_and_told(tree, spb):
+def test_what_is_next_to_the_package_directories_is_left_out_with_a_note(tree, spb):
     plant(tree, {"README": b"read me"})
 
     run = pack(tree, spb)
@@ -328,7 +328,7 @@ def test_a_file_name_that_leaves_no_room_for_a_backup_is_refused(tree, spb):
     )
 
 
-def test_every_reason_is_told_in_one_run(tree, spb):
+def test_every_reason_is_reported_in_one_run(tree, spb):
     plant(tree, {"bin/empty": b"", "install/empty": b""})
 
     assert refusal(tree, spb) == (
@@ -366,7 +366,7 @@ def test_a_tree_that_does_not_exist_is_an_error(tmp_path, spb):
 def test_a_package_that_would_lie_in_what_is_packed_is_refused(tree):
     output = tree / "bin" / "toolkit.spb"
 
-    assert refusal(tree, output) == f"spb: {output}: lies in what is to be packed\n"
+    assert refusal(tree, output) == f"spb: {output}: is inside a directory that is packed\n"
 
 
 def test_a_directory_that_cannot_take_the_package_is_named(tree, tmp_path):

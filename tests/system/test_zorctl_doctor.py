@@ -51,7 +51,7 @@ def test_nothing_installed_ends_with_3(machine):
     assert doctor(machine, "--apply", status=3) == (None, [], [])
 
 
-def test_it_tells_and_changes_nothing_unless_asked_to(installed):
+def test_it_only_reports_unless_asked_to_act(installed):
     interrupt_upgrade(installed)
     before = installed.tree("/etc", "/opt", "/usr")
 

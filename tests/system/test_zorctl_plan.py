@@ -29,7 +29,7 @@ def plan(machine, *arguments, status=0):
     return report(machine, "plan", *arguments, status=status)
 
 
-def test_a_fresh_installation_is_told_and_not_done(ready):
+def test_a_fresh_installation_is_reported_and_not_done(ready):
     before = ready.tree("/etc", "/opt", "/usr")
 
     found = plan(ready, "i", "SHOP", "-s", SPB)

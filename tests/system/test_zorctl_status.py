@@ -269,7 +269,7 @@ def test_an_unfinished_index_is_damage(installed):
     assert (one["index"]["state"], problems) == ("interrupted", ["index-interrupted"])
 
 
-def test_single_user_mode_is_told(machine):
+def test_single_user_mode_is_reported(machine):
     assert machine.run("i", "SHOP", "-s", SPB, "-r").status == 0
 
     one, _ = shared(machine, status=0)

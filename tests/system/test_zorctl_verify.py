@@ -92,7 +92,7 @@ missing   c /opt/corvan/zor/config/ZorHWConfig.xml
     )
 
 
-def test_changed_settings_are_told_by_their_keys(installed):
+def test_changed_settings_are_named_by_their_keys(installed):
     path = HOME + "/config/Zor.properties"
     installed.plant(
         path,

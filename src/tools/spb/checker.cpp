@@ -71,9 +71,9 @@ std::set<std::string> placeholdersIn(const std::string& content)
 std::string stepText(std::string_view code)
 {
     if (code == "backup-blocked")
-        return "replaces an entry, and a directory stands where the backup would go";
+        return "replaces an entry, and its backup's place is taken by a directory";
     if (code == "dot-name")
-        return "a directory stands where the file would be written";
+        return "there is a directory where the file would be written";
     if (code == "duplicate")
         return "replaces an entry that lands at the same place";
     if (code == "missing-directory")
@@ -148,7 +148,7 @@ void Checker::checkName(std::size_t number)
         checkPlace(places_[number]);
     else if (entry.name.starts_with(root) && entry.name != root)
         findings_.add("outside-package-directories", entry.name,
-                      "is passed over: it lies in no package directory");
+                      "is passed over: it is in no package directory");
     else if (!(endsWithSlash(entry.name) && root.starts_with(entry.name)))
         findings_.add("outside-image-root", entry.name,
                       "is passed over: its name does not begin with the image root");

@@ -309,7 +309,7 @@ bool HeaderExplainer::scanLocalHeader(std::int64_t start, std::string_view heade
     keepWholeName(details, *bytes);
     if (crc == 0 && packed == 0 && size == 0 && (details.flags & SizesFollow) != 0) {
         findings_.add("unknown-size", name,
-                      "its size follows its data, and there is no central directory that tells it");
+                      "its size follows its data, and no usable central directory states it");
         return false;
     }
     if (extraLength != 0 && !reader_.skip(extraLength))

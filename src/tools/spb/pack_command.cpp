@@ -64,8 +64,8 @@ std::string realDirectory(const std::string& path)
     return realpath(path.c_str(), resolved) == nullptr ? "" : std::string(resolved) + "/";
 }
 
-/// Whether `output` lies in one of the directories that are packed.
-bool liesInside(const std::string& output, const std::string& tree, const SourceTree& found)
+/// Whether `output` is in one of the directories that are packed.
+bool isInside(const std::string& output, const std::string& tree, const SourceTree& found)
 {
     const std::size_t slash = output.rfind('/');
     const std::string parent =
@@ -176,8 +176,8 @@ int packCommand(const PackOptions& options)
     if (error != 0)
         return failed(unreadable, error);
     const std::string output = absolute(options.output);
-    if (output != "-" && liesInside(output, options.tree, found)) {
-        complain(shown(output) + ": lies in what is to be packed");
+    if (output != "-" && isInside(output, options.tree, found)) {
+        complain(shown(output) + ": is inside a directory that is packed");
         return ToolDiffers;
     }
     if (!found.directories.empty()) {

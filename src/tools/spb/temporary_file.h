@@ -20,8 +20,8 @@ public:
     TemporaryFile& operator=(const TemporaryFile&) = delete;
     ~TemporaryFile();
 
-    /// Returns 0 or the `errno`. "-" stands for standard output: what is written goes there in
-    /// commit(), from a file without a name.
+    /// Returns 0 or the `errno`. "-" is standard output: what is written goes there in commit(),
+    /// from a file without a name.
     [[nodiscard]] int create(const std::string& path);
 
     [[nodiscard]] int fd() const { return file_.get(); }
