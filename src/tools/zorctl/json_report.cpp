@@ -3,21 +3,12 @@
 #include "build_stamp.h"
 #include "file_index.h"
 #include "locations.h"
-#include "shown_text.h"
 #include "survey.h"
 #include "version.h"
 
 namespace {
 
 constexpr const char* Unknown = "unknown";
-
-Json texts(const std::vector<std::string>& names)
-{
-    Json list = Json::array();
-    for (const std::string& name : names)
-        list.push_back(jsonText(name));
-    return list;
-}
 
 Json problemsOf(const Installation& found)
 {
@@ -36,7 +27,7 @@ void addRegistered(Json& object, const Installation& found, const Json& none)
     object["build_date"] = complete ? Json(jsonText(registry.buildDate)) : none;
     object["home"] = complete ? Json(jsonText(registry.homeDirectory)) : none;
     object["configuration_root"] = complete ? Json(jsonText(registry.configRootDirectory)) : none;
-    object["exploiters"] = complete ? texts(exploiterList(registry.exploiters)) : none;
+    object["exploiters"] = complete ? textList(exploiterList(registry.exploiters)) : none;
 }
 
 /// Fills in what was found in the home directory, or `none` for each member.
@@ -54,7 +45,7 @@ void addHome(Json& object, const Installation& found, const Json& none)
                        {"files", found.indexedFiles ? Json(*found.indexedFiles) : Json(Unknown)}};
     object["recorded_type"] = found.recordedType;
     object["single_user_mode"] = found.singleUserMode ? Json(*found.singleUserMode) : Json(Unknown);
-    object["backups"] = found.backupsKnown ? texts(found.backups) : Json(Unknown);
+    object["backups"] = found.backupsKnown ? textList(found.backups) : Json(Unknown);
 }
 
 } // namespace

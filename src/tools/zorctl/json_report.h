@@ -6,8 +6,21 @@
 #pragma once
 
 #include "json_value.h"
+#include "shown_text.h"
+
+#include <string>
 
 struct Installation;
+
+/// `names` as a list of texts.
+template <typename Names>
+[[nodiscard]] Json textList(const Names& names)
+{
+    Json list = Json::array();
+    for (const std::string& name : names)
+        list.push_back(jsonText(name));
+    return list;
+}
 
 /// The head of the report of the subcommand `command`: schema number, names of the program.
 [[nodiscard]] Json reportHead(const char* command, int schema);

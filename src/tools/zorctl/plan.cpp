@@ -16,15 +16,6 @@ namespace {
 
 constexpr int PlanSchema = 1;
 
-template <typename Names>
-Json texts(const Names& names)
-{
-    Json list = Json::array();
-    for (const std::string& name : names)
-        list.push_back(jsonText(name));
-    return list;
-}
-
 Json textOrNull(const std::string& text)
 {
     return text.empty() ? Json(nullptr) : Json(jsonText(text));
@@ -69,16 +60,16 @@ Json toJson(const Forecast& forecast, bool locked)
     report["unchanged"] = forecast.unchanged;
     report["package"] = textOrNull(forecast.package);
     report["stops_scanners"] = forecast.stopsScanners;
-    report["commands"] = texts(forecast.commands);
+    report["commands"] = textList(forecast.commands);
     report["space"] = {{"needed", forecast.spaceNeeded}, {"available", forecast.spaceAvailable}};
-    report["created"] = texts(forecast.tree.created());
-    report["replaced"] = texts(replaced(forecast));
-    report["edited"] = texts(edited(forecast));
-    report["deleted"] = texts(forecast.tree.deleted());
-    report["deleted_of_owner"] = texts(forecast.ownerFiles);
-    report["created_directories"] = texts(forecast.tree.createdDirectories());
-    report["deleted_directories"] = texts(forecast.tree.deletedDirectories());
-    report["not_restored"] = texts(forecast.notRestored);
+    report["created"] = textList(forecast.tree.created());
+    report["replaced"] = textList(replaced(forecast));
+    report["edited"] = textList(edited(forecast));
+    report["deleted"] = textList(forecast.tree.deleted());
+    report["deleted_of_owner"] = textList(forecast.ownerFiles);
+    report["created_directories"] = textList(forecast.tree.createdDirectories());
+    report["deleted_directories"] = textList(forecast.tree.deletedDirectories());
+    report["not_restored"] = textList(forecast.notRestored);
     return report;
 }
 

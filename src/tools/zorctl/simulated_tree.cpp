@@ -22,7 +22,6 @@ Kind kindOnDisk(const std::string& path)
     return S_ISDIR(status.st_mode) ? Kind::Directory : Kind::File;
 }
 
-/// True for what can be deleted by its name, a dangling link too.
 Kind entryOnDisk(const std::string& path)
 {
     struct stat status = {};
@@ -37,6 +36,12 @@ Kind SimulatedTree::kindOf(const std::string& path) const
 {
     const auto changed = changes_.find(path);
     return changed != changes_.end() ? changed->second.kind : kindOnDisk(path);
+}
+
+Kind SimulatedTree::kindOfEntry(const std::string& path) const
+{
+    const auto changed = changes_.find(path);
+    return changed != changes_.end() ? changed->second.kind : entryOnDisk(path);
 }
 
 bool SimulatedTree::canCreateIn(const std::string& path) const
@@ -106,8 +111,7 @@ bool SimulatedTree::makePath(const std::string& path)
 
 bool SimulatedTree::remove(const std::string& path)
 {
-    const auto changed = changes_.find(path);
-    const Kind kind = changed != changes_.end() ? changed->second.kind : entryOnDisk(path);
+    const Kind kind = kindOfEntry(path);
     if (kind == Kind::Missing || (kind == Kind::Directory && !list(path).empty()))
         return false;
     if (!canCreateIn(parentOf(path)))
@@ -121,9 +125,7 @@ bool SimulatedTree::removeTree(const std::string& path, bool recurse)
     if (kindOf(path) != Kind::Directory)
         return false;
     for (const std::string& child : list(path)) {
-        const auto changed = changes_.find(child);
-        const Kind kind = changed != changes_.end() ? changed->second.kind : entryOnDisk(child);
-        if (kind != Kind::Directory)
+        if (kindOfEntry(child) != Kind::Directory)
             (void)remove(child);
         else if (recurse)
             (void)removeTree(child, true);
@@ -131,51 +133,18 @@ bool SimulatedTree::removeTree(const std::string& path, bool recurse)
     return remove(path);
 }
 
-std::set<std::string> SimulatedTree::created() const
+SimulatedTree::Paths SimulatedTree::written() const
 {
-    std::set<std::string> paths;
-    for (const auto& [path, node] : changes_) {
-        if (node.kind == Kind::File && entryOnDisk(path) == Kind::Missing)
-            paths.insert(path);
-    }
+    Paths paths = changes(Kind::File, Kind::File);
+    paths.merge(changes(Kind::Directory, Kind::File));
     return paths;
 }
 
-std::set<std::string> SimulatedTree::written() const
+SimulatedTree::Paths SimulatedTree::changes(Kind before, Kind after) const
 {
-    std::set<std::string> paths;
+    Paths paths;
     for (const auto& [path, node] : changes_) {
-        if (node.kind == Kind::File && entryOnDisk(path) != Kind::Missing)
-            paths.insert(path);
-    }
-    return paths;
-}
-
-std::set<std::string> SimulatedTree::deleted() const
-{
-    std::set<std::string> paths;
-    for (const auto& [path, node] : changes_) {
-        if (node.kind == Kind::Missing && entryOnDisk(path) == Kind::File)
-            paths.insert(path);
-    }
-    return paths;
-}
-
-std::set<std::string> SimulatedTree::createdDirectories() const
-{
-    std::set<std::string> paths;
-    for (const auto& [path, node] : changes_) {
-        if (node.kind == Kind::Directory && entryOnDisk(path) == Kind::Missing)
-            paths.insert(path);
-    }
-    return paths;
-}
-
-std::set<std::string> SimulatedTree::deletedDirectories() const
-{
-    std::set<std::string> paths;
-    for (const auto& [path, node] : changes_) {
-        if (node.kind == Kind::Missing && entryOnDisk(path) == Kind::Directory)
+        if (node.kind == after && entryOnDisk(path) == before)
             paths.insert(path);
     }
     return paths;

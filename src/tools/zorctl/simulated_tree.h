@@ -22,6 +22,9 @@ public:
         return kindOf(path) != Kind::Missing;
     }
 
+    /// What is at `path` itself: a link, a dangling one too, counts as a file.
+    [[nodiscard]] Kind kindOfEntry(const std::string& path) const;
+
     /// Whether this process may create something in the directory `path`.
     [[nodiscard]] bool canCreateIn(const std::string& path) const;
 
@@ -48,13 +51,25 @@ public:
     bool removeTree(const std::string& path, bool recurse);
 
     /// What was done, as it differs from the disk.
-    [[nodiscard]] std::set<std::string> created() const;            ///< files
-    [[nodiscard]] std::set<std::string> written() const;            ///< files that were there
-    [[nodiscard]] std::set<std::string> deleted() const;            ///< files
-    [[nodiscard]] std::set<std::string> createdDirectories() const; ///< "/" not at the end
-    [[nodiscard]] std::set<std::string> deletedDirectories() const;
+    using Paths = std::set<std::string>;
+    [[nodiscard]] Paths created() const { return changes(Kind::Missing, Kind::File); }
+    /// Files that replace something.
+    [[nodiscard]] Paths written() const;
+    [[nodiscard]] Paths deleted() const { return changes(Kind::File, Kind::Missing); }
+    /// Without "/" at the end.
+    [[nodiscard]] Paths createdDirectories() const
+    {
+        return changes(Kind::Missing, Kind::Directory);
+    }
+    [[nodiscard]] Paths deletedDirectories() const
+    {
+        return changes(Kind::Directory, Kind::Missing);
+    }
 
 private:
+    /// The paths at which the disk has `before` and the tree `after`.
+    [[nodiscard]] Paths changes(Kind before, Kind after) const;
+
     struct Node {
         Kind kind = Kind::Missing;
         unsigned long long size = 0;

@@ -1,77 +1,30 @@
 #include "simulation.h"
 
 #include "common_directory.h"
+#include "conclusion.h"
 #include "discovery.h"
 #include "exploiters.h"
 #include "file_index.h"
-#include "guarded_file.h"
 #include "locations.h"
-#include "package_files.h"
 #include "paths.h"
-#include "permissions.h"
 #include "removal.h"
 #include "safe_path.h"
 #include "settings.h"
+#include "simulated_extraction.h"
 #include "single_user_mode.h"
 #include "template_variables.h"
 #include "trace_directory.h"
 #include "upgrade.h"
-#include "zip_file.h"
 
 #include <algorithm>
-#include <cstring>
-#include <iostream>
 #include <set>
-#include <sstream>
-#include <string_view>
 
 #include <sys/stat.h>
-#include <sys/statvfs.h>
 #include <unistd.h>
 
 namespace {
 
 using Kind = SimulatedTree::Kind;
-
-constexpr std::size_t IndexLimit = std::size_t{64} << 20;
-
-/// Collects what the library prints while this exists.
-class CapturedOutput {
-public:
-    CapturedOutput()
-        : log_(logstream), out_(std::cout.rdbuf(text_.rdbuf())),
-          err_(std::cerr.rdbuf(errors_.rdbuf()))
-    {
-        logstream = &text_;
-    }
-    CapturedOutput(const CapturedOutput&) = delete;
-    CapturedOutput& operator=(const CapturedOutput&) = delete;
-    ~CapturedOutput()
-    {
-        logstream = log_;
-        std::cout.rdbuf(out_);
-        std::cerr.rdbuf(err_);
-    }
-
-    /// The first line of standard error, or of everything else.
-    [[nodiscard]] std::string firstLine() const
-    {
-        std::string text = errors_.str().empty() ? text_.str() : errors_.str();
-        return text.substr(0, text.find('\n'));
-    }
-
-private:
-    std::ostringstream text_;
-    std::ostringstream errors_;
-    std::ostream* log_;
-    std::streambuf* out_;
-    std::streambuf* err_;
-};
-
-unsigned long long roundedUp(unsigned long long size, unsigned long long block)
-{
-    return (size + block - 1) / block * block;
-}
 
 class Simulation {
 public:
@@ -91,7 +44,7 @@ public:
             remove(found, request);
         if (privateMode)
             runPrivately();
-        judge(found);
+        conclude(forecast_, found);
     }
 
 private:
@@ -198,73 +151,7 @@ private:
 
     void extract(const std::string& home, bool fresh)
     {
-        const ZipFile archive(spbPackage.c_str());
-        if (archive.entries().empty()) {
-            fail("the package " + spbPackage + " is not found or not valid");
-            return;
-        }
-        const std::string index = fileIndexPath(home);
-        noteLoss(index);
-        bool indexOpened = tree_.makePath(index) && tree_.canCreateIn(home);
-        if (indexOpened)
-            tree_.write(index, 0);
-        for (const PackagedFile& file : packagedFiles(archive, home, fresh)) {
-            if (!extractOne(file)) {
-                if (indexOpened)
-                    (void)tree_.remove(index);
-                return;
-            }
-        }
-    }
-
-    bool extractOne(const PackagedFile& file)
-    {
-        const std::string& path = file.path;
-        if (endsWithSlash(path)) {
-            if (!tree_.makePath(path))
-                fail("the directory " + path + " cannot be created");
-            return forecast_.failure.empty();
-        }
-        if (!isReadable(*file.entry)) {
-            fail("the entry for " + path +
-                 " cannot be opened: it is empty or of an unknown method");
-            return false;
-        }
-        const std::string directory = path.substr(0, path.rfind('/'));
-        const bool there = tree_.exists(path);
-        if (!tree_.canCreateIn(directory) || (there && !moveAway(path))) {
-            fail("the file " + path + " cannot be written: its directory is missing or closed");
-            return false;
-        }
-        // The second pass over "config/xss" takes the place of the first one's backup.
-        if (there && deployed_.contains(path))
-            noteLoss(path);
-        forecast_.spaceNeeded += roundedUp(file.entry->uncompressedSize, blockSize());
-        tree_.write(path, file.entry->uncompressedSize);
-        deployed_.insert(path);
-        return true;
-    }
-
-    static bool isReadable(const ZipEntry& entry)
-    {
-        return entry.uncompressedSize != 0 && entry.compressedSize != 0 &&
-               (entry.method == 0 || entry.method == 8);
-    }
-
-    /// What is at `path` becomes its backup, which the commit deletes; false if that fails. A
-    /// private installation keeps no backups and writes over it.
-    bool moveAway(const std::string& path)
-    {
-        if (!keepsBackups_)
-            return tree_.kindOf(path) == Kind::File;
-        const std::string backup = backupName(path);
-        if (tree_.kindOf(backup) == Kind::Directory)
-            return false;
-        if (tree_.exists(backup)) {
-            noteLoss(backup);
-            (void)tree_.remove(backup);
-        }
-        return true;
+        simulateExtraction(forecast_, home, fresh, keepsBackups_, deployed_);
     }
 
     void editProperties(const std::string& home)
@@ -407,7 +294,7 @@ private:
     /// The files of the index, which is completed first.
     void removeListed(const Discovery& found)
     {
-        const std::set<std::string> files = indexedFiles(found);
+        const std::set<std::string> files = removableFiles(found);
         const std::string& index = found.indexPath;
         // It is written anew even if it was missing, unless it cannot be.
         listedAny_ = tree_.canCreateIn(forecast_.home) || tree_.exists(index);
@@ -416,16 +303,6 @@ private:
                 (void)tree_.remove(path);
         }
         (void)tree_.remove(index);
-    }
-
-    std::set<std::string> indexedFiles(const Discovery& found) const
-    {
-        std::set<std::string> files;
-        const GuardedText index = readGuarded(found.indexPath, IndexLimit);
-        if (index.state == ReadState::Read)
-            readFileIndex(MemoryFile(index.text).path(), files);
-        addInstallerFiles(found.registry, files);
-        return files;
     }
 
     // Private mode.
@@ -464,78 +341,8 @@ private:
         forecast_.commands.push_back(joinPath(home, trawlcfgExe) + " " + arguments);
     }
 
-    void fail(const std::string& reason)
-    {
-        if (forecast_.failure.empty())
-            forecast_.failure = reason;
-    }
-
-    /// Remembers a file, or all files in a directory, that a rollback does not restore.
-    void noteLoss(const std::string& path)
-    {
-        if (tree_.kindOf(path) == Kind::Directory) {
-            for (const std::string& child : tree_.list(path))
-                noteLoss(child);
-        } else if (tree_.exists(path)) {
-            forecast_.notRestored.push_back(path);
-        }
-    }
-
-    unsigned long long blockSize()
-    {
-        if (blockSize_ == 0)
-            measureSpace();
-        return blockSize_;
-    }
-
-    void measureSpace()
-    {
-        std::string place = forecast_.privateHome.empty() ? forecast_.home : forecast_.privateHome;
-        while (!place.empty() && !pathExists(place))
-            place.erase(place.rfind('/') == std::string::npos ? 0 : place.rfind('/'));
-        struct statvfs status = {};
-        blockSize_ = 4096;
-        if (statvfs(place.empty() ? "/" : place.c_str(), &status) != 0)
-            return;
-        blockSize_ = status.f_frsize != 0 ? status.f_frsize : 4096;
-        forecast_.spaceAvailable = static_cast<unsigned long long>(status.f_bavail) * blockSize_;
-    }
-
-    void judge(const Discovery& found)
-    {
-        (void)blockSize();
-        if (forecast_.failure.empty() && forecast_.spaceNeeded > forecast_.spaceAvailable)
-            fail("the file system has not enough space");
-        if (privateMode) { // never rolled back
-            for (const std::set<std::string>& paths : {tree_.deleted(), tree_.written()})
-                forecast_.notRestored.insert(forecast_.notRestored.end(), paths.begin(),
-                                             paths.end());
-        }
-        const std::set<std::string> known = indexedFiles(found);
-        const std::set<std::string> own = {
-            found.indexPath, registryPath(localInstall), backupName(registryPath(localInstall)),
-            joinPath(forecast_.home, joinPath(auxDirInstall, installProps))};
-        for (const std::string& path : tree_.deleted()) {
-            if (!known.contains(path) && !own.contains(path))
-                forecast_.ownerFiles.push_back(path);
-        }
-        forecast_.unchanged = tree_.created().empty() && tree_.written().empty() &&
-                              tree_.deleted().empty() && tree_.createdDirectories().empty() &&
-                              tree_.deletedDirectories().empty() && modesAreSet(found);
-    }
-
-    /// Whether the permission pass of an installation would change nothing.
-    bool modesAreSet(const Discovery& found) const
-    {
-        if (!found.installAction || !forecast_.failure.empty())
-            return true;
-        const std::vector<Permission> table = permissionTable(found);
-        return std::all_of(table.begin(), table.end(), [](const Permission& permission) {
-            struct stat status = {};
-            return stat(permission.path.c_str(), &status) != 0 ||
-                   (status.st_mode & 07777) == permission.mode;
-        });
-    }
+    void fail(const std::string& reason) { forecast_.fail(reason); }
+    void noteLoss(const std::string& path) { forecast_.noteLoss(path); }
 
     const CommandLine& commandLine_;
     Forecast& forecast_;
@@ -543,49 +350,9 @@ private:
     std::set<std::string> deployed_;
     bool keepsBackups_ = true;
     bool listedAny_ = false;
-    unsigned long long blockSize_ = 0;
 };
 
 } // namespace
-
-std::vector<std::string> withoutLogFile(const std::vector<std::string>& arguments)
-{
-    std::vector<std::string> kept;
-    for (std::size_t at = 0; at < arguments.size(); ++at) {
-        const std::string& option = arguments[at];
-        const bool isOption = at >= 2 && option.size() == 2 && option[0] == '-';
-        const bool takesArgument =
-            isOption && std::strchr("dfsoc", option[1]) != nullptr && at + 1 < arguments.size();
-        if (takesArgument && option[1] == 'o') {
-            ++at;
-            continue;
-        }
-        kept.push_back(option);
-        if (takesArgument)
-            kept.push_back(arguments[++at]);
-    }
-    return kept;
-}
-
-PlannedRun parseRun(const std::vector<std::string>& arguments)
-{
-    std::vector<std::string> texts = withoutLogFile(arguments);
-    texts.insert(texts.begin(), "wzorinst");
-    std::vector<char*> pointers;
-    for (std::string& text : texts)
-        pointers.push_back(text.data());
-    pointers.push_back(nullptr);
-
-    PlannedRun run;
-    const CapturedOutput output;
-    if (!isRoot())
-        localInstall = true;
-    if (parseCommandLine(static_cast<int>(texts.size()), pointers.data(), run.commandLine) != 0)
-        run.error = output.firstLine();
-    else if (fixDestination(run.commandLine, defaultInstallDir(localInstall)) != 0)
-        run.error = "no destination directory";
-    return run;
-}
 
 Forecast forecastRun(const PlannedRun& run)
 {

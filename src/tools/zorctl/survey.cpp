@@ -2,6 +2,7 @@
 
 #include "file_index.h"
 #include "guarded_file.h"
+#include "guarded_index.h"
 #include "locations.h"
 #include "paths.h"
 #include "property_file.h"
@@ -13,6 +14,7 @@
 #include <cerrno>
 #include <set>
 #include <string_view>
+#include <utility>
 
 #include <fcntl.h>
 #include <pwd.h>
@@ -23,7 +25,6 @@ namespace {
 
 constexpr std::size_t RegistryLimit = std::size_t{1} << 20;
 constexpr std::size_t PropertyLimit = std::size_t{1} << 20;
-constexpr std::size_t IndexLimit = std::size_t{64} << 20;
 constexpr std::size_t MostNames = 1'000'000; // looked at in search of backups
 
 bool hasContent(const std::string& text)
@@ -81,21 +82,11 @@ std::string homeStateOf(const Installation& found)
 /// Reads the index; returns its paths.
 std::set<std::string> readIndex(Installation& found)
 {
-    std::set<std::string> files;
-    const std::string path = fileIndexPath(found.registry.homeDirectory);
-    const GuardedText index = readGuarded(path, IndexLimit);
-    found.indexState = readStateName(index.state);
-    if (index.state != ReadState::Read)
-        return files;
-
-    // Only a finished index has a time in its first line.
-    const std::string_view header(index.text.data(),
-                                  std::min(index.text.find('\n'), index.text.size()));
-    const bool finished = header.find(" installed on ") != std::string_view::npos;
-    found.indexState = finished ? "complete" : "interrupted";
-    readFileIndex(MemoryFile(index.text).path(), files);
-    found.indexedFiles = files.size();
-    return files;
+    GuardedIndex index = readGuardedIndex(fileIndexPath(found.registry.homeDirectory));
+    found.indexState = index.state;
+    if (index.isRead())
+        found.indexedFiles = index.files.size();
+    return std::move(index.files);
 }
 
 std::string recordedTypeOf(const std::string& home)

@@ -1,46 +1,56 @@
 #include "trusted_path.h"
 
-#include <cstdlib>
-#include <memory>
+#include "paths.h"
+#include "safe_path.h"
 
+#include <cstdio>
+
+#include <fcntl.h>
 #include <sys/stat.h>
-#include <unistd.h>
 
 namespace {
 
-bool isOurs(const struct stat& status)
+constexpr int DirectoryFlags = O_PATH | O_DIRECTORY | O_CLOEXEC;
+
+/// Whether nobody else can write to the open `directory` or to any directory above it.
+bool isClosedToOthers(int directory)
 {
-    return status.st_uid == 0 || status.st_uid == geteuid();
+    ScopedFd current(openat(directory, ".", DirectoryFlags));
+    for (;;) {
+        struct stat here = {};
+        struct stat above = {};
+        if (!current.isOpen() || fstat(current.get(), &here) != 0 || othersCanPlant(here))
+            return false;
+        current = ScopedFd(openat(current.get(), "..", DirectoryFlags));
+        if (!current.isOpen() || fstat(current.get(), &above) != 0)
+            return false;
+        if (identityOf(above) == identityOf(here)) // "/"
+            return true;
+    }
 }
 
-bool isClosedToOthers(const std::string& directory)
+bool isTrusted(const Place& place)
 {
     struct stat status = {};
-    return lstat(directory.c_str(), &status) == 0 && S_ISDIR(status.st_mode) && isOurs(status) &&
-           (status.st_mode & 022) == 0;
+    return fstatat(place.fd(), place.name.c_str(), &status, AT_SYMLINK_NOFOLLOW) == 0 &&
+           S_ISREG(status.st_mode) && isTrustedOwner(status.st_uid) && status.st_nlink == 1 &&
+           isClosedToOthers(place.fd());
 }
-
-struct Free {
-    void operator()(char* text) const { std::free(text); } // NOLINT: of realpath()
-};
 
 } // namespace
 
 bool isTrustedFile(const std::string& path)
 {
-    struct stat status = {};
-    if (lstat(path.c_str(), &status) != 0 || !S_ISREG(status.st_mode) || !isOurs(status) ||
-        status.st_nlink != 1)
+    Place place;
+    return findPlace(path, LastLink::Keep, place) == 0 && isTrusted(place);
+}
+
+bool restoreTrusted(const std::string& backup)
+{
+    Place place;
+    if (findPlace(backup, LastLink::Keep, place) != 0 || !isTrusted(place) ||
+        !place.name.ends_with(BackupSuffix))
         return false;
-    const std::string parent = path.substr(0, path.rfind('/'));
-    const std::unique_ptr<char, Free> real(realpath(parent.c_str(), nullptr));
-    if (!real || !isClosedToOthers("/"))
-        return false;
-    const std::string directory = real.get();
-    for (std::size_t slash = directory.find('/', 1); slash != std::string::npos;
-         slash = directory.find('/', slash + 1)) {
-        if (!isClosedToOthers(directory.substr(0, slash)))
-            return false;
-    }
-    return isClosedToOthers(directory);
+    const std::string name = place.name.substr(0, place.name.size() - BackupSuffix.size());
+    return renameat(place.fd(), place.name.c_str(), place.fd(), name.c_str()) == 0;
 }

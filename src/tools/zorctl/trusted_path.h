@@ -1,4 +1,4 @@
-// Which files root may put in the place of others.
+// Which backups root may put back in the place of others.
 #pragma once
 
 #include <string>
@@ -7,3 +7,8 @@
 /// directory that, like everything above it, nobody else can write to. Then nobody else can
 /// exchange it meanwhile.
 [[nodiscard]] bool isTrustedFile(const std::string& path);
+
+/// Renames `backup` to the name without BackupSuffix if isTrustedFile(): checked and renamed in the
+/// same open directory, so that a link on the path that is exchanged meanwhile leads nowhere else.
+/// Returns false if it is not trusted or cannot be renamed.
+[[nodiscard]] bool restoreTrusted(const std::string& backup);

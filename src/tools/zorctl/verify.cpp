@@ -337,7 +337,7 @@ private:
         return value;
     }
 
-    /// What an upgrade adds to "Zor.properties", besides what the package has.
+    /// What an upgrade adds to "Zor.properties", in addition to what the package has.
     std::map<std::string, std::set<std::string>> defaultsOfUpgrades() const
     {
         PropertyFile file;
