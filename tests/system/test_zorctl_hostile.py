@@ -11,13 +11,13 @@ from harness.zorctl import report, zorctl
 pytestmark = pytest.mark.skipif(why_not() is not None, reason=str(why_not()))
 
 HOME = "/opt/corvan/zor"
-OPEN = HOME + "/bin/customscanners"  # where everybody may create
+OPEN = HOME + "/bin/etc"  # where everybody may create
 
 
 @pytest.fixture
 def machine(binary):
     fresh = SharedMachine(binary)
-    fresh.make_directory("/run")
+    fresh.plant("/run/wzorinst.lock")
     yield fresh
     fresh.delete()
 
@@ -95,3 +95,58 @@ def test_a_plan_follows_no_links_below_a_directory_that_goes(installed):
         *own,
         HOME + "/properties/scan.properties",
     ]
+
+
+# verify
+
+
+def foreign(machine, **options):
+    found = report(machine, "verify", SPB, **options)
+    return [(one["kind"], one["path"]) for one in found["differences"]]
+
+
+def test_verify_finds_what_is_deep_down(installed):
+    """Deeper than the process may have files open."""
+    levels = 100
+
+    def plant():
+        os.chdir(installed.at(OPEN))
+        for _ in range(levels):
+            os.mkdir("d")
+            os.chdir("d")
+        with open("deep", "wb"):
+            pass
+
+    installed.as_user(GUEST, plant)
+
+    few = ("/bin/sh", "-c", 'ulimit -n 32; exec "$0" "$@"')
+    assert foreign(installed, tool=few) == [("foreign", OPEN + "/d" * levels + "/deep")]
+
+
+def test_verify_says_where_it_cannot_look(installed):
+    """A path may have 4095 bytes."""
+    name = "d" * 250
+
+    def plant():
+        os.chdir(installed.at(OPEN))
+        for _ in range(17):
+            os.mkdir(name)
+            os.chdir(name)
+
+    installed.as_user(GUEST, plant)
+
+    assert foreign(installed, status=2) == [("unknown", OPEN + ("/" + name) * 17)]
+
+
+def test_verify_follows_no_link_of_others(installed):
+    installed.link_as(GUEST, OPEN + "/loop", ".")
+    installed.link_as(GUEST, OPEN + "/secret", SECRET)
+
+    assert foreign(installed) == [("foreign", OPEN + "/loop"), ("foreign", OPEN + "/secret")]
+
+
+def test_verify_says_what_a_user_may_not_look_at(installed):
+    found = report(installed, "verify", SPB, "--type", "global", user=ANN, status=2)
+
+    assert {one["kind"] for one in found["differences"]} == {"unknown"}
+    assert HOME + "/install" in [one["path"] for one in found["differences"]]

@@ -92,44 +92,6 @@ bool beginsWithTinyBlocks(const unsigned char* packed)
     return blocks >= FewBlocks && used < blocks * TinyBlock;
 }
 
-/// The content of `entry`, inflated in one call and confirmed by its size and its CRC-32; null when
-/// anything about it is unexpected. Valid until the next call.
-///
-/// The stream is the definition of an entry's content, and its zlib refuses some data that
-/// libdeflate (1.14) accepts:
-/// - more than 286 codes of literals and lengths or more than 30 of distances, and the length
-///   symbols 286 and 287 and the distance symbols 30 and 31 of the fixed code;
-/// - code lengths whose code is empty or has a single symbol, a use of a distance where the block
-///   has no distance code, and the unused half of a code with a single symbol;
-/// - a repeated code length that goes on past the last one.
-/// The stream would deliver a shorter entry then. No compressor writes such data, and recognising
-/// it would take a second decoder. Where the content has the recorded size and CRC-32 all the same,
-/// it is what was packed, and nobody is served by less: such an entry counts as sound.
-const unsigned char* inflateWhole(PackageWindow& package, const ZipEntry& entry)
-{
-    static const std::unique_ptr<libdeflate_decompressor, void (*)(libdeflate_decompressor*)>
-        decompressor(libdeflate_alloc_decompressor(), libdeflate_free_decompressor);
-    static Buffer buffer;
-    const unsigned char* const packed = package.bytes(dataStart(entry), entry.compressedSize);
-    if (!decompressor || packed == nullptr)
-        return nullptr;
-
-    if (entry.compressedSize >= MinProbedSize && beginsWithTinyBlocks(packed))
-        return nullptr;
-    unsigned char* const content = buffer.ofSize(entry.uncompressedSize);
-    if (content == nullptr)
-        return nullptr;
-    std::size_t used = 0; // the deflate stream may end before the entry's data
-    std::size_t size = 0;
-    if (libdeflate_deflate_decompress_ex(decompressor.get(), packed, entry.compressedSize, content,
-                                         entry.uncompressedSize, &used,
-                                         &size) != LIBDEFLATE_SUCCESS)
-        return nullptr;
-    const bool confirmed =
-        size == entry.uncompressedSize && libdeflate_crc32(0, content, size) == entry.crc32;
-    return confirmed ? content : nullptr;
-}
-
 /// Inflates the raw deflated data of one entry, piece by piece.
 class PieceReader {
 public:
@@ -199,12 +161,9 @@ int copyInPieces(const PackageWindow& package, const ZipEntry& entry, int destin
 
 int copyDeflated(PackageWindow& package, const ZipEntry& entry, int destination)
 {
-    if (isWorthInflatingWhole(entry)) {
-        const unsigned char* const content = inflateWhole(package, entry);
-        if (content != nullptr)
-            return writeAll(destination, content, entry.uncompressedSize);
-    }
-    return copyInPieces(package, entry, destination);
+    const unsigned char* const content = wholeContent(package, entry);
+    return content != nullptr ? writeAll(destination, content, entry.uncompressedSize)
+                              : copyInPieces(package, entry, destination);
 }
 
 /// Lets the system copy. Where it cannot, or fails, the stream does it or reports the failure.
@@ -226,6 +185,43 @@ int copyStored(const PackageWindow& package, const ZipEntry& entry, int destinat
 }
 
 } // namespace
+
+// The stream is the definition of an entry's content, and its zlib refuses some data that
+// libdeflate (1.14) accepts:
+// - more than 286 codes of literals and lengths or more than 30 of distances, and the length
+//   symbols 286 and 287 and the distance symbols 30 and 31 of the fixed code;
+// - code lengths whose code is empty or has a single symbol, a use of a distance where the block
+//   has no distance code, and the unused half of a code with a single symbol;
+// - a repeated code length that goes on past the last one.
+// The stream would deliver a shorter entry then. No compressor writes such data, and recognising
+// it would take a second decoder. Where the content has the recorded size and CRC-32 all the same,
+// it is what was packed, and nobody is served by less: such an entry counts as sound.
+const unsigned char* wholeContent(PackageWindow& package, const ZipEntry& entry)
+{
+    if (entry.method == 0 || !isWorthInflatingWhole(entry))
+        return nullptr;
+    static const std::unique_ptr<libdeflate_decompressor, void (*)(libdeflate_decompressor*)>
+        decompressor(libdeflate_alloc_decompressor(), libdeflate_free_decompressor);
+    static Buffer buffer;
+    const unsigned char* const packed = package.bytes(dataStart(entry), entry.compressedSize);
+    if (!decompressor || packed == nullptr)
+        return nullptr;
+
+    if (entry.compressedSize >= MinProbedSize && beginsWithTinyBlocks(packed))
+        return nullptr;
+    unsigned char* const content = buffer.ofSize(entry.uncompressedSize);
+    if (content == nullptr)
+        return nullptr;
+    std::size_t used = 0; // the deflate stream may end before the entry's data
+    std::size_t size = 0;
+    if (libdeflate_deflate_decompress_ex(decompressor.get(), packed, entry.compressedSize, content,
+                                         entry.uncompressedSize, &used,
+                                         &size) != LIBDEFLATE_SUCCESS)
+        return nullptr;
+    const bool confirmed =
+        size == entry.uncompressedSize && libdeflate_crc32(0, content, size) == entry.crc32;
+    return confirmed ? content : nullptr;
+}
 
 int copySoundEntry(PackageWindow& package, const ZipEntry& entry, int destination)
 {

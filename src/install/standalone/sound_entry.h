@@ -20,3 +20,8 @@ inline constexpr int EntryNotSound = -1;
 /// Keeps its buffer for the next entry: at most 16 MiB, and no more than the largest entry so far
 /// needed. The window of `package` holds the data of an entry, which is smaller.
 [[nodiscard]] int copySoundEntry(PackageWindow& package, const ZipEntry& entry, int destination);
+
+/// The content of `entry`, inflated in one call and confirmed by its size and its CRC-32; valid
+/// until the next call. Null if the entry is stored, too large or not worth it, or if anything
+/// about it is unexpected: its stream decides then. The memory is that of copySoundEntry().
+[[nodiscard]] const unsigned char* wholeContent(PackageWindow& package, const ZipEntry& entry);

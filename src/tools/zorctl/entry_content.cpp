@@ -1,12 +1,10 @@
 #include "entry_content.h"
 
-#include "scoped.h"
+#include "sound_entry.h"
 #include "zip_file.h"
 
 #include <algorithm>
 #include <vector>
-
-#include <unistd.h>
 
 namespace {
 
@@ -18,49 +16,44 @@ using Consumer = std::function<bool(const char*, std::size_t)>;
 /// Reads the raw bytes of an entry one block after the other.
 class RawReader {
 public:
-    RawReader(int archive, const ZipEntry& entry)
-        : archive_(archive), at_(dataStart(entry)), left_(entry.compressedSize)
+    RawReader(PackageWindow& window, const ZipEntry& entry)
+        : window_(window), at_(dataStart(entry)), left_(entry.compressedSize)
     {
     }
 
-    /// The next block; empty at the end, or when the archive ends too early.
-    std::size_t next()
+    /// The next block, valid until the next call, and its `size`; null at the end, or when the
+    /// archive ends too early.
+    const char* next(std::size_t& size)
     {
-        const std::size_t wanted = std::min<std::size_t>(block_.size(), left_);
-        const ssize_t count =
-            wanted == 0 ? 0 : pread(archive_, block_.data(), wanted, static_cast<off_t>(at_));
-        if (count <= 0)
-            return 0;
-        at_ += count;
-        left_ -= static_cast<std::uint32_t>(count);
-        return static_cast<std::size_t>(count);
+        size = std::min<std::size_t>(BlockSize, left_);
+        const unsigned char* const block = size == 0 ? nullptr : window_.bytes(at_, size);
+        at_ += static_cast<std::int64_t>(size);
+        left_ -= static_cast<std::uint32_t>(size);
+        return reinterpret_cast<const char*>(block);
     }
-
-    [[nodiscard]] char* data() { return block_.data(); }
 
 private:
-    int archive_;
+    PackageWindow& window_;
     std::int64_t at_;
     std::uint32_t left_;
-    // One for all: to allocate and clear a block for each of many small entries costs more than to
-    // read them. The tools have one thread.
-    inline static std::vector<char> block_ = std::vector<char>(BlockSize);
 };
 
 EntryState readStored(RawReader& reader, const ZipEntry& entry, const Consumer& consume)
 {
     if (entry.compressedSize != entry.uncompressedSize)
         return EntryState::Damaged;
-    std::uint32_t left = entry.uncompressedSize;
-    while (const std::size_t count = reader.next()) {
-        left -= static_cast<std::uint32_t>(count);
-        if (!consume(reader.data(), count))
+    std::size_t left = entry.uncompressedSize;
+    std::size_t size = 0;
+    while (const char* const block = reader.next(size)) {
+        left -= size;
+        if (!consume(block, size))
             return EntryState::Stopped;
     }
     return left == 0 ? EntryState::Whole : EntryState::Damaged;
 }
 
-/// The inflater of all entries, made ready for the next one; null without memory.
+/// The inflater of all entries, made ready for the next one; null without memory. The tools have
+/// one thread.
 z_stream* readyInflater()
 {
     static z_stream stream = {};
@@ -79,11 +72,13 @@ EntryState readDeflated(RawReader& reader, const ZipEntry& entry, const Consumer
     std::uint32_t left = entry.uncompressedSize;
     for (int result = Z_OK; result != Z_STREAM_END;) {
         if (stream.avail_in == 0) {
-            const std::size_t count = reader.next();
-            if (count == 0)
+            std::size_t size = 0;
+            const char* const block = reader.next(size);
+            if (block == nullptr)
                 return EntryState::Damaged;
-            stream.next_in = reinterpret_cast<Bytef*>(reader.data());
-            stream.avail_in = static_cast<uInt>(count);
+            // Only read: zlib's interface lacks a const.
+            stream.next_in = reinterpret_cast<Bytef*>(const_cast<char*>(block));
+            stream.avail_in = static_cast<uInt>(size);
         }
         stream.next_out = reinterpret_cast<Bytef*>(output.data());
         stream.avail_out = static_cast<uInt>(output.size());
@@ -102,23 +97,25 @@ EntryState readDeflated(RawReader& reader, const ZipEntry& entry, const Consumer
 
 } // namespace
 
-EntryState readEntry(const ZipFile& archive, const ZipEntry& entry, const Consumer& consume)
+EntryReader::EntryReader(const ZipFile& archive) : window_(archive.openArchive()) {}
+
+EntryState EntryReader::read(const ZipEntry& entry, const Consumer& consume)
 {
     if (!hasStream(&entry)) // no data, or a method that the installer does not know either
         return EntryState::Damaged;
-    const ScopedFd file = archive.openArchive();
-    if (!file.isOpen())
-        return EntryState::Damaged;
-    RawReader reader(file.get(), entry);
+    if (const unsigned char* const whole = wholeContent(window_, entry)) {
+        const bool wanted = consume(reinterpret_cast<const char*>(whole), entry.uncompressedSize);
+        return wanted ? EntryState::Whole : EntryState::Stopped;
+    }
+    RawReader reader(window_, entry);
     return entry.method == 0 ? readStored(reader, entry, consume)
                              : readDeflated(reader, entry, consume);
 }
 
-bool readSmallEntry(const ZipFile& archive, const ZipEntry& entry, std::size_t limit,
-                    std::string& text)
+bool EntryReader::readSmall(const ZipEntry& entry, std::size_t limit, std::string& text)
 {
     text.clear();
-    const EntryState state = readEntry(archive, entry, [&](const char* data, std::size_t size) {
+    const EntryState state = read(entry, [&](const char* data, std::size_t size) {
         if (text.size() + size > limit)
             return false;
         text.append(data, size);

@@ -1,6 +1,8 @@
 // The content of a package's entries, read with bounded memory whatever their headers claim.
 #pragma once
 
+#include "package_window.h"
+
 #include <cstddef>
 #include <functional>
 #include <string>
@@ -15,10 +17,19 @@ enum class EntryState {
     Stopped, ///< the consumer had enough
 };
 
-/// Delivers the content of `entry` piece by piece to `consume`, which returns false to stop.
-[[nodiscard]] EntryState readEntry(const ZipFile& archive, const ZipEntry& entry,
-                                   const std::function<bool(const char*, std::size_t)>& consume);
+/// Reads entries of a package that stays open.
+class EntryReader {
+public:
+    /// `archive` must outlive this.
+    explicit EntryReader(const ZipFile& archive);
 
-/// Reads all of `entry` into `text` if that is at most `limit` bytes.
-[[nodiscard]] bool readSmallEntry(const ZipFile& archive, const ZipEntry& entry, std::size_t limit,
-                                  std::string& text);
+    /// Delivers the content of `entry` piece by piece to `consume`, which returns false to stop.
+    [[nodiscard]] EntryState read(const ZipEntry& entry,
+                                  const std::function<bool(const char*, std::size_t)>& consume);
+
+    /// Reads all of `entry` into `text` if that is at most `limit` bytes.
+    [[nodiscard]] bool readSmall(const ZipEntry& entry, std::size_t limit, std::string& text);
+
+private:
+    PackageWindow window_;
+};

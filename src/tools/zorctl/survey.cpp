@@ -1,17 +1,18 @@
 #include "survey.h"
 
+#include "directory_names.h"
 #include "file_index.h"
 #include "guarded_file.h"
 #include "guarded_index.h"
 #include "locations.h"
 #include "paths.h"
 #include "property_file.h"
-#include "scoped.h"
 #include "settings.h"
 #include "single_user_mode.h"
 
 #include <algorithm>
 #include <cerrno>
+#include <iterator>
 #include <set>
 #include <string_view>
 #include <utility>
@@ -25,7 +26,6 @@ namespace {
 
 constexpr std::size_t RegistryLimit = std::size_t{1} << 20;
 constexpr std::size_t PropertyLimit = std::size_t{1} << 20;
-constexpr std::size_t MostNames = 1'000'000; // looked at in search of backups
 
 bool hasContent(const std::string& text)
 {
@@ -201,29 +201,18 @@ void survey(Installation& found)
         found.health = found.registryState == "complete" ? Health::Intact : Health::Absent;
 }
 
-/// The names in a directory; false when it cannot be listed.
-bool listDirectory(const std::string& path, std::vector<std::string>& directories,
-                   std::vector<std::string>& files)
+/// Where the shared installation, or that of the current user, is registered.
+Installation placeOf(bool local)
 {
-    // A link in place of a package directory is followed as the installer does; below, none is.
-    ScopedFd fd(open(path.c_str(), O_RDONLY | O_DIRECTORY | O_NONBLOCK | O_CLOEXEC));
-    const ScopedDir dir(fd.isOpen() ? fdopendir(fd.get()) : nullptr);
-    if (!dir)
-        return errno == ENOENT || errno == ENOTDIR;
-    (void)fd.release(); // the stream owns it now
-    while (const dirent* entry = readdir(dir.get())) {
-        const std::string_view name = entry->d_name;
-        if (name == "." || name == "..")
-            continue;
-        struct stat status = {};
-        const bool known =
-            fstatat(dirfd(dir.get()), entry->d_name, &status, AT_SYMLINK_NOFOLLOW) == 0;
-        if (known && S_ISDIR(status.st_mode))
-            directories.push_back(joinPath(path, name));
-        else
-            files.push_back(joinPath(path, name));
-    }
-    return true;
+    Installation found;
+    found.local = local;
+    found.registryPath = registryPath(local);
+    if (!local)
+        return found;
+    found.uid = getuid();
+    if (const passwd* const entry = getpwuid(found.uid))
+        found.user = entry->pw_name;
+    return found;
 }
 
 } // namespace
@@ -235,41 +224,41 @@ std::vector<std::string> findBackups(const std::string& home, bool& complete)
         pending.push_back(joinPath(home, name));
 
     std::vector<std::string> backups;
-    std::size_t names = 0;
+    std::size_t left = MostNames;
     while (!pending.empty()) {
-        const std::string directory = pending.back();
+        DirectoryNames names;
+        const std::string directory = std::move(pending.back());
         pending.pop_back();
-        std::vector<std::string> files;
-        if (!listDirectory(directory, pending, files))
+        if (listDirectory(directory, left, names) == Listed::NotAll)
             complete = false;
-        names += files.size() + 1;
-        if (names > MostNames) {
-            complete = false;
-            break;
-        }
-        std::copy_if(files.begin(), files.end(), std::back_inserter(backups),
+        left -= names.count();
+        std::move(names.directories.begin(), names.directories.end(), std::back_inserter(pending));
+        std::copy_if(names.files.begin(), names.files.end(), std::back_inserter(backups),
                      [](const std::string& file) { return file.ends_with(BackupSuffix); });
     }
     std::sort(backups.begin(), backups.end());
     return backups;
 }
 
+Installation surveyRegistry(bool local)
+{
+    Installation found = placeOf(local);
+    found.registryState = readRegistry(found.registryPath, found.registry);
+    if (found.registryState == "complete")
+        found.singleUserMode = singleUserModeOf(found.registry.homeDirectory);
+    return found;
+}
+
 Installation surveyShared()
 {
-    Installation found;
-    found.registryPath = registryPath(false);
+    Installation found = placeOf(false);
     survey(found);
     return found;
 }
 
 Installation surveyOwn()
 {
-    Installation found;
-    found.local = true;
-    found.uid = getuid();
-    if (const passwd* const entry = getpwuid(found.uid))
-        found.user = entry->pw_name;
-    found.registryPath = registryPath(true);
+    Installation found = placeOf(true);
     survey(found);
     return found;
 }

@@ -65,6 +65,10 @@ struct Account {
     std::string home;
 };
 
+/// What the registry of the shared installation, or of the current user's, says, and whether it is
+/// one in single-user mode; nothing about health, index and backups.
+[[nodiscard]] Installation surveyRegistry(bool local);
+
 /// Surveys the shared installation.
 [[nodiscard]] Installation surveyShared();
 
