@@ -9,7 +9,9 @@
 
 namespace {
 
-/// The fastest level whose output is no larger than that of zlib's level 6, on programs and texts.
+/// The fastest level whose output is no larger than that of zlib's level 6, on programs: 300 MB of
+/// them take 0.32 of the processor time. On texts it takes 0.38 of the time for 2.5 % more; level 6
+/// would take 0.5 of it for 0.3 % more.
 constexpr int Level = 5;
 
 /// libdeflate ends a block after 300,000 bytes, or as many more as make none of their own.
