@@ -1,8 +1,10 @@
 """`spb` looks into packages, compares, unpacks and signs them."""
 
+import contextlib
 import json
 import os
 import subprocess
+import sys
 
 import pytest
 
@@ -173,6 +175,53 @@ def test_extract_follows_no_link_and_replaces_no_file(tmp_path, spb):
     assert os.listdir(outside) == ["file"] and (outside / "file").read_bytes() == b"old"
     assert (target / "config" / "file").read_bytes() == b"old"
     assert (target / "config" / "b").read_bytes() == b"4"
+
+
+# Exchanges two names as fast as it can.
+EXCHANGE = """
+import ctypes, sys
+libc = ctypes.CDLL(None)
+here, there = (name.encode() for name in sys.argv[1:])
+print("ready", flush=True)
+while True:
+    libc.renameat2(-100, here, -100, there, 2)
+"""
+
+
+@contextlib.contextmanager
+def exchanging(here, there):
+    """Somebody exchanges the names `here` and `there` meanwhile."""
+    command = [sys.executable, "-c", EXCHANGE, here, there]
+    with subprocess.Popen(command, stdout=subprocess.PIPE) as attacker:
+        assert attacker.stdout.readline() == b"ready\n"
+        yield
+        assert attacker.poll() is None
+        attacker.kill()
+
+
+def test_extract_writes_nothing_outside_while_directories_become_links(tmp_path, spb):
+    """Writing by paths would reach the link's target within the first dozen files."""
+    names = [f"bin/deep/{number:03}" for number in range(400)]
+    planted(spb, ("bin/", b""), *((name, b"1") for name in names))
+    outside = tmp_path / "outside"
+    outside.mkdir()
+    exchanged = set()
+    for number in range(5):
+        target = tmp_path / f"target{number}"
+        deep, link = target / "bin" / "deep", target / "link"
+        deep.mkdir(parents=True)
+        link.symlink_to(outside)
+
+        with exchanging(deep, link):
+            done = spb_tool.run("extract", spb, "-d", target)
+
+        assert done.returncode in (0, 1)
+        exchanged.add(done.returncode)
+        assert set(done.stderr.splitlines()) <= {
+            f"spb: {target}/{name}: Not a directory" for name in names
+        }
+        assert os.listdir(outside) == []
+    assert 1 in exchanged  # the link was met
 
 
 @pytest.mark.parametrize(
