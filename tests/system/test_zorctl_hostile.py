@@ -150,3 +150,99 @@ def test_verify_says_what_a_user_may_not_look_at(installed):
 
     assert {one["kind"] for one in found["differences"]} == {"unknown"}
     assert HOME + "/install" in [one["path"] for one in found["differences"]]
+
+
+# run
+
+
+@pytest.fixture
+def ready(machine):
+    """A machine with spb next to zorctl, and a place for copies and logs."""
+    machine.make_directory("/var/tmp", 0o1777)
+    machine.make_directory("/var/log")
+    with open(os.environ["SPB"], "rb") as file:
+        machine.plant("/media/spb", file.read(), 0o755)
+    return machine
+
+
+@pytest.mark.parametrize(
+    "place, owner, mode, used",
+    [
+        ("/srv/tmp", None, 0o700, "/srv/tmp"),
+        ("/srv/tmp", None, 0o1777, "/srv/tmp"),
+        ("/srv/tmp", None, 0o777, "/var/tmp"),
+        ("/home/guest/tmp", GUEST, 0o755, "/var/tmp"),
+        ("/home/guest/tmp", None, 0o700, "/var/tmp"),
+    ],
+    ids=["closed", "sticky", "open", "of another user", "below another user's"],
+)
+def test_the_copy_is_where_nobody_else_can_exchange_it(ready, place, owner, mode, used):
+    ready.make_directory(place, mode)
+    if owner:
+        ready.give_to(owner, place)
+
+    outcome = zorctl(ready, "run", "--", "i", "SHOP", "-s", SPB, environment={"TMPDIR": place})
+
+    assert outcome.status == 0
+    assert f"SPB file: {used}/zorctl-" in outcome.stdout
+
+
+def test_without_a_safe_place_nothing_is_run_or_deleted(ready):
+    ready.remove("/var/tmp")
+    ready.give_to(GUEST, "/tmp")
+    ready.plant("/signers", "mine\n")
+
+    outcome = zorctl(ready, "run", "--", "i", "SHOP", "-s", SPB)
+
+    assert (outcome.status, outcome.stdout) == (2, "")
+    assert outcome.stderr == "zorctl: cannot create a directory for the package\n"
+    assert ready.exists("/signers") and not ready.exists(HOME)
+
+
+# doctor
+
+
+def interrupt_upgrade(machine):
+    """Leaves what a kill in the middle of an extraction leaves."""
+    machine.plant(HOME + "/bin/trawlhw.bak", machine.read_bytes(HOME + "/bin/trawlhw"), 0o755)
+    machine.plant(HOME + "/bin/trawlhw", b"half of", 0o600)
+    machine.plant(HOME + "/ZOR_files", "# File created by ZOR: 22/12/02zor_9.2.30.0000\n")
+
+
+def doctored(machine):
+    """Codes of the advice, and the restored paths, of a repair."""
+    found = report(machine, "doctor", "--apply", status=1)
+    return (
+        {one["code"] for one in found["advice"]},
+        [one["path"] for one in found["actions"] if one["action"] == "restore"],
+    )
+
+
+def test_doctor_restores_no_backup_of_another_user(installed):
+    interrupt_upgrade(installed)
+    installed.give_to(GUEST, HOME + "/bin/trawlhw.bak")
+
+    assert doctored(installed) == ({"untrusted-backup", "reinstall"}, [])
+    assert installed.read(HOME + "/bin/trawlhw") == "half of"
+
+
+@pytest.mark.parametrize("place", [HOME + "/bin", HOME, "/opt/corvan"])
+def test_doctor_restores_nothing_in_a_directory_of_another_user(installed, place):
+    interrupt_upgrade(installed)
+    installed.give_to(GUEST, place)
+
+    assert doctored(installed) == ({"untrusted-backup", "reinstall"}, [])
+    assert installed.read(HOME + "/bin/trawlhw") == "half of"
+
+
+def test_doctor_does_not_look_for_backups_through_a_link_of_another_user(installed):
+    interrupt_upgrade(installed)
+    os.rename(installed.at(HOME + "/bin"), installed.at("/opt/bin"))
+    installed.link(HOME + "/bin", "/opt/bin")
+    installed.give_to(GUEST, HOME + "/bin")
+
+    advice, restored = doctored(installed)
+
+    assert restored == []
+    assert installed.read("/opt/bin/trawlhw") == "half of"
+    assert "reinstall" in advice

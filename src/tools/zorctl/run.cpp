@@ -15,6 +15,7 @@
 #include "ssh_signature.h"
 #include "time_stamps.h"
 #include "tool_output.h"
+#include "trusted_path.h"
 
 #include <cerrno>
 #include <csignal>
@@ -36,29 +37,31 @@ constexpr off_t SmallFileLimit = off_t{1} << 20; // a signature, a list of signe
 constexpr off_t PackageLimit = off_t{1} << 31;   // what the installer can read ends there
 constexpr int PackageFails = 2;                  // spb check: the package cannot be installed
 
-/// A directory of our own that goes with everything in it when this ends.
+/// A directory of our own, where nobody else can exchange it, that goes with everything in it when
+/// this ends. Its path is empty if it could not be made.
 class PrivateDirectory {
 public:
     PrivateDirectory()
     {
         const char* const wanted = std::getenv("TMPDIR");
-        std::string name =
-            joinPath(wanted != nullptr && *wanted == '/' ? wanted : "/var/tmp", "zorctl-XXXXXX");
-        if (mkdtemp(name.data()) == nullptr && errno != 0) {
-            name = "/tmp/zorctl-XXXXXX";
-            if (mkdtemp(name.data()) == nullptr)
-                return;
+        for (const char* const place : {wanted != nullptr ? wanted : "", "/var/tmp", "/tmp"}) {
+            const std::string directory = *place == '/' ? safeDirectory(place) : std::string();
+            std::string name = joinPath(directory, "zorctl-XXXXXX");
+            if (directory.empty() || mkdtemp(name.data()) == nullptr)
+                continue;
+            path_ = name;
+            return;
         }
-        path_ = name;
     }
     PrivateDirectory(const PrivateDirectory&) = delete;
     PrivateDirectory& operator=(const PrivateDirectory&) = delete;
     ~PrivateDirectory()
     {
+        if (path_.empty())
+            return;
         for (const char* const name : {"package.spb", "signature", "signers"})
             (void)unlink(joinPath(path_, name).c_str());
-        if (!path_.empty())
-            (void)rmdir(path_.c_str());
+        (void)rmdir(path_.c_str());
     }
 
     [[nodiscard]] const std::string& path() const { return path_; }

@@ -1,4 +1,4 @@
-// Which backups root may put back in the place of others.
+// Files and directories that no other user can exchange.
 #pragma once
 
 #include <string>
@@ -7,6 +7,11 @@
 /// directory that, like everything above it, nobody else can write to. Then nobody else can
 /// exchange it meanwhile.
 [[nodiscard]] bool isTrustedFile(const std::string& path);
+
+/// The directory `path` without links, if nobody else can exchange what this process creates in it:
+/// it and every directory above it belong to root or the running user, and others may write to none
+/// of them unless it is sticky. Empty otherwise.
+[[nodiscard]] std::string safeDirectory(const std::string& path);
 
 /// Renames `backup` to the name without BackupSuffix if isTrustedFile(): checked and renamed in the
 /// same open directory, so that a link on the path that is exchanged meanwhile leads nowhere else.
