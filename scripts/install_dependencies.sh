@@ -1,9 +1,10 @@
 #!/bin/sh
-# Installs the Debian packages that are missing: scripts/install_dependencies.sh demo|test
+# Installs the Debian packages that are missing: scripts/install_dependencies.sh demo|fleet|test
 #
-# "demo" is what a release build and the demo need, "test" what everything else needs as well. Does
-# nothing if all of them are installed; an ordinary user is asked for sudo's password. No name holds
-# a version: where Debian's differ, a package that depends on the current one is named.
+# "demo" is what a release build and the demo need, "fleet" what the demo of a fleet needs as well,
+# "test" what everything needs. Does nothing if all of them are installed; an ordinary user is asked
+# for sudo's password. No name holds a version: where Debian's differ, a package that depends on the
+# current one is named.
 set -eu
 
 demo='
@@ -15,7 +16,16 @@ demo='
     python3
     zlib1g-dev
 '
+fleet='
+    ansible-core
+    libcli11-dev
+    nettle-dev
+    nlohmann-json3-dev
+    openssh-client
+    openssh-server
+'
 test='
+    ansible-lint
     bash-completion
     black
     clang
@@ -34,14 +44,12 @@ test='
     lib32z1-dev
     libc6-dbg
     libclang-rt-dev
-    libcli11-dev
     libdeflate-dev:i386
     lintian
     man-db
-    nettle-dev
     nettle-dev:i386
-    nlohmann-json3-dev
     perl
+    pycodestyle
     pylint
     python3-jsonschema
     python3-pytest
@@ -53,12 +61,14 @@ test='
     time
     valgrind
     xfsprogs
+    yamllint
 '
 
 case ${1-} in
 demo) packages=$demo ;;
-test) packages="$demo $test" ;;
-*) echo "Usage: $0 demo|test" >&2; exit 2 ;;
+fleet) packages="$demo $fleet" ;;
+test) packages="$demo $fleet $test" ;;
+*) echo "Usage: $0 demo|fleet|test" >&2; exit 2 ;;
 esac
 
 native=$(dpkg --print-architecture)
@@ -78,6 +88,10 @@ echo "Installing:$missing"
 
 as_root=
 [ "$(id -u)" -eq 0 ] || as_root=sudo
+case $missing in
+*openssh-server*) # its program is needed: the service is not to listen on this machine
+    [ ! -d /run/systemd/system ] || $as_root systemctl --quiet mask ssh.service ssh.socket ;;
+esac
 case $missing in
 *:i386*) $as_root dpkg --add-architecture i386 ;;
 esac
