@@ -21,7 +21,7 @@ def words(folder):
     return set(re.findall(r"[\w.]+", text))
 
 
-@pytest.mark.parametrize("folder", ["checks", "system"])
+@pytest.mark.parametrize("folder", ["checks", "system", "../fleet/tests"])
 def test_every_python_test_is_registered(folder):
     names = {path.stem.removeprefix("test_") for path in (TESTS / folder).glob("test_*.py")}
     assert names and names - words(folder) == set()
