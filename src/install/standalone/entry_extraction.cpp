@@ -14,8 +14,6 @@
 
 namespace {
 
-constexpr mode_t NewFileMode = 0666;    // of a file for which no mode is given
-constexpr mode_t UnfinishedMode = 0600; // nobody else can open the file while it is being written
 constexpr int ExtractBlockSize = 8192;
 
 /// Opens `destination` for a file of `package`, its old content backed up. Returns 0, or the code

@@ -20,7 +20,6 @@
 namespace {
 
 constexpr mode_t PublicMode = 0755;
-constexpr mode_t InstallDirMode = 0750; // the one package directory that not everybody reads
 
 void trace(bool debug, const char* what, const std::string& value)
 {

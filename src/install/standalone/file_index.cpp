@@ -17,7 +17,6 @@
 namespace {
 
 constexpr mode_t IndexFileMode = 0644;
-constexpr mode_t NewFileMode = 0666;
 
 } // namespace
 

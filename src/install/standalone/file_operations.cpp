@@ -14,8 +14,6 @@
 
 namespace {
 
-constexpr mode_t NewFileMode = 0666;
-constexpr mode_t UnfinishedMode = 0600; // nobody else can open the file while it is being written
 constexpr mode_t NewDirectoryMode = 0777;
 constexpr int CopyBlockSize = 4096;
 

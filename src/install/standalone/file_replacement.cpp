@@ -20,7 +20,6 @@ const std::string TemporarySuffix = ".wzorinst-new";
 
 namespace {
 
-constexpr mode_t PrivateMode = 0600; // nobody else can open the file while it is being written
 constexpr int MaxTries = 1000;
 constexpr useconds_t PauseMicroseconds = 10000;
 constexpr const char* AccessList = "system.posix_acl_access";
@@ -114,7 +113,7 @@ int createTemporary(const Place& place, ScopedFd& file)
     const std::string name = temporaryName(place);
     for (int tries = 0; tries < MaxTries; ++tries) {
         file = ScopedFd(openat(place.fd(), name.c_str(),
-                               O_RDWR | O_CREAT | O_EXCL | O_NOFOLLOW | O_CLOEXEC, PrivateMode));
+                               O_RDWR | O_CREAT | O_EXCL | O_NOFOLLOW | O_CLOEXEC, UnfinishedMode));
         if (file.isOpen() && flock(file.get(), LOCK_EX | LOCK_NB) == 0 && isTemporary(place, file))
             return 0;
         if (!file.isOpen() && errno != EEXIST)

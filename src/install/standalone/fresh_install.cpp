@@ -23,9 +23,7 @@
 namespace {
 
 constexpr mode_t UserCacheDirMode = 0770;
-constexpr mode_t InstallDirMode = 0750;
 constexpr mode_t RegistryDirMode = 0755;
-constexpr mode_t NewFileMode = 0666;
 
 int makeSubdirOrReport(FileTransaction& transaction, const std::string& parent,
                        const std::string& name, mode_t mode)

@@ -16,23 +16,23 @@ namespace {
 const std::string AllScopes = "all";
 
 /// One row of the permission table.
-struct Row {
+struct PermissionRow {
     std::string base;
     std::string path; ///< relative to `base`; empty for `base` itself
     mode_t mode;
     std::string scope; ///< AllScopes, or the install type that the row is for
 };
 
-std::vector<Row> rowsOf(const Discovery& found)
+std::vector<PermissionRow> rowsOf(const Discovery& found)
 {
     const std::string& home = found.currentZorHome;
     const std::string& cfg = found.currentCfgHome;
     const std::string reg = registryDirectory(localInstall);
 
-    std::vector<Row> table;
+    std::vector<PermissionRow> table;
     if (!found.homeExists || (applySingleUserMode && !localInstall))
         table.push_back({home, "", 0755, AllScopes});
-    const Row fixed[] = {
+    const PermissionRow fixed[] = {
         {cfg, cacheDir, CacheDirRootMode, valueInstallGlobal},
         {cfg, cacheDir, 0770, valueInstallLocal},
         {cfg, spbCfgDir, 0755, AllScopes},
@@ -73,7 +73,7 @@ void apply(const Permission& permission)
 std::vector<Permission> permissionTable(const Discovery& found)
 {
     std::vector<Permission> table;
-    for (const Row& row : rowsOf(found)) {
+    for (const PermissionRow& row : rowsOf(found)) {
         if (row.scope == installTypeName(localInstall) || row.scope == AllScopes)
             table.push_back({joinPath(row.base, row.path), row.mode});
     }

@@ -16,8 +16,6 @@
 
 namespace {
 
-constexpr mode_t NewFileMode = 0666;
-
 void logFailure(const char* doing, const std::string& path, int error)
 {
     *logstream << doing << path << " error: " << error << " (" << std::strerror(error) << ")\n";

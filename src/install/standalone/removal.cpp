@@ -22,13 +22,13 @@
 namespace {
 
 /// One row of the table of directories, deepest first.
-struct Row {
+struct DirectoryRow {
     std::string path;
     std::optional<RemovalKind> afterIndex; ///< once the files of an index are deleted; may be left
     RemovalKind withoutIndex;
 };
 
-std::vector<Row> directoryTable()
+std::vector<DirectoryRow> directoryTable()
 {
     const std::string client = joinPath(auxDirInstall, "QMX_CLI"); // the command line client
     const std::string platform = joinPath(client, interp);
@@ -117,7 +117,7 @@ int removeToolkit(const InstallRegistry& registry, const std::string* indexPath)
 std::vector<RemovalStep> removalSteps(bool listed)
 {
     std::vector<RemovalStep> steps;
-    for (const Row& row : directoryTable()) {
+    for (const DirectoryRow& row : directoryTable()) {
         const std::optional<RemovalKind> kind = listed ? row.afterIndex : row.withoutIndex;
         if (kind)
             steps.push_back({*kind, row.path});

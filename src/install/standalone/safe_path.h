@@ -110,6 +110,9 @@ public:
 /// openPath() for reading, as a stream; null on failure, with `errno`.
 [[nodiscard]] ScopedFile openForReading(const std::string& path);
 
+inline constexpr mode_t NewFileMode = 0666;    ///< of a file for which no mode is given
+inline constexpr mode_t UnfinishedMode = 0600; ///< until it is written: nobody else can open it
+
 /// What openForWriting() does with what exists.
 enum class Existing {
     Refuse,   ///< only a new file, also in place of a dangling link of ours

@@ -39,6 +39,7 @@ extern mode_t CommonLogDirMode;
 extern mode_t CacheDirRootMode;
 extern mode_t EtcDirMode;
 inline constexpr mode_t CorvanCommonDirMode = 0777;
+inline constexpr mode_t InstallDirMode = 0750; ///< the one package directory that not all read
 
 /// Turns single-user mode on for the rest of the run: restricts the modes above and sets
 /// applySingleUserMode.

@@ -9,12 +9,6 @@
 
 #include <ostream>
 
-namespace {
-
-constexpr mode_t NewFileMode = 0666;
-
-} // namespace
-
 std::string singleUserFlagPath(const std::string& home)
 {
     return joinPath(home, singleUserFlag);

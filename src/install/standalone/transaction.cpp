@@ -187,7 +187,7 @@ int rollback(FileTransaction& transaction)
 
 int saveJournal(const FileTransaction& transaction, const std::string& path)
 {
-    const ScopedFile file = openStream(path, Existing::Truncate, 0666);
+    const ScopedFile file = openStream(path, Existing::Truncate, NewFileMode);
     if (!file)
         return CannotOpenForWriting;
     for (const JournalEntry& entry : transaction.journal)

@@ -23,7 +23,6 @@
 namespace {
 
 constexpr std::uint64_t ChunkSize = std::uint64_t{2} << 20;
-constexpr std::uint32_t MadeByUnix = 3;
 constexpr std::uint32_t VersionNeeded = 20;
 constexpr std::uint32_t Utf8Names = 0x800;
 

@@ -1,5 +1,6 @@
 #include "exit_status.h"
 #include "landed_files.h"
+#include "package_layout.h"
 #include "shown_text.h"
 #include "subcommands.h"
 #include "tool_output.h"
@@ -18,14 +19,6 @@ struct Difference {
     std::string from;
     std::string to;
 };
-
-std::string octal(std::uint32_t mode)
-{
-    std::string text;
-    for (int shift = 9; shift >= 0; shift -= 3)
-        text += static_cast<char>('0' + (mode >> shift & 7));
-    return text;
-}
 
 void compareKeys(const std::string& place, const LandedFile& from, const LandedFile& to,
                  std::vector<Difference>& differences)

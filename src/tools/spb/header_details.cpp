@@ -18,7 +18,6 @@ constexpr std::int64_t LocalSize = 30;
 constexpr std::int64_t Zip64LocatorSize = 20;
 constexpr std::int64_t LongestComment = 65535;
 constexpr std::uint32_t SizesFollow = 8;
-constexpr std::uint32_t MadeByUnix = 3;
 
 constexpr std::size_t MostScanned = 1000000; // entries without a central directory to count them
 

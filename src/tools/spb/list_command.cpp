@@ -13,14 +13,6 @@ namespace {
 
 constexpr const char* PassedOver = "(passed over)";
 
-std::string octal(mode_t mode)
-{
-    std::string text;
-    for (int shift = 9; shift >= 0; shift -= 3)
-        text += static_cast<char>('0' + (mode >> shift & 7));
-    return text;
-}
-
 /// The number of characters of a valid UTF-8 text.
 std::size_t lengthOf(const std::string& text)
 {

@@ -11,7 +11,6 @@
 namespace {
 
 constexpr mode_t PublicMode = 0755;
-constexpr mode_t InstallDirMode = 0750;
 
 /// Stands for the installation in the installer's table of permissions.
 constexpr const char* Home = "/home of the installation";
@@ -76,6 +75,14 @@ mode_t installedMode(std::string_view place)
     static const auto modes = finalModes();
     const auto found = modes.find(place.ends_with('/') ? place.substr(0, place.size() - 1) : place);
     return found == modes.end() ? extractionMode(place) : found->second;
+}
+
+std::string octal(mode_t mode)
+{
+    std::string text;
+    for (int shift = 9; shift >= 0; shift -= 3)
+        text += static_cast<char>('0' + (mode >> shift & 7));
+    return text;
 }
 
 bool removalDeletes(std::string_view place)

@@ -17,6 +17,7 @@ inline constexpr std::size_t MostEntries = 65535; ///< the end record counts in 
 
 inline constexpr std::uint32_t Stored = 0;
 inline constexpr std::uint32_t Deflated = 8;
+inline constexpr std::uint32_t MadeByUnix = 3; ///< the system that made an entry
 
 inline constexpr std::string_view MainProperties = "config/Zor.properties";
 inline constexpr std::string_view TraceProperties = "config/ZorTrace.properties";
@@ -38,6 +39,9 @@ inline constexpr std::string_view XssDir = "config/xss/";
 
 /// The mode that `place` has once a shared installation is complete.
 [[nodiscard]] mode_t installedMode(std::string_view place);
+
+/// The permission bits of `mode` as four octal digits.
+[[nodiscard]] std::string octal(mode_t mode);
 
 /// True when the last removal deletes the directory `place`, once its listed files are gone.
 [[nodiscard]] bool removalDeletes(std::string_view place);

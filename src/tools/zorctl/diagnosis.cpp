@@ -21,8 +21,6 @@
 
 namespace {
 
-constexpr std::size_t RegistryLimit = std::size_t{1} << 20;
-
 /// What the first line of an index says, or an empty record.
 InstallRegistry stampOfHeader(const std::string& line)
 {

@@ -24,7 +24,6 @@
 
 namespace {
 
-constexpr std::size_t RegistryLimit = std::size_t{1} << 20;
 constexpr std::size_t PropertyLimit = std::size_t{1} << 20;
 
 bool hasContent(const std::string& text)

@@ -14,6 +14,9 @@
 
 #include <sys/types.h>
 
+/// A longer registry is not read.
+inline constexpr std::size_t RegistryLimit = std::size_t{1} << 20;
+
 /// How an installation is.
 enum class Health {
     Intact,
