@@ -17,8 +17,9 @@ target_compile_definitions(wzor_options INTERFACE _FORTIFY_SOURCE=3)
 
 # The debug symbols name this directory instead of the path of the source tree.
 set(source_name /usr/src/wzorinst-${PROJECT_VERSION})
+add_compile_options(-g)
 target_compile_options(
-  wzor_options INTERFACE -g -ffile-prefix-map=${CMAKE_SOURCE_DIR}=${source_name}
+  wzor_options INTERFACE -ffile-prefix-map=${CMAKE_SOURCE_DIR}=${source_name}
                          -ffile-prefix-map=${CMAKE_BINARY_DIR}=${source_name}/build)
 
 # Several sources of a target are compiled as one, which takes less than half the time: the headers
