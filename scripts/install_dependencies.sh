@@ -1,10 +1,12 @@
 #!/bin/sh
-# Installs the Debian packages that are missing: scripts/install_dependencies.sh demo|fleet|test
+# Installs the Debian packages that are missing:
+#     scripts/install_dependencies.sh demo|fleet|test|bench|all
 #
 # "demo" is what a release build and the demo need, "fleet" what the demo of a fleet needs as well,
-# "test" what everything needs. Does nothing if all of them are installed; an ordinary user is asked
-# for sudo's password. No name holds a version: where Debian's differ, a package that depends on the
-# current one is named.
+# "test" what all tests need, "bench" what the benchmarks need, and "all" what these and all other
+# scripts need. Does nothing if all of them are installed; an ordinary user is asked for sudo's
+# password. No name holds a version: where Debian's differ, a package that depends on the current one
+# is named.
 set -eu
 
 demo='
@@ -63,12 +65,33 @@ test='
     xfsprogs
     yamllint
 '
+bench='
+    7zip
+    g++-multilib
+    lib32z1-dev
+    libarchive-tools
+    libdeflate-dev:i386
+    python3-matplotlib
+    rpm
+    scdoc
+    strace
+    unzip
+'
+# File systems to test on, other releases of Debian to build on, changes to plant faults in, and a JSON schema.
+more='
+    btrfs-progs
+    debootstrap
+    git
+    npm
+'
 
 case ${1-} in
 demo) packages=$demo ;;
 fleet) packages="$demo $fleet" ;;
 test) packages="$demo $fleet $test" ;;
-*) echo "Usage: $0 demo|fleet|test" >&2; exit 2 ;;
+bench) packages="$demo $bench" ;;
+all) packages="$demo $fleet $test $bench $more" ;;
+*) echo "Usage: $0 demo|fleet|test|bench|all" >&2; exit 2 ;;
 esac
 
 native=$(dpkg --print-architecture)
