@@ -51,10 +51,10 @@ Json toJson(const Forecast& forecast, bool locked)
     report["exploiter"] = jsonText(forecast.exploiter);
     report["home"] = jsonText(forecast.home);
     report["operation"] = forecast.operation;
-    report["private"] = forecast.privateOperation.empty()
-                            ? Json(nullptr)
-                            : Json{{"operation", forecast.privateOperation},
-                                   {"home", jsonText(forecast.privateHome)}};
+    report["private"] = nullptr;
+    if (!forecast.privateOperation.empty())
+        report["private"] = {{"operation", forecast.privateOperation},
+                             {"home", jsonText(forecast.privateHome)}};
     report["succeeds"] = forecast.failure.empty();
     report["failure"] = textOrNull(forecast.failure);
     report["unchanged"] = forecast.unchanged;
