@@ -39,8 +39,9 @@ pivot_root . mnt
 cd /
 umount -l mnt
 
-# sshd may be ended and started again while the host goes on; who lost their parent are children of
-# this shell, which collects them.
+# sshd may be ended and started again while the host goes on. Processes that lose their parent become
+# children of this shell, which collects them.
+exec >/var/log/host.log 2>&1
 /usr/sbin/sshd -D -E /var/log/sshd.log &
 while :; do
     sleep 3600 &

@@ -42,7 +42,7 @@ class Media:
         control = (directory / "toolkit/bin/trawlcfg").read_text()
         changed = control.replace('\nreceive "$@"\n', '\nreceive "$@"\n' + INTERRUPTION)
         assert changed != control
-        self.v2 = make_package(directory, "v2", {"bin/trawlcfg": changed})
+        self.v2 = make_package(directory, "v2", {"bin/trawlcfg": changed.encode()})
         self.broken = directory / "broken.spb"
         self.broken.write_bytes(self.v2.read_bytes()[:200])
         self.programs = make_programs(directory / "programs")

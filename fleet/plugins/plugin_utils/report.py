@@ -89,7 +89,9 @@ def page(report):
     states = collections.Counter(host["state"] for host in hosts.values())
     total = len(hosts)
     counts = ", ".join(f"{states[state]} {state}" for state in (HEALTHY, FAILED, WAITING))
-    end = f"Stopped: {report['reason']}." if report["stopped"] else "Not stopped."
+    end = "Complete." if states[HEALTHY] == total else "Not complete."
+    if report["stopped"]:
+        end = f"Stopped: {report['reason']}."
     shares = "".join(
         f'<div class="{state}" style="width: {100 * states[state] / total:.1f}%"></div>'
         for state in (HEALTHY, FAILED)
@@ -129,7 +131,7 @@ def row(name, host):
     if host["state"] == WAITING:
         done = "nothing yet"
     elif host["operation"] in (None, "none"):
-        done = host["reason"] or ""
+        done = host["reason"] or host["state"]
     else:
         done = f"{host['operation']}: {host['reason']}"
     return name, host["state"], version_of(host), done

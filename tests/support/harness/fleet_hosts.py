@@ -85,11 +85,15 @@ class Host:
         """The host's root directory, as the machine can reach it."""
         return f"/proc/{self.pid}/root"
 
-    def run(self, command, **options):
-        """Runs a command line of the shell in the host, without ssh."""
+    def line(self, command):
+        """The command line that runs the list `command` in the host, without ssh."""
         line = ["nsenter", "--target", str(self.pid), "--mount", "--pid", "--uts", "--ipc"]
-        line += ["--root", "--wd=/", "/bin/sh", "-c", command]
+        return line + ["--root", "--wdns=/", "--", *command]
+
+    def run(self, command, **options):
+        """Runs a command of the shell in the host, without ssh."""
         options = {"check": True, "capture_output": True, "text": True, **options}
+        line = self.line(["/bin/sh", "-c", command])
         return subprocess.run(line, **options)  # pylint: disable=subprocess-run-check
 
 

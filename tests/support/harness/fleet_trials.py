@@ -26,7 +26,7 @@ STAMP = re.compile(rb"(zor_.{0,12}?)9\.2\.", re.DOTALL)
 # Ansible's visit alone.
 WATCHED = ("etc", "home", "opt", "root", "tmp", ".usr", "var")
 VISITS = re.compile(
-    r"(root|home/ann|tmp|var/tmp|var/log/sshd\.log|home/ann/\.wzorinst\.lock)$"
+    r"(root|home/ann|tmp|var/tmp|var/log/(sshd|host)\.log|home/ann/\.wzorinst\.lock)$"
     r"|(root|home/ann)/\.ansible(/|$)"
 )
 
@@ -64,7 +64,7 @@ class Fleet:
         self._process.stdout.close()
         assert self._process.wait() == 0
 
-    def play(self, playbook, *arguments, **environment):
+    def play(self, playbook, *arguments, quiet=False, **environment):
         """Runs a playbook, a path or a list of plays, with further arguments."""
         if isinstance(playbook, list):
             path = self.directory / "playbook.json"
@@ -92,7 +92,8 @@ class Fleet:
             text=True,
             check=False,
         )
-        print(done.stdout)
+        if not quiet:
+            print(done.stdout)
         lines = notes.read_text().splitlines() if notes.exists() else []
         entries = [json.loads(line) for line in lines]
         results = {
@@ -128,14 +129,14 @@ def node(path):
 
 
 def make_package(directory, name, changes=None):
-    """Packs the example toolkit, with changed files {path: text}; returns the package's path."""
+    """Packs the example toolkit, with changed files {path: bytes}; returns the package's path."""
     tree = directory / "toolkit"
     if not tree.exists():
         subprocess.run([REPOSITORY / "scripts/build_toolkit.sh", tree], check=True)
     copy = directory / (name + "-tree")
     shutil.copytree(tree, copy)
-    for path, text in (changes or {}).items():
-        (copy / path).write_text(text)
+    for path, content in (changes or {}).items():
+        (copy / path).write_bytes(content)
     package = directory / (name + ".spb")
     line = [os.environ["SPB"], "pack", copy, "-o", package]
     subprocess.run(line, check=True, capture_output=True)
