@@ -92,6 +92,16 @@ def test_diff_reports_files_modes_and_keys(tmp_path):
     assert spb_tool.run("diff", one, tmp_path / "three").returncode == 2
 
 
+def test_diff_reports_the_modes_that_the_archives_record(tmp_path):
+    for name, mode in (("one", 0o100755), ("two", 0o100644)):
+        archive = Archive().add(IMAGE_ROOT + "bin/a", b"1", made_by=3 << 8, attributes=mode << 16)
+        (tmp_path / name).write_bytes(archive.content())
+
+    done = spb_tool.run("diff", tmp_path / "one", tmp_path / "two")
+
+    assert (done.returncode, done.stdout) == (1, "mode: bin/a: 0755 -> 0644\n")
+
+
 def tree_of(directory):
     """Every path below `directory`, with its permissions and, for files, the content."""
     return {

@@ -5,7 +5,7 @@ import os
 import pytest
 
 from harness.machine import SPB
-from harness.shared_machine import ANN, GUEST, KEY, SECRET, SharedMachine, why_not
+from harness.shared_machine import ANN, GUEST, SECRET, SharedMachine, why_not
 from harness.zorctl import report, zorctl
 
 pytestmark = pytest.mark.skipif(why_not() is not None, reason=str(why_not()))

@@ -374,6 +374,24 @@ def test_without_a_terminal_nothing_is_coloured(installed):
 
 
 @pytest.mark.parametrize(
+    "variables, shown",
+    [
+        ({}, "\033[32mintact\033[0m"),
+        ({"NO_COLOR": ""}, "\033[32mintact\033[0m"),
+        ({"NO_COLOR": "1"}, "intact"),
+        ({"TERM": "dumb"}, "intact"),
+    ],
+)
+def test_on_a_terminal_health_is_coloured_unless_that_is_not_wanted(installed, variables, shown):
+    terminal = ("/bin/sh", "-c", 'script -qec "$0 status --type global" /dev/null')
+
+    outcome = zorctl(installed, tool=terminal, environment={"TERM": "xterm", **variables})
+
+    assert f"Status of shared (global) installation: {shown}\r\n" in outcome.stdout
+    assert ("\033" in outcome.stdout) == ("\033" in shown)
+
+
+@pytest.mark.parametrize(
     "arguments",
     [
         (),

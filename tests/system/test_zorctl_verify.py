@@ -1,5 +1,6 @@
 """zorctl verify: what of an installation is not as its package made it."""
 
+import fcntl
 import os
 
 import pytest
@@ -189,6 +190,33 @@ def test_control_characters_are_escaped(installed):
     installed.plant(HOME + "/bin/a\n\x1b[31m", b"mine")
 
     check(installed, "foreign     /opt/corvan/zor/bin/a\\n\\x1b[31m\n", status=0)
+
+
+def test_without_a_lock_there_is_a_warning(installed):
+    installed.remove("/run")
+
+    printed(
+        zorctl(installed, "verify", SPB),
+        "",
+        status=0,
+        stderr="zorctl: warning: cannot lock /run/wzorinst.lock; "
+        "this may change while it is reported\n",
+    )
+
+
+def test_while_another_run_holds_the_lock_there_is_a_warning(installed):
+    installed.plant("/run/wzorinst.lock")
+    with open(installed.at("/run/wzorinst.lock"), "rb") as lock:
+        fcntl.flock(lock, fcntl.LOCK_EX)
+        outcome = zorctl(installed, "verify", SPB)
+
+    printed(
+        outcome,
+        "",
+        status=0,
+        stderr="zorctl: warning: another run holds /run/wzorinst.lock; "
+        "this may change while it is reported\n",
+    )
 
 
 def test_nothing_installed_ends_with_3(machine):

@@ -87,9 +87,9 @@ Json::~Json() = default;
 
 Json Json::array()
 {
-    Json list;
-    list.value_ = std::vector<Json>();
-    return list;
+    Json empty;
+    empty.value_ = std::vector<Json>();
+    return empty;
 }
 
 bool Json::parse(const std::string& text, Json& value)
@@ -105,12 +105,12 @@ Json& Json::operator[](std::string_view name)
 {
     if (isNull())
         value_ = std::vector<Member>();
-    auto& members = std::get<std::vector<Member>>(value_);
-    const auto found = std::find_if(members.begin(), members.end(),
+    auto& all = std::get<std::vector<Member>>(value_);
+    const auto found = std::find_if(all.begin(), all.end(),
                                     [&](const Member& member) { return member.name == name; });
-    if (found != members.end())
+    if (found != all.end())
         return found->value;
-    return members.emplace_back(Member{std::string(name), nullptr}).value;
+    return all.emplace_back(Member{std::string(name), nullptr}).value;
 }
 
 const Json& Json::operator[](std::string_view name) const

@@ -15,6 +15,7 @@
 #include <mutex>
 #include <numeric>
 #include <thread>
+#include <utility>
 
 #include <fcntl.h>
 #include <sys/stat.h>
@@ -221,9 +222,9 @@ public:
     }
 
 private:
-    bool fail(int error, const std::string& path, const std::string& reason)
+    bool fail(int error, std::string path, std::string reason)
     {
-        failure_ = {error, path, reason};
+        failure_ = {error, std::move(path), std::move(reason)};
         return false;
     }
 

@@ -86,11 +86,11 @@ std::string_view ExtractionModel::backUp(Node* parent, const std::string& name)
     if (found == parent->children.end() || (!found->second->isFile && !found->second->isDirectory))
         return {};
     Node* const place = found->second.get();
-    const std::string backupName = ::backupName(name);
-    if (backupName.size() > LongestComponent)
+    const std::string nameOfBackup = backupName(name);
+    if (nameOfBackup.size() > LongestComponent)
         return "name-too-long";
 
-    Node* const backup = child(parent, backupName);
+    Node* const backup = child(parent, nameOfBackup);
     backup->isFile = false;
     if (backup->isDirectory && (place->isFile || hasEntries(*backup))) {
         place->isDirectory = false;
@@ -117,13 +117,13 @@ void ExtractionModel::moveInto(Node& from, Node& to)
     to.isFile = to.isFile || from.isFile;
     to.isDirectory = to.isDirectory || from.isDirectory;
     from.isFile = from.isDirectory = false;
-    for (auto& [name, child] : from.children) {
+    for (auto& [name, node] : from.children) {
         auto& place = to.children[name];
         if (place) {
-            moveInto(*child, *place);
+            moveInto(*node, *place);
         } else {
-            child->parent = &to;
-            place = std::move(child);
+            node->parent = &to;
+            place = std::move(node);
         }
     }
     from.children.clear();

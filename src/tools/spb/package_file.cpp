@@ -44,14 +44,14 @@ std::unique_ptr<PackageFile> PackageFile::open(const std::string& path, Findings
         error = S_ISDIR(status.st_mode) ? EISDIR : EINVAL;
         return nullptr;
     }
-    std::vector<HeaderDetails> details;
-    error = readHeaderDetails(file.get(), findings, details);
+    std::vector<HeaderDetails> headers;
+    error = readHeaderDetails(file.get(), findings, headers);
     if (error != 0)
         return nullptr;
     auto archive = std::make_unique<ZipFile>(pathOf(file.get(), path).c_str());
     // NOLINTNEXTLINE(cppcoreguidelines-owning-memory): the constructor is private
     return std::unique_ptr<PackageFile>(
-        new PackageFile(std::move(file), std::move(details), std::move(archive)));
+        new PackageFile(std::move(file), std::move(headers), std::move(archive)));
 }
 
 EntryContent PackageFile::readEntry(const ZipEntry& entry, const ContentSink& sink) const

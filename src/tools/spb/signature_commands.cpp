@@ -42,7 +42,7 @@ int signCommand(const SignOptions& options)
     return error == 0 ? static_cast<int>(ToolOk) : trouble(output, error);
 }
 
-int verifyCommand(const VerifyOptions& options)
+int verifyCommand(const SignatureOptions& options)
 {
     const ScopedFd file(open(options.file.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK));
     if (!file.isOpen())

@@ -20,7 +20,7 @@ struct Options {
     ExtractOptions extract;
     FileOptions sbom;
     SignOptions sign;
-    VerifyOptions verify;
+    SignatureOptions verify;
 };
 
 void addFile(CLI::App* command, std::string& file)
@@ -143,7 +143,7 @@ ToolCommand addSign(CLI::App& app, SignOptions& options)
     return {command, [&] { return signCommand(options); }, ToolTrouble};
 }
 
-ToolCommand addVerify(CLI::App& app, VerifyOptions& options)
+ToolCommand addVerify(CLI::App& app, SignatureOptions& options)
 {
     CLI::App* const command =
         addCommand(app, "verify", "verify the signature of an SPB",

@@ -40,7 +40,7 @@ struct SignOptions {
     std::string output; ///< empty: FILE.sig
 };
 
-struct VerifyOptions {
+struct SignatureOptions {
     std::string file;
     std::string signers;
     std::string signature; ///< empty: FILE.sig
@@ -55,4 +55,4 @@ int diffCommand(const DiffOptions& options);
 int extractCommand(const ExtractOptions& options);
 int sbomCommand(const FileOptions& options);
 int signCommand(const SignOptions& options);
-int verifyCommand(const VerifyOptions& options);
+int verifyCommand(const SignatureOptions& options);

@@ -25,14 +25,14 @@ namespace {
 InstallRegistry stampOfHeader(const std::string& line)
 {
     const std::string start = "# File created by ZOR: ";
-    InstallRegistry record;
+    InstallRegistry stamped;
     if (!line.starts_with(start))
-        return record;
+        return stamped;
     const std::string stamp =
         line.substr(start.size(), line.find(' ', start.size()) - start.size());
-    record.version = stampVersion(stamp);
-    record.buildDate = stampBuildDate(stamp);
-    return record;
+    stamped.version = stampVersion(stamp);
+    stamped.buildDate = stampBuildDate(stamp);
+    return stamped;
 }
 
 /// The name that `backup` is a backup of.

@@ -35,11 +35,23 @@ def schema(name):
         return json.load(file)
 
 
+def closed(value):
+    """The schema `value`, by which an object has no other members than those that it names."""
+    if isinstance(value, list):
+        return [closed(one) for one in value]
+    if not isinstance(value, dict):
+        return value
+    copy = {name: closed(one) for name, one in value.items()}
+    if isinstance(copy.get("properties"), dict):
+        copy.setdefault("additionalProperties", False)
+    return copy
+
+
 def report(machine, command, *arguments, status=0, **options):
     """What `command` prints as JSON, checked against its schema, as an object."""
     outcome = zorctl(machine, command, "--json", *arguments, **options)
     assert outcome.status == status, (outcome.status, outcome.stdout, outcome.stderr)
     assert outcome.stderr == ""
     found = json.loads(outcome.stdout)
-    jsonschema.Draft7Validator(schema(command)).validate(found)
+    jsonschema.Draft7Validator(closed(schema(command))).validate(found)
     return found
