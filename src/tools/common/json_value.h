@@ -23,6 +23,7 @@ class Json {
 public:
     struct Member;
 
+    // NOLINTBEGIN(google-explicit-constructor): a value is made of what it holds, as in JSON
     Json(std::nullptr_t = nullptr);
     Json(bool value);
     Json(const char* text);
@@ -34,6 +35,7 @@ public:
     Json(Number number) : Json(widened(number))
     {
     }
+    // NOLINTEND(google-explicit-constructor)
     Json(const Json& other);
     Json(Json&& other) noexcept;
     Json& operator=(const Json& other);
@@ -52,7 +54,7 @@ public:
     const Json& operator[](std::string_view name) const;
 
     /// Adds `element` to a list.
-    void push_back(Json element);
+    void push_back(Json element); // NOLINT(readability-identifier-naming): as of other lists
 
     [[nodiscard]] bool isNull() const;
     /// The value if it is of this kind, else null.

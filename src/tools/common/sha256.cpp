@@ -37,9 +37,9 @@ std::string Sha256::finish()
 
 int sha256OfFile(int fd, std::string& digest)
 {
-    constexpr std::size_t PieceSize = std::size_t{128} * 1024;
+    constexpr std::size_t pieceSize = std::size_t{128} * 1024;
     Sha256 hash;
-    std::vector<char> piece(PieceSize);
+    std::vector<char> piece(pieceSize);
     off_t at = 0;
     for (;;) {
         const ssize_t count = pread(fd, piece.data(), piece.size(), at);

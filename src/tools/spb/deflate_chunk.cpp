@@ -50,8 +50,8 @@ bool isCompleteCode(std::uint64_t bits, unsigned count)
 bool mayBeHeader(const unsigned char* stream, std::size_t at)
 {
     const std::uint64_t head = load64(stream + at / 8) >> at % 8;
-    constexpr std::uint64_t FinalWithCodes = 5;
-    if ((head & 7) != FinalWithCodes || (head >> 3 & 31) > 29 || (head >> 8 & 31) > 29)
+    constexpr std::uint64_t finalWithCodes = 5;
+    if ((head & 7) != finalWithCodes || (head >> 3 & 31) > 29 || (head >> 8 & 31) > 29)
         return false;
     const auto count = static_cast<unsigned>((head >> 13 & 15) + 4);
     const std::size_t lengths = at + 17;
@@ -98,8 +98,8 @@ struct ChunkDeflater::State {
             (void)inflateSetDictionary(&walker, dictionary, static_cast<uInt>(dictionarySize));
         }
 
-        constexpr int AtBlockEnd = 128;
-        constexpr int InLastBlock = 64;
+        constexpr int atBlockEnd = 128;
+        constexpr int inLastBlock = 64;
         for (;;) {
             if (walker.total_out == output.size())
                 return std::nullopt;
@@ -109,8 +109,8 @@ struct ChunkDeflater::State {
                 return std::nullopt;
             const std::size_t at = 8 * (stream.size() - walker.avail_in) -
                                    static_cast<std::size_t>(walker.data_type & 7);
-            const bool ended = (walker.data_type & AtBlockEnd) != 0;
-            if (ended && (walker.data_type & InLastBlock) != 0)
+            const bool ended = (walker.data_type & atBlockEnd) != 0;
+            if (ended && (walker.data_type & inLastBlock) != 0)
                 return (at + 7) / 8 == stream.size() ? std::optional(LastBlock{begin, at})
                                                      : std::nullopt;
             if (ended)
@@ -125,8 +125,8 @@ struct ChunkDeflater::State {
     std::optional<LastBlock> lastBlockAt(std::size_t at, const std::vector<unsigned char>& stream,
                                          const unsigned char* data, std::size_t size)
     {
-        static constexpr unsigned char Anything[WindowSize] = {};
-        auto found = walk(stream, at, Anything, WindowSize);
+        static constexpr unsigned char anything[WindowSize] = {};
+        auto found = walk(stream, at, anything, WindowSize);
         const std::size_t held = walker.total_out;
         if (!found || found->begin != at || held > size)
             return std::nullopt;

@@ -22,8 +22,8 @@ std::size_t lengthOf(const std::string& text)
 
 void printText(const PackageFile& package)
 {
-    constexpr const char* Heading = "lands at";
-    std::size_t width = std::string_view(Heading).size();
+    constexpr const char* heading = "lands at";
+    std::size_t width = std::string_view(heading).size();
     std::vector<std::string> places;
     for (const ZipEntry& entry : package.entries()) {
         const auto place = landingOf(entry.name);
@@ -31,7 +31,7 @@ void printText(const PackageFile& package)
         width = std::max(width, lengthOf(places.back()));
     }
 
-    std::cout << "mode        size  " << Heading << std::string(width - 8, ' ') << "  entry\n";
+    std::cout << "mode        size  " << heading << std::string(width - 8, ' ') << "  entry\n";
     for (std::size_t i = 0; i < places.size() && std::cout; ++i) {
         const ZipEntry& entry = package.entries()[i];
         const auto place = landingOf(entry.name);

@@ -26,7 +26,7 @@ namespace {
 /// when it is no number.
 bool takeStamp(ArchiveOptions& options)
 {
-    constexpr std::time_t First = 315532800; // 1980-01-01 00:00:00
+    constexpr std::time_t first = 315532800; // 1980-01-01 00:00:00
     const char* const text = std::getenv("SOURCE_DATE_EPOCH");
     if (text == nullptr)
         return true;
@@ -36,10 +36,10 @@ bool takeStamp(ArchiveOptions& options)
         return false;
     }
     std::int64_t seconds = 0;
-    constexpr std::int64_t Last = 4354819198; // 2107-12-31 23:59:58
+    constexpr std::int64_t last = 4354819198; // 2107-12-31 23:59:58
     if (std::from_chars(digits.data(), digits.data() + digits.size(), seconds).ec != std::errc())
-        seconds = Last;
-    const auto moment = static_cast<std::time_t>(std::clamp<std::int64_t>(seconds, First, Last));
+        seconds = last;
+    const auto moment = static_cast<std::time_t>(std::clamp<std::int64_t>(seconds, first, last));
     std::tm fields = {};
     (void)gmtime_r(&moment, &fields);
     options.time =

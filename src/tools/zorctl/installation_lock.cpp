@@ -6,11 +6,11 @@
 #include "tool_output.h"
 
 #include <cerrno>
+#include <ctime>
 
 #include <fcntl.h>
 #include <sys/file.h>
 #include <sys/stat.h>
-#include <time.h>
 #include <unistd.h>
 
 namespace {

@@ -7,13 +7,13 @@
 
 #include <cerrno>
 #include <csignal>
+#include <ctime>
 #include <string>
 
 #include <fcntl.h>
 #include <grp.h>
 #include <poll.h>
 #include <sys/wait.h>
-#include <time.h>
 #include <unistd.h>
 
 namespace {
