@@ -57,7 +57,7 @@ TEST_F(RunCommandTest, QuotesAProgramWithABlankInItsPath)
     EXPECT_EQ("Exec '\"" + program + "\" -shutdown >/dev/null 2>&1' returned 0\n", log.text());
 }
 
-TEST_F(RunCommandTest, ATabInThePathOfAProgramIsNoBlank)
+TEST_F(RunCommandTest, ATabInThePathOfAProgramIsNotABlank)
 {
     const std::string program = plantProgram("two\twords");
 
@@ -66,7 +66,7 @@ TEST_F(RunCommandTest, ATabInThePathOfAProgramIsNoBlank)
     EXPECT_EQ(0U, log.text().find("Exec '" + program + " >/dev/null 2>&1' returned "));
 }
 
-TEST_F(RunCommandTest, PassesArgumentsAsTheyStand)
+TEST_F(RunCommandTest, PassesArgumentsUnchanged)
 {
     const std::string program = plantProgram("program");
 
@@ -75,16 +75,15 @@ TEST_F(RunCommandTest, PassesArgumentsAsTheyStand)
     EXPECT_EQ("[a][b][c d][e]", readFile(dir / "arguments"));
 }
 
-TEST_F(RunCommandTest, GivesTheStatusAsTheSystemDoes)
+TEST_F(RunCommandTest, ReturnsAndLogsTheRawStatus)
 {
     plantScript(dir / "failing", "exit 3\n");
 
     EXPECT_EQ(3 << 8, runCommand(dir / "failing", "/usr/bin", ""));
-
     EXPECT_EQ("Exec '" + dir / "failing" + " >/dev/null 2>&1' returned 768\n", log.text());
 }
 
-TEST_F(RunCommandTest, AMissingProgramIsTheStatusOfTheShell)
+TEST_F(RunCommandTest, AMissingProgramReturnsTheStatusOfTheShell)
 {
     EXPECT_EQ(127 << 8, runCommand(dir / "missing", "/usr/bin", ""));
 }
@@ -126,7 +125,7 @@ TEST_F(RunCommandTest, InDebugModeTheOutputIsShownAndTheLogHasNoRedirection)
     EXPECT_EQ("Exec '" + dir / "loud" + " -x' returned 0\n", log.text());
 }
 
-TEST_F(RunCommandTest, TheOutputStandsBetweenTheLinesBeforeAndAfterIt)
+TEST_F(RunCommandTest, TheOutputAppearsBetweenTheLinesBeforeAndAfterIt)
 {
     debugMode = true;
     logstream = &std::cout;
@@ -150,7 +149,7 @@ TEST_F(LibraryPathTest, IsExactlyTheBinDirectoryWhenItWasNotSet)
     EXPECT_EQ("", log.text());
 }
 
-TEST_F(LibraryPathTest, KeepsTheOldDirectoriesBehind)
+TEST_F(LibraryPathTest, KeepsTheOldDirectoriesAfterIt)
 {
     (void)setenv("LD_LIBRARY_PATH", "/a:/b", 1);
 

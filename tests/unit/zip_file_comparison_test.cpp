@@ -462,7 +462,7 @@ TEST_F(ExtractionComparisonTest, TheFileHoldsWhatTheModelDelivers)
         const std::string file = readFile(destination);
         if (file == expected)
             continue;
-        // Whole where zlib refuses to deliver it whole: see inflateWhole().
+        // Whole where zlib refuses to deliver it whole: see wholeContent().
         ASSERT_TRUE(file == sample.content && sample.entry.crc32 == checksum(file)) << again;
         ++rescued;
     }

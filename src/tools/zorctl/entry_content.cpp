@@ -1,6 +1,6 @@
 #include "entry_content.h"
 
-#include "sound_entry.h"
+#include "whole_entry.h"
 #include "zip_file.h"
 
 #include <algorithm>

@@ -1,7 +1,7 @@
+#include "entry_extraction.h"
 #include "package_window.h"
 #include "sample_bytes.h"
 #include "scoped.h"
-#include "sound_entry.h"
 #include "test_files.h"
 #include "zip_builder.h"
 #include "zip_file.h"
@@ -263,7 +263,7 @@ TEST_F(SoundEntryTest, AnEntryOfTinyBlocksArrivesWhole)
 
 TEST_F(SoundEntryTest, AnEntryThatBeginsWithTinyBlocksIsLeftToZlib)
 {
-    // Only zlib refuses the last block, so the answer shows who was asked.
+    // Only zlib refuses the last block, so the result shows which decompressor ran.
     const std::string few = dynamicBlock(287, 1, 99);
     const std::string many = dynamicBlock(287, 1, 999);
     ASSERT_LT(few.size(), 16384U);
