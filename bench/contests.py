@@ -31,7 +31,7 @@ class Bench:
         self.plan = plan
 
     # Contestants: a name is "wzorinst", "wzorinst, no commands", "zlib floor" ... and, if the
-    # program comes in both widths, " 64" or " 32" behind it.
+    # program comes in both widths, " 64" or " 32" after it.
 
     def command(self, name, job, package):
         """What the contestant `name` runs to do `job`."""
@@ -102,7 +102,7 @@ class Bench:
         if preparation := self.preparation(name, job, package):
             run(*preparation)
         if self.plan["syncs"]:
-            os.sync()  # so that nobody writes out what others left
+            os.sync()  # so that no contestant writes out what another left
         return self.timed(self.command(name, job, package), package)
 
     def timed(self, command, package):

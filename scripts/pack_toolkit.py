@@ -1,7 +1,7 @@
 #!/usr/bin/python3
 """Packs the example toolkit into an SPB: scripts/pack_toolkit.py DIR -o FILE [--stored]
 
-For the demo and the tests, which need no more than Python for it. Who makes packages uses
+For the demo and the tests, which need only Python for it. Real packages are made by
 `spb pack`, which refuses what cannot be installed, compresses on all processors and is documented.
 """
 

@@ -15,7 +15,7 @@ int main(int argc, char** argv)
     char text[256];
     if (zorHardwareFact(argv[1], text, sizeof text) != 0 &&
         zorFileSystemFact(argv[1], argv[2], text, sizeof text) != 0) {
-        (void)fprintf(stderr, "trawlprobe: cannot tell %s\n", argv[1]);
+        (void)fprintf(stderr, "trawlprobe: does not know %s\n", argv[1]);
         return 1;
     }
     return puts(text) < 0;

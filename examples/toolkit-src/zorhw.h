@@ -5,5 +5,5 @@
 
 /** Writes the fact `name` ("machine", "processors", "memory_kb" or "page_size") into `text`, which
  * has room for `size` bytes. Returns 0, or -1 when there is no such fact or the system does not
- * tell. */
+ * say. */
 int zorHardwareFact(const char* name, char* text, size_t size);

@@ -76,7 +76,7 @@ def test_the_documents_name_presets_and_commands():
     assert ("docs/architecture.md", "") in LINK.findall(text)
 
 
-# Messages. Each is reduced to its fixed parts: what it holds besides its values.
+# Messages. Each is reduced to its fixed parts, without its values.
 
 STATEMENT = re.compile(
     r"(?:\*logstream|std::cerr|std::cout)\s*<<"
@@ -98,7 +98,7 @@ ARGUMENTS = re.compile(
 
 
 def fixed_parts(message):
-    """What a message holds besides its values: <file>, N, (text)."""
+    """A message without its values: <file>, N, (text)."""
     parts = re.split(r"<[^<>]*>|\bN\b|\(text\)", message)
     return tuple(part.strip() for part in parts if re.search("[A-Za-z]", part))
 
@@ -201,7 +201,7 @@ def example_spb(tmp_path_factory):
     return (work / "spb").read_bytes()
 
 
-def test_the_transcript_of_the_readme_is_what_the_example_toolkit_gives(machine, example_spb):
+def test_the_transcript_of_the_readme_is_that_of_the_example_toolkit(machine, example_spb):
     machine.plant(SPB, example_spb)
     machine.make_directory("/run")
     [transcript] = [block for block in code_blocks("README.md") if block.startswith("$ flock")]

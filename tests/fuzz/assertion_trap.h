@@ -1,7 +1,7 @@
 // The one assertion of the installer as an outcome that a fuzz target can go on from.
 //
 // The deflated stream ends the program when an entry inflates to more than its recorded size. That
-// is wanted, and a fuzzer meets it every other moment, so here it must not end the process. The
+// is intended, and a fuzzer reaches it all the time, so here it must not end the process. The
 // assertion goes through __assert_fail() of the C library; assertion_trap.cpp puts one of its own
 // in its place, which jumps back to where the stream was read. An exception would not do, since
 // callers are compiled for a function that never throws. The jump skips no destructor: between it

@@ -32,7 +32,7 @@ std::uint32_t read32(const std::uint8_t* at)
            static_cast<std::uint32_t>(at[2]) << 16 | static_cast<std::uint32_t>(at[3]) << 24;
 }
 
-/// What is right to come out of a stream.
+/// What a stream must deliver.
 struct Expected {
     std::string bytes;
     bool whole = true; ///< false: the data is damaged or short, and `bytes` is what precedes that

@@ -2,7 +2,7 @@
 //
 // The image root is "/" here, so that entries are called "/bin/x" and not by a long name that the
 // fuzzer would have to keep. Names are used unchanged, ".." included, so archives with such
-// ones are left out: they would leave the directory. The others stay in it by their making.
+// ones are left out: they would leave the directory. All others stay in it.
 #include "assertion_trap.h"
 #include "extraction.h"
 #include "file_codes.h"
@@ -92,7 +92,7 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
     if (!canBeExtracted(ZipFile(file.path().c_str())))
         return 0;
 
-    // A name of 2048 bytes can stand for a thousand directories, each of which the journal names
+    // A name of 2048 bytes can name a thousand directories, each of which the journal names
     // with its whole path.
     const ResourceBound bound(1024 * KiB + KiB * size, 2000);
     extractAndRollBack(file.path(), directory, size % 2 == 0);

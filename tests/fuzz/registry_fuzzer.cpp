@@ -7,7 +7,7 @@
 namespace {
 
 /// What a written value reads back as: one made only of blanks is not trimmed, so the blank that
-/// the writer puts behind "=" stays.
+/// the writer puts after "=" stays.
 std::string readBack(const std::string& value)
 {
     return value.find_first_not_of(Blanks) == std::string::npos ? " " + value : value;

@@ -16,7 +16,7 @@ done
 def parser_options(machine):
     """Every option of one letter, mapped to whether it wants an argument.
 
-    Those that are only understood behind "-eeo" are called "-eeo -l" and so on.
+    Those that are only understood after "-eeo" are called "-eeo -l" and so on.
     """
     letters = sorted(set(string.printable) - set(string.whitespace))
     answers = machine.run_in_shell(ASK, *letters).stdout.splitlines()

@@ -91,7 +91,7 @@ def test_a_newer_kernel_than_listed_fails(tree, binary, needs, tmp_path):
     assert (outcome.returncode, outcome.stderr) == (1, "new need: kernel: 3.2.0\n")
 
 
-def test_a_need_that_has_become_less_is_told_and_passes(tree, binary, needs, tmp_path):
+def test_a_smaller_need_is_reported_and_passes(tree, binary, needs, tmp_path):
     lines = [line.replace("GLIBC_2.34", "GLIBC_2.100") for line in needs] + ["libz.so.1: ZLIB_1.2"]
 
     outcome = check_against(tree, binary, lines, tmp_path)
@@ -159,7 +159,7 @@ def test_code_that_can_be_written_to_is_named(tree, tmp_path):
     assert "missing: no relocation in code\n" in outcome.stderr
 
 
-def test_what_is_no_program_cannot_be_judged(tree):
+def test_what_is_not_a_program_cannot_be_checked(tree):
     outcome = check(tree, tree / "README.md")
 
     assert outcome.returncode == 2
@@ -205,7 +205,7 @@ def test_the_debug_file_has_the_names_and_lines_of_the_sources(debug_file):
     )
 
 
-def test_neither_file_tells_where_it_was_built(binary, debug_file, tree, build):
+def test_neither_file_contains_the_place_of_its_build(binary, debug_file, tree, build):
     for path in (binary, debug_file):
         content = path.read_bytes()
         assert [place for place in (tree, build) if bytes(place) in content] == [], path

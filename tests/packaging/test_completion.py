@@ -149,7 +149,7 @@ def test_eeo_as_the_argument_of_an_option_unlocks_nothing(bash):
     assert bash.completed("wzorinst i X -d -eeo -l") == "wzorinst i X -d -eeo -l"
 
 
-def test_the_package_is_a_file_that_ends_in_spb_or_lies_in_a_directory(bash):
+def test_the_package_is_a_file_that_ends_in_spb_or_in_a_directory(bash):
     assert (
         bash.completed("wzorinst i X -s ")
         == r"wzorinst i X -s TOOLS.SPB media toolkit.spb two\ words.spb "

@@ -90,7 +90,7 @@ def test_the_page_has_the_sections_of_a_manual_page(sections):
     ]
 
 
-def test_every_line_of_the_usage_text_is_explained_in_its_words(sections, usage):
+def test_every_line_of_the_usage_text_is_explained_in_the_same_words(sections, usage):
     explained = {**entries(sections["ACTIONS"]), **entries(sections["OPTIONS"])}
 
     assert len(usage) == 12

@@ -412,7 +412,7 @@ def test_rpmlint_finds_no_errors(packages, tree):
     )
 
 
-def test_the_debug_symbols_lie_where_a_debugger_looks_for_them(packages, names, root):
+def test_the_debug_symbols_are_where_a_debugger_looks_for_them(packages, names, root):
     deb = packages / f"wzorinst-dbgsym_{VERSION}-1_{names['debian']}.deb"
 
     dpkg(root, "--install", deb)

@@ -116,12 +116,12 @@ def test_an_install_type_before_the_switch_is_invalid(machine):
     printed(machine.run("r", "ABC", "-l", "-eeo"), USAGE, status=1, stderr="Invalid option: -l\n")
 
 
-def test_an_unknown_option_is_invalid_behind_the_switch_too(machine):
+def test_an_unknown_option_is_invalid_after_the_switch_too(machine):
     printed(machine.run("r", "ABC", "-eeo", "-q"), USAGE, status=1, stderr="Invalid option: -q\n")
 
 
 @pytest.mark.parametrize("option", ["-d", "-f", "-s", "-o", "-c"])
-def test_an_option_at_the_end_misses_its_argument(machine, option):
+def test_an_option_at_the_end_lacks_its_argument(machine, option):
     printed(
         machine.run("r", "ABC", option),
         USAGE,
@@ -215,7 +215,7 @@ def test_an_empty_provider_is_accepted_between_two_separators(machine):
     )
 
 
-def test_an_invalid_provider_is_told_to_the_log_file_and_the_usage_to_the_user(machine):
+def test_an_invalid_provider_is_reported_in_the_log_file_and_the_usage_on_the_terminal(machine):
     printed(machine.run("r", "ABC", "-o", "/tmp/log", "-f", "none"), USAGE, status=1)
     same_text(machine.read("/tmp/log"), "Invalid provider specified: none\n")
 
@@ -254,7 +254,7 @@ def test_an_empty_package_path_counts_as_none(machine):
     )
 
 
-def test_a_missing_package_is_told_to_the_log_file_and_the_usage_to_the_user(machine):
+def test_a_missing_package_is_reported_in_the_log_file_and_the_usage_on_the_terminal(machine):
     printed(machine.run("i", "ABC", "-o", "/tmp/log"), USAGE, status=1)
     same_text(machine.read("/tmp/log"), "Error: an SPB file is required to install or upgrade\n")
 
@@ -263,7 +263,7 @@ def test_a_removal_needs_no_package(machine):
     printed(machine.run("r", "ABC"), NOTHING_TO_REMOVE, status=1)
 
 
-def test_every_option_with_an_argument_tells_it_in_the_order_of_the_command_line(machine):
+def test_every_option_with_an_argument_is_printed_in_the_order_of_the_command_line(machine):
     outcome = machine.run(
         "r", "ABC", "-c", "/tmp/trace", "-f", "provider_cache2", "-s", "p.spb", "-d", "/opt/x"
     )
@@ -303,7 +303,7 @@ Done.
         ("-eeo", "-r", "-v", "-norollback", "-eeo"),
     ],
 )
-def test_the_options_without_an_argument_say_nothing(machine, options):
+def test_options_without_an_argument_print_nothing(machine, options):
     printed(machine.run("r", "ABC", *options), NOTHING_TO_REMOVE, status=1)
 
 
@@ -458,7 +458,7 @@ def test_of_two_log_files_the_second_takes_over(machine):
     same_text(machine.read("/tmp/2"), NOTHING_TO_REMOVE)
 
 
-def test_command_line_errors_go_to_standard_error_in_spite_of_a_log_file(machine):
+def test_command_line_errors_go_to_standard_error_despite_a_log_file(machine):
     printed(
         machine.run("r", "ABC", "-o", "/tmp/log", "-q"),
         USAGE,
@@ -468,7 +468,7 @@ def test_command_line_errors_go_to_standard_error_in_spite_of_a_log_file(machine
     same_text(machine.read("/tmp/log"), "")
 
 
-def test_a_log_file_that_cannot_be_opened_costs_the_output_and_nothing_else(machine):
+def test_a_log_file_that_cannot_be_opened_only_loses_the_output(machine):
     outcome = machine.run("i", "ABC", "-o", "/no/such/directory/log", "-s", SPB)
 
     printed(outcome, "")

@@ -1,4 +1,4 @@
-"""Where a run looks for an installation, and what it makes of the registry it finds."""
+"""Where a run looks for an installation, and how it reads the registry that it finds."""
 
 import pytest
 
@@ -98,7 +98,7 @@ def test_a_user_without_a_home_directory_has_no_error_in_a_shared_run(machine):
     printed_lines(outcome, "Register exploiter: yes", "Default dest: /opt/corvan/zor")
 
 
-def test_the_error_line_for_a_missing_home_directory_comes_with_a_given_target_too(machine):
+def test_a_missing_home_directory_is_reported_with_a_given_target_too(machine):
     printed_lines(
         machine.run("r", "XYZ", "-d", "/tmp/zor", user=STRANGER),
         "Register exploiter: yes",
@@ -148,7 +148,7 @@ currentZorHome = '/opt/corvan/zor' currentCfgHome = '/opt/corvan/zor'
     )
 
 
-def test_looking_leaves_the_machine_as_it_was(machine):
+def test_discovery_changes_nothing(machine):
     machine.plant_scanner_control()
     machine.register()
     before = machine.tree()
@@ -306,7 +306,7 @@ def test_a_value_keeps_its_further_equals_signs(machine):
     )
 
 
-def test_a_registered_home_with_a_final_slash_is_used_as_it_stands(machine):
+def test_a_registered_home_with_a_final_slash_is_used_unchanged(machine):
     machine.plant_scanner_control("/opt/x")
     machine.register(home="/opt/x/")
 
@@ -376,7 +376,7 @@ def test_a_missing_home_directory_leads_to_a_fresh_installation(machine):
     same_text(machine.read("/etc/zor/zor.ini"), WELL_FORMED)
 
 
-def test_a_missing_scanner_control_is_named(machine):
+def test_a_missing_scanner_control_is_reported(machine):
     machine.make_directory("/opt/corvan/zor")
     machine.register()
 
@@ -394,7 +394,7 @@ def test_a_missing_scanner_control_is_named(machine):
     )
 
 
-def test_an_empty_scanner_control_is_named(machine):
+def test_an_empty_scanner_control_is_reported(machine):
     machine.plant("/opt/corvan/zor/bin/trawlcfg", "")
     machine.register()
 
@@ -512,7 +512,7 @@ def test_a_shared_installation_refuses_a_per_user_one(machine, recorded):
     "recorded, options",
     [("ZOR_InstallType=local\n", ("-eeo", "-l")), ("ZOR_InstallType=global\n", ()), ("", ())],
 )
-def test_an_installation_of_the_same_type_is_let_through(machine, recorded, options):
+def test_an_installation_of_the_same_type_is_accepted(machine, recorded, options):
     machine.plant("/opt/x/install/zor_install.properties", recorded)
 
     outcome = machine.run("i", "ABC", "-s", SPB, "-d", "/opt/x", *options)
@@ -521,7 +521,7 @@ def test_an_installation_of_the_same_type_is_let_through(machine, recorded, opti
     not_printed(outcome, "incompatible install type")
 
 
-def test_an_install_type_file_that_cannot_be_read_lets_everything_through(machine):
+def test_an_install_type_file_that_cannot_be_read_allows_every_type(machine):
     machine.plant("/home/ann/zor/install/zor_install.properties", "ZOR_InstallType=global\n", 0)
 
     outcome = machine.run("i", "ABC", "-s", SPB, "-d", "/home/ann/zor", user=ANN)
@@ -588,7 +588,7 @@ def test_a_rewritten_registry_has_lost_the_fifth_number(machine):
     assert registry.startswith("ZOR_Version = 9.2.30.0000\n")
 
 
-def test_a_level_of_five_digits_is_written_whole(machine):
+def test_a_level_of_five_digits_is_written_completely(machine):
     registry = rewritten(machine, WELL_FORMED.replace("9.2.30.0000", "9.2.30.12345"))
 
     assert registry.startswith("ZOR_Version = 9.2.30.12345\n")
@@ -621,7 +621,7 @@ def test_an_exploiter_list_with_an_empty_piece_is_kept(machine):
     assert "\nZOR_Exploiters = A::B:NEW:\n" in registry
 
 
-def test_an_exploiter_behind_an_empty_piece_of_the_list_is_found(machine):
+def test_an_exploiter_after_an_empty_piece_of_the_list_is_found(machine):
     machine.plant_scanner_control()
     machine.register(version="22.0.0.0000", exploiters="ABC::XYZ:")
     before = machine.tree("/etc/zor")

@@ -139,7 +139,7 @@ def test_a_removal_without_an_intact_installation_fails(machine):
     assert machine.run("r", "ABC").status == 1
 
 
-def test_a_private_removal_deletes_its_directory_whole(machine):
+def test_a_private_removal_deletes_its_whole_directory(machine):
     machine.plant("/opt/archive/2019/letter", "mine\n")
 
     assert machine.run("r", "ABC", "-p", "-d", "/opt/archive").status == 0
@@ -342,7 +342,7 @@ def test_without_proc_modes_of_what_cannot_be_read_stay(machine):
     assert machine.mode(home + "/install") == 0o750
 
 
-def test_programs_run_through_the_shell_follow_links_of_strangers(shared_machine):
+def test_programs_run_through_the_shell_follow_other_users_links(shared_machine):
     """The trace path that the toolkit's own program gets is not checked."""
     machine = shared_machine
     machine.link_as(GUEST, "/home/guest/traces", "/etc")

@@ -62,7 +62,7 @@ def test_with_selinux_switched_off_nothing_is_labelled(machine):
     not_printed(outcome, "chcon")
 
 
-def test_a_failing_label_costs_nothing(machine):
+def test_a_failing_label_is_ignored(machine):
     machine.add_selinux(chcon_status=7)
 
     outcome = install(machine)
@@ -174,7 +174,7 @@ def test_an_unset_library_path_becomes_the_directory_of_the_binaries(machine):
     same_lines(machine.library_paths(), ["/opt/corvan/zor/bin"])
 
 
-def test_a_library_path_that_was_set_stays_behind_the_directory_of_the_binaries(machine):
+def test_a_library_path_that_was_set_follows_the_directory_of_the_binaries(machine):
     install(machine, environment={"LD_LIBRARY_PATH": "/usr/local/lib:/x"})
 
     same_lines(machine.library_paths(), ["/opt/corvan/zor/bin:/usr/local/lib:/x"])
@@ -186,7 +186,7 @@ def test_an_empty_library_path_leaves_its_colon(machine):
     same_lines(machine.library_paths(), ["/opt/corvan/zor/bin:"])
 
 
-def test_debug_mode_tells_the_library_path(machine):
+def test_debug_mode_logs_the_library_path(machine):
     outcome = install(machine, "-v", environment={"LD_LIBRARY_PATH": "/x"})
 
     printed_lines(
@@ -196,7 +196,7 @@ def test_debug_mode_tells_the_library_path(machine):
     )
 
 
-def test_without_debug_mode_the_library_path_is_not_told(machine):
+def test_without_debug_mode_the_library_path_is_not_logged(machine):
     not_printed(install(machine), "LD_LIBRARY_PATH")
 
 
@@ -235,7 +235,7 @@ def test_the_library_path_of_a_home_with_a_final_slash_has_one_slash(machine):
 
 
 @pytest.mark.parametrize("status", [1, 2, 127])
-def test_the_status_of_a_command_is_told_undecoded(machine, status):
+def test_the_raw_status_of_a_command_is_logged(machine, status):
     machine.let_commands_fail(("common_trace_path", status))
 
     outcome = machine.run("i", "ABC", "-s", SPB)

@@ -58,7 +58,7 @@ INSTALLER_COMMANDS = [
 
 
 @pytest.mark.parametrize("command", INSTALLER_COMMANDS, ids=" ".join)
-def test_every_command_line_of_the_installer_succeeds_in_silence(home, command):
+def test_every_command_line_of_the_installer_succeeds_silently(home, command):
     done = run(home, *command)
 
     assert (done.returncode, done.stdout, done.stderr) == (0, "", "")
@@ -114,14 +114,14 @@ def test_the_command_log_holds_failed_and_wrong_commands_too(home, tmp_path):
     assert log.read_text() == "trawlcfg -disable all\ntrawlcfg -wrong\n"
 
 
-def test_a_command_log_that_cannot_be_written_is_told(home, tmp_path):
+def test_a_command_log_that_cannot_be_written_is_reported(home, tmp_path):
     done = run(home, "trawlcfg", "-disable", "all", ZOR_COMMAND_LOG=str(tmp_path / "no" / "log"))
 
     assert done.returncode == 1
     assert not (home / "config" / "trawlcfg.state").exists()
 
 
-def test_without_a_place_of_its_own_the_command_log_lies_in_the_configuration(home):
+def test_without_a_place_of_its_own_the_command_log_is_in_the_configuration(home):
     run(home, "trawlcfg", "-disable", "all")
     run(home, "trawlfs", "-shutdown")
 
@@ -129,7 +129,7 @@ def test_without_a_place_of_its_own_the_command_log_lies_in_the_configuration(ho
     assert log.read_text() == "trawlcfg -disable all\ntrawlfs -shutdown\n"
 
 
-def test_the_state_file_says_what_differs_from_the_start(home):
+def test_the_state_file_lists_what_differs_from_the_start(home):
     run(home, "trawlcfg", "-s", "common_trace_path", "/a path/with blanks")
     run(home, "trawlcfg", "-disable", "all")
 
@@ -345,7 +345,7 @@ def test_building_twice_gives_the_same_bytes(built, tmp_path):
     assert tree_of(tmp_path / "again") == tree_of(built)
 
 
-def test_building_into_an_older_build_takes_away_what_is_no_longer_there(tmp_path):
+def test_building_into_an_older_build_deletes_what_is_no_longer_there(tmp_path):
     subprocess.run([BUILD_TOOLKIT, tmp_path], check=True)
     (tmp_path / "bin" / "old").write_text("1")
     (tmp_path / "notes").write_text("mine")

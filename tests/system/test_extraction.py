@@ -1,4 +1,4 @@
-"""What is made of the package: good archives, odd ones and broken ones."""
+"""How packages are extracted: valid archives, unusual ones and damaged ones."""
 
 import random
 
@@ -66,7 +66,7 @@ def test_a_file_of_every_size_arrives_to_its_last_byte(machine, method, kind):
         assert machine.read_bytes(f"{HOME}/bin/{size}") == content
 
 
-def test_extra_fields_are_passed_over(machine):
+def test_extra_fields_are_skipped(machine):
     package = archive()
     package.add(IMAGE_ROOT + "bin/a", b"first", local_extra=b"x" * 300, central_extra=b"y" * 9)
     package.add(IMAGE_ROOT + "bin/b", b"second")
@@ -221,7 +221,7 @@ def test_an_entry_of_another_method_cannot_be_extracted(machine, method):
     )
 
 
-def test_an_entry_of_another_method_outside_of_the_package_directories_does_no_harm(machine):
+def test_an_entry_of_another_method_outside_of_the_package_directories_is_ignored(machine):
     install(machine, archive().add(IMAGE_ROOT + "doc/odd", b"data", 12))
 
 
@@ -249,7 +249,7 @@ def test_a_stored_entry_with_too_large_a_size_reads_on_into_the_archive(machine)
     assert machine.read_bytes(HOME + "/bin/long") == b"0123456789PK\3\4"
 
 
-def test_damaged_deflated_data_lose_the_block_in_which_the_damage_is(machine):
+def test_damaged_deflated_data_lose_the_damaged_block(machine):
     # An intact stored block of five bytes, then a block of a kind that does not exist.
     damaged = b"\x00\x05\x00\xfa\xffhello" + b"\x07" + b"junk"
     package = archive().add(
@@ -266,7 +266,7 @@ def test_damaged_deflated_data_lose_the_block_in_which_the_damage_is(machine):
     assert machine.read(HOME + "/bin/damaged") == ""
 
 
-def test_deflated_data_damaged_behind_a_whole_block_keep_that_block(machine):
+def test_deflated_data_damaged_after_a_complete_block_keep_that_block(machine):
     header = b"\x00" + (12000).to_bytes(2, "little") + (12000 ^ 0xFFFF).to_bytes(2, "little")
     damaged = header + NOISE[:12000] + b"\x07" + b"junk"
     package = archive().add(
@@ -306,7 +306,7 @@ def test_deflated_data_longer_than_recorded_abort_the_installer(machine):
     )
 
 
-def test_an_aborted_installation_leaves_what_it_had_done(machine):
+def test_an_aborted_installation_is_not_undone(machine):
     machine.plant(HOME + "/bin/trawlcfg", "older", 0o700)
     package = archive().add(IMAGE_ROOT + "bin/zz", b"0123456789", DEFLATED, size=9)
 
@@ -400,14 +400,14 @@ def test_runs_of_slashes_in_the_target_become_one(machine):
     assert "\n/opt/a/bin/trawlcfg\n" in machine.index("/opt/a")
 
 
-def test_a_name_with_two_dots_is_used_as_it_stands(machine):
-    install(machine, archive({"bin/../beside": b"x"}))
+def test_a_name_with_two_dots_is_used_unchanged(machine):
+    install(machine, archive({"bin/../sibling": b"x"}))
 
-    assert machine.read(HOME + "/beside") == "x"
-    assert "\n/opt/corvan/zor/bin/../beside\n" in machine.index(HOME)
+    assert machine.read(HOME + "/sibling") == "x"
+    assert "\n/opt/corvan/zor/bin/../sibling\n" in machine.index(HOME)
 
 
-def test_names_with_blanks_and_odd_bytes_arrive(machine):
+def test_names_with_blanks_and_unusual_bytes_are_extracted(machine):
     package = archive()
     package.add(IMAGE_ROOT.encode() + b"bin/a b\xff\n;$(x)'\"", b"odd")
 
@@ -504,7 +504,7 @@ def test_a_link_to_itself_in_the_way_of_a_file_cannot_be_replaced(machine):
     assert machine.tree(HOME + "/bin/trawlhw")[HOME + "/bin/trawlhw"].content == b"trawlhw"
 
 
-def test_a_name_that_the_file_system_does_not_take_cannot_be_written(machine):
+def test_a_name_that_the_file_system_rejects_cannot_be_written(machine):
     outcome = run(machine, archive({"bin/" + "n" * 300: b"content"}))
 
     assert outcome.status == 1

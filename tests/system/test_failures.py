@@ -46,7 +46,7 @@ def fail(bench, kind, path, error, number=-1):
 
 
 @pytest.mark.parametrize("error", ["EIO", "EACCES"])
-def test_a_file_that_cannot_be_looked_at_is_backed_up_all_the_same(laboratory, error):
+def test_a_file_that_cannot_be_looked_at_is_backed_up_anyway(laboratory, error):
     bench = sweep.Bench(laboratory, SCENARIOS["failing-upgrade"])
     scanner = HOME + "/bin/trawlhw"
 

@@ -155,7 +155,7 @@ rmdir "/opt/corvan/zor/cache_data" "/usr/kel/corvan/common/ZOR"
     )
 
 
-def test_the_toolkit_is_told_its_trace_directory_once(machine):
+def test_the_toolkits_trace_directory_is_configured_once(machine):
     same_lines(
         install(machine).commands,
         [
@@ -365,7 +365,7 @@ def test_a_backup_of_a_file_that_is_not_replaced_stays(machine):
     assert machine.read("/opt/corvan/zor/bin/trawlhw.bak") == "not ours"
 
 
-def test_an_unsound_registry_is_replaced_and_nothing_of_it_stays(machine):
+def test_an_invalid_registry_is_replaced_completely(machine):
     machine.plant(
         "/etc/zor/zor.ini",
         "ZOR_Exploiters = OLD:\nZOR_ConfigRootDirectory = /old\n"
@@ -400,7 +400,7 @@ def test_every_identifier_without_a_colon_is_registered(machine, exploiter):
     assert f"\nZOR_Exploiters = {exploiter}:\n" in machine.read("/etc/zor/zor.ini")
 
 
-def test_missing_scripts_are_told_and_cost_nothing(machine):
+def test_missing_scripts_are_reported_and_ignored(machine):
     machine.pack(without=("install/trawlcfg.sh", "install/rmdirs.sh"))
 
     outcome = install(machine)
@@ -415,7 +415,7 @@ def test_missing_scripts_are_told_and_cost_nothing(machine):
     )
 
 
-def test_an_install_type_file_that_cannot_be_written_costs_nothing(machine):
+def test_an_install_type_file_that_cannot_be_written_is_ignored(machine):
     machine.pack({"install/zor_install.properties/": b""})
 
     outcome = install(machine)
@@ -455,7 +455,7 @@ def test_an_existing_common_directory_and_log_directory_are_used_as_they_are(mac
     assert machine.mode("/usr/kel/corvan/common/ZOR/logs") == 0o700
 
 
-def test_a_common_directory_of_the_administrators_choice_is_used(machine):
+def test_a_common_directory_that_the_administrator_chose_is_used(machine):
     machine.plant(
         "/etc/kel/corvan/common/cfg/log.properties", "corvan_common_dir = /opt/c d \n", 0o600
     )
@@ -484,7 +484,7 @@ def test_a_common_directory_of_the_administrators_choice_is_used(machine):
     assert not machine.exists("/usr/kel")
 
 
-def test_a_common_directory_that_cannot_be_made_costs_nothing(machine):
+def test_a_common_directory_that_cannot_be_made_is_ignored(machine):
     machine.plant("/usr/kel/corvan", "a file")
 
     outcome = install(machine)
@@ -498,7 +498,7 @@ def test_a_common_directory_that_cannot_be_made_costs_nothing(machine):
     printed_lines(outcome, "Installation successful, committing changes")
 
 
-def test_a_setting_file_that_cannot_be_written_costs_nothing(machine):
+def test_a_setting_file_that_cannot_be_written_is_ignored(machine):
     machine.plant("/etc/kel", "a file")
 
     outcome = install(machine)
@@ -544,7 +544,7 @@ def test_the_permission_pass_sets_the_mode_of_a_directory_that_was_there(machine
         ("config/ZorTrace.properties", 0o644),
     ],
 )
-def test_the_permission_pass_sets_the_mode_of_a_file_that_the_package_does_not_carry(
+def test_the_permission_pass_sets_the_mode_of_a_file_that_the_package_does_not_contain(
     machine, path, mode
 ):
     machine.pack(without=(path,))
@@ -584,7 +584,7 @@ def test_the_permission_pass_sets_the_mode_of_a_registry_directory_that_was_ther
     assert machine.mode("/etc/zor") == 0o755
 
 
-def test_a_mode_that_cannot_be_changed_is_told_and_costs_nothing(machine):
+def test_a_mode_that_cannot_be_changed_is_reported_and_ignored(machine):
     machine.make_directory("/media/logs")
     machine.make_directory("/opt/corvan/zor/logs")
 
@@ -600,7 +600,7 @@ def test_a_mode_that_cannot_be_changed_is_told_and_costs_nothing(machine):
     )
 
 
-def test_the_permission_pass_goes_on_behind_a_mode_that_cannot_be_changed(machine):
+def test_the_permission_pass_continues_after_a_mode_that_cannot_be_changed(machine):
     machine.make_directory("/media/logs")
     machine.make_directory("/opt/corvan/zor/logs")
     machine.make_directory("/opt/corvan/zor/_uninst", 0o700)
@@ -618,7 +618,7 @@ def test_a_fresh_installation_keeps_a_cache_that_was_there(machine):
     assert machine.read("/opt/corvan/zor/cache_data/entry") == "cached"
 
 
-def test_shared_and_per_user_installations_stand_side_by_side(machine):
+def test_shared_and_per_user_installations_can_coexist(machine):
     install(machine)
     shared = machine.tree("/opt", "/etc")
 
@@ -666,4 +666,4 @@ def test_the_time_stamp_of_the_index_follows_the_time_zone(machine, user, place)
     install(machine, user=user, environment={"TZ": "WEST+10"})
     west = machine.read(place + "/ZOR_files").splitlines()[0][-19:-6]
 
-    assert east > west, "14 hours before and 10 hours behind UTC"
+    assert east > west, "14 hours ahead of UTC and 10 hours behind it"

@@ -15,8 +15,8 @@ from harness.attacks import (
     REMOVING,
     Untouched,
     ends,
-    furnish,
     no_permission,
+    prepare,
     refused_modes,
 )
 from harness.checks import not_printed, printed_lines, same_lines
@@ -63,8 +63,8 @@ def hers(machine):
     )
 
 
-def furnish_hers(machine, action):
-    furnish(machine, action, HOME, REGISTRY, ANN)
+def prepare_hers(machine, action):
+    prepare(machine, action, HOME, REGISTRY, ANN)
 
 
 def run(machine, action):
@@ -74,7 +74,7 @@ def run(machine, action):
 @pytest.mark.parametrize("target", **named(TARGETS))
 @pytest.mark.parametrize("action", INSTALLING)
 def test_no_mode_is_set_through_the_neighbours_links(machine, action, target):
-    furnish_hers(machine, action)
+    prepare_hers(machine, action)
     for name in SCANNERS:
         machine.link_as(GUEST, f"{BIN_ETC}/{name}", target)
 
@@ -88,7 +88,7 @@ def test_no_mode_is_set_through_the_neighbours_links(machine, action, target):
 @pytest.mark.parametrize("target", **named(TARGETS))
 @pytest.mark.parametrize("action", REMOVING)
 def test_a_removal_deletes_the_neighbours_links_only(machine, action, target):
-    furnish_hers(machine, action)
+    prepare_hers(machine, action)
     for name in SCANNERS:
         machine.link_as(GUEST, f"{BIN_ETC}/{name}", target)
 
@@ -101,8 +101,8 @@ def test_a_removal_deletes_the_neighbours_links_only(machine, action, target):
 
 
 @pytest.mark.parametrize("action", INSTALLING)
-def test_the_neighbours_fifos_keep_nobody_waiting(machine, action):
-    furnish_hers(machine, action)
+def test_the_neighbours_fifos_do_not_block_the_run(machine, action):
+    prepare_hers(machine, action)
     for name in SCANNERS:
         machine.fifo_as(GUEST, f"{BIN_ETC}/{name}")
 
@@ -117,7 +117,7 @@ def test_the_neighbours_fifos_keep_nobody_waiting(machine, action):
 @pytest.mark.parametrize("target", **named(TARGETS))
 @pytest.mark.parametrize("action", DEPLOYING)
 def test_a_file_of_the_package_takes_the_place_of_the_neighbours_link(machine, action, target):
-    furnish_hers(machine, action)
+    prepare_hers(machine, action)
     scanner = CUSTOM + "/site.sh"
     machine.as_user(GUEST, lambda: os.unlink(machine.at(scanner)))
     machine.link_as(GUEST, scanner, target)
@@ -135,7 +135,7 @@ def test_a_file_of_the_package_takes_the_place_of_the_neighbours_link(machine, a
 @pytest.mark.parametrize("target", **named(TARGETS))
 @pytest.mark.parametrize("action", DEPLOYING)
 def test_nothing_is_extracted_below_the_neighbours_link(machine, action, target):
-    furnish_hers(machine, action)
+    prepare_hers(machine, action)
     sub = machine.at(CUSTOM + "/sub")
     machine.as_user(GUEST, lambda: os.rename(sub, sub + ".moved"))
     machine.link_as(GUEST, CUSTOM + "/sub", target)
@@ -183,7 +183,7 @@ def test_no_log_is_written_through_the_neighbours_link(machine):
 
 @pytest.mark.parametrize("owner", [ANN, ROOT], ids=["her own", "root's"])
 def test_her_own_links_and_roots_are_followed(machine, owner):
-    furnish_hers(machine, "registration")
+    prepare_hers(machine, "registration")
     machine.make_directory("/home/ann/scanner", 0o700)
     machine.give_to(ANN, "/home/ann/scanner")
     machine.link(BIN_ETC + "/trawlfs", "/home/ann/scanner")

@@ -8,7 +8,7 @@ import os
 
 import pytest
 
-from harness.attacks import HOME, PROBE, Untouched, ends, furnish, install
+from harness.attacks import HOME, PROBE, Untouched, ends, install, prepare
 from harness.checks import not_printed, printed_lines
 from harness.machine import SPB
 from harness.shared_machine import (
@@ -97,7 +97,7 @@ def test_a_private_installation_follows_no_link(machine, target, spelling):
 
 
 def prepare_private(machine):
-    """What the guest has made of the target of a private installation."""
+    """The target of a private installation after the attack."""
 
     def make():
         for name in ("bin", "config", "install", "properties"):
@@ -361,7 +361,7 @@ def test_no_trace_directory_is_made_through_a_link(machine, below, target):
 @pytest.mark.parametrize("target", ["/home/guest/zor.ini", NOTHING])
 @pytest.mark.parametrize("action", ["installation", "upgrade", "registration"])
 def test_no_registry_is_read_or_written_through_a_link(machine, action, target):
-    furnish(machine, action)
+    prepare(machine, action)
     registry = "/etc/zor/zor.ini"
     if machine.exists(registry):
         os.rename(machine.at(registry), machine.at("/home/guest/zor.ini"))
@@ -433,7 +433,7 @@ def test_a_fifo_at_the_setting_does_not_hang_the_run(machine, command):
 )
 def test_no_file_of_an_upgrade_is_edited_through_a_link(machine, path):
     """Zor.properties stays where it is; the others are extracted in the link's place."""
-    furnish(machine, "upgrade")
+    prepare(machine, "upgrade")
     os.rename(machine.at(path), machine.at("/etc/secret/edited"))
     machine.link(path, "/etc/secret/edited")
     machine.give_to(GUEST, path)
@@ -450,7 +450,7 @@ def test_no_file_of_an_upgrade_is_edited_through_a_link(machine, path):
 
 
 def test_the_probe_of_a_repair_follows_no_link(machine):
-    furnish(machine, "upgrade")
+    prepare(machine, "upgrade")
     machine.remove(HOME + "/bin/trawlcfg")
     machine.give_to(GUEST, HOME)
     machine.link_as(GUEST, PROBE, SHADOW)

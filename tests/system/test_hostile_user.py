@@ -21,9 +21,9 @@ from harness.attacks import (
     REMOVING,
     Untouched,
     ends,
-    furnish,
     install,
     no_permission,
+    prepare,
     refused_modes,
 )
 from harness.checks import not_printed, printed_lines, same_lines
@@ -74,7 +74,7 @@ def named(values):
 @pytest.mark.parametrize("target", **named(TARGETS))
 @pytest.mark.parametrize("action", INSTALLING)
 def test_no_mode_is_set_through_links_in_bin_etc(machine, action, target):
-    furnish(machine, action)
+    prepare(machine, action)
     for name in SCANNERS:
         machine.link_as(GUEST, f"{BIN_ETC}/{name}", target)
     links = machine.state(BIN_ETC)
@@ -90,7 +90,7 @@ def test_no_mode_is_set_through_links_in_bin_etc(machine, action, target):
 @pytest.mark.parametrize("target", **named(TARGETS))
 @pytest.mark.parametrize("action", REMOVING)
 def test_a_removal_deletes_links_in_bin_etc_and_not_what_they_lead_to(machine, action, target):
-    furnish(machine, action)
+    prepare(machine, action)
     for name in SCANNERS:
         machine.link_as(GUEST, f"{BIN_ETC}/{name}", target)
 
@@ -106,7 +106,7 @@ def test_a_removal_deletes_links_in_bin_etc_and_not_what_they_lead_to(machine, a
 
 @pytest.mark.parametrize("action", INSTALLING)
 def test_fifos_in_bin_etc_get_their_modes(machine, action):
-    furnish(machine, action)
+    prepare(machine, action)
     for name in SET:
         machine.fifo_as(GUEST, f"{BIN_ETC}/{name}")
 
@@ -120,7 +120,7 @@ def test_fifos_in_bin_etc_get_their_modes(machine, action):
 
 @pytest.mark.parametrize("action", INSTALLING)
 def test_directories_of_mode_000_in_bin_etc_get_their_modes(machine, action):
-    furnish(machine, action)
+    prepare(machine, action)
     machine.as_user(GUEST, lambda: os.mkdir(machine.at(BIN_ETC + "/trawlfs"), 0))
 
     outcome = machine.run(*ACTIONS[action])
@@ -132,7 +132,7 @@ def test_directories_of_mode_000_in_bin_etc_get_their_modes(machine, action):
 
 @pytest.mark.parametrize("action", REMOVING)
 def test_a_removal_deletes_fifos_in_bin_etc(machine, action):
-    furnish(machine, action)
+    prepare(machine, action)
     for name in EMPTIED:
         machine.fifo_as(GUEST, f"{BIN_ETC}/{name}")
 
@@ -145,7 +145,7 @@ def test_a_removal_deletes_fifos_in_bin_etc(machine, action):
 
 @pytest.mark.parametrize("action", INSTALLING)
 def test_no_mode_is_set_through_hard_links_in_bin_etc(machine, action):
-    furnish(machine, action)
+    prepare(machine, action)
     board = board_of_all(machine)
     machine.as_user(GUEST, lambda: os.link(board, machine.at(BIN_ETC + "/trawlhw")))
 
@@ -163,7 +163,7 @@ def board_of_all(machine):
 
 @pytest.mark.parametrize("name", ["config", "logs", "_uninst", "bin/plugins"])
 def test_a_link_that_was_given_away_is_refused_wherever_it_is(machine, name):
-    furnish(machine, "registration")
+    prepare(machine, "registration")
     if machine.exists(f"{HOME}/{name}"):
         os.rename(machine.at(f"{HOME}/{name}"), machine.at(f"{HOME}/moved"))
     machine.link(f"{HOME}/{name}", SECRET)
@@ -204,7 +204,7 @@ def replace_by_link(machine, path, target):
 @pytest.mark.parametrize("action", DEPLOYING)
 def test_a_file_of_the_package_takes_the_place_of_a_link(machine, action, target):
     machine.pack(CUSTOM_FILES)
-    furnish(machine, action)
+    prepare(machine, action)
     replace_by_link(machine, SCANNER, target)
 
     with Untouched(machine):
@@ -219,7 +219,7 @@ def test_a_file_of_the_package_takes_the_place_of_a_link(machine, action, target
 @pytest.mark.parametrize("target", **named(TARGETS))
 def test_a_rollback_puts_a_link_back(machine, target):
     machine.pack(CUSTOM_FILES)
-    furnish(machine, "upgrade")
+    prepare(machine, "upgrade")
     replace_by_link(machine, SCANNER, target)
     link = machine.state(SCANNER)
     machine.make_directory("/etc/zor/zor.ini.bak")  # the registry cannot be saved
@@ -235,7 +235,7 @@ def test_a_rollback_puts_a_link_back(machine, target):
 @pytest.mark.parametrize("action", DEPLOYING)
 def test_a_file_of_the_package_takes_the_place_of_a_fifo(machine, action):
     machine.pack(CUSTOM_FILES)
-    furnish(machine, action)
+    prepare(machine, action)
     machine.as_user(GUEST, lambda: os.unlink(machine.at(SCANNER)))
     machine.fifo_as(GUEST, SCANNER)
 
@@ -259,7 +259,7 @@ def test_a_file_of_the_package_takes_the_place_of_a_fifo(machine, action):
 @pytest.mark.parametrize("action", DEPLOYING)
 def test_nothing_is_extracted_below_a_link(machine, action, files, error, target):
     machine.pack(SUB_FILES_AND_ENTRY)
-    furnish(machine, action)
+    prepare(machine, action)
     machine.pack(files)
     replace_by_link(machine, CUSTOM + "/sub", target)
     link = machine.state(CUSTOM + "/sub")
@@ -279,7 +279,7 @@ def test_nothing_is_extracted_below_a_link(machine, action, files, error, target
 @pytest.mark.parametrize("action", REMOVING)
 def test_a_removal_leaves_what_links_in_customscanners_lead_to(machine, action, target):
     machine.pack(SUB_FILES_AND_ENTRY)
-    furnish(machine, action)
+    prepare(machine, action)
     replace_by_link(machine, CUSTOM + "/sub", target)
     machine.link_as(GUEST, CUSTOM + "/dangling", NOTHING)
     run_sh = SECRET + "/run.sh"
@@ -307,7 +307,7 @@ def plant_archive(machine):
 @pytest.mark.parametrize("path", COMMON_LINKS)
 @pytest.mark.parametrize("action", INSTALLING)
 def test_no_directory_is_made_through_links_above_the_logs(machine, action, path, target):
-    furnish(machine, action)
+    prepare(machine, action)
     replace_by_link(machine, path, target)
 
     with Untouched(machine):
@@ -325,7 +325,7 @@ def test_no_directory_is_made_through_links_above_the_logs(machine, action, path
 @pytest.mark.parametrize("path", COMMON_LINKS)
 @pytest.mark.parametrize("action", REMOVING)
 def test_a_removal_empties_no_directory_through_links_above_the_logs(machine, action, path):
-    furnish(machine, action)
+    prepare(machine, action)
     plant_archive(machine)
     replace_by_link(machine, path, ARCHIVE)
 
@@ -344,7 +344,7 @@ def test_a_removal_empties_no_directory_through_links_above_the_logs(machine, ac
 @pytest.mark.parametrize("path", COMMON_LINKS)
 @pytest.mark.parametrize("action", ["upgrade", "removal"])
 def test_fifos_above_the_logs_do_not_hang_a_run(machine, action, path):
-    furnish(machine, action)
+    prepare(machine, action)
     machine.as_user(GUEST, lambda: os.rename(machine.at(path), machine.at(path) + ".moved"))
     machine.fifo_as(GUEST, path)
 
@@ -355,7 +355,7 @@ def test_fifos_above_the_logs_do_not_hang_a_run(machine, action, path):
 
 
 def test_single_user_mode_sets_no_mode_through_links_above_the_logs(machine):
-    furnish(machine, "upgrade")
+    prepare(machine, "upgrade")
     replace_by_link(machine, COMMON + "/ZOR", SECRET)
 
     with Untouched(machine):
@@ -368,7 +368,7 @@ def test_single_user_mode_sets_no_mode_through_links_above_the_logs(machine):
 
 
 def open_home(machine, action):
-    furnish(machine, action)
+    prepare(machine, action)
     machine.give_to(GUEST, HOME)
 
 
@@ -535,7 +535,7 @@ def test_an_installation_that_moved_below_another_users_link_counts_as_not_writa
 
 
 def test_a_link_whose_owner_the_user_namespace_does_not_map_is_refused(machine):
-    furnish(machine, "upgrade")
+    prepare(machine, "upgrade")
     machine.link_as(GUEST, BIN_ETC + "/trawlfs", SECRET)
 
     with Untouched(machine):

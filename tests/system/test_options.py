@@ -124,7 +124,7 @@ def test_an_empty_custom_trace_directory_makes_none(machine):
     )
 
 
-def test_a_per_user_installation_with_a_custom_trace_directory_tells_it_to_the_toolkit(machine):
+def test_a_per_user_installation_configures_a_custom_trace_directory(machine):
     outcome = install(machine, "-c", "/home/ann/trace", user=ANN)
 
     printed_lines(
@@ -242,7 +242,7 @@ def test_an_unreadable_flag_file_counts_as_none(machine):
     assert machine.mode("/home/ann/corvan/zor/bin/etc") == 0o777
 
 
-def test_a_flag_file_that_cannot_be_made_costs_nothing(machine):
+def test_a_flag_file_that_cannot_be_made_is_ignored(machine):
     machine.pack({"config/SingleUserMode/": b""})
 
     outcome = install(machine, "-r")
@@ -431,7 +431,7 @@ scanner control error: -s common_trace_path /usr/kel/corvan/common/ZOR/logs
     )
 
 
-def test_debug_traces_of_the_extraction_go_to_standard_output_in_spite_of_a_log_file(machine):
+def test_debug_traces_of_the_extraction_go_to_standard_output_despite_a_log_file(machine):
     machine.pack(without=LEFT_OUT_OF_THE_TRACED_PACKAGE)
 
     outcome = machine.run("i", "ABC", "-o", "/tmp/log", "-s", SPB, "-v")
@@ -454,7 +454,7 @@ def test_debug_mode_installs_the_same(machine):
 
 
 @pytest.mark.parametrize("options", [("-norollback",), ("-eeo", "-z"), ("-eeo", "-g")])
-def test_options_for_trouble_change_nothing_in_an_installation_that_succeeds(machine, options):
+def test_options_about_failures_change_nothing_in_an_installation_that_succeeds(machine, options):
     install(machine, *options)
 
     same_text(machine.listing("/etc", "/opt", "/usr/kel"), SHARED_TREE)

@@ -392,7 +392,7 @@ Done.
 @pytest.mark.parametrize(
     "without, code", [(("config/Zor.properties",), 2), (("bin/trawlcfg",), 32512)]
 )
-def test_the_code_of_a_failing_private_installation_is_told(machine, without, code):
+def test_the_code_of_a_failing_private_installation_is_printed(machine, without, code):
     machine.pack(without=without)
 
     outcome = machine.run("i", "ABC", "-s", SPB, "-d", PRIVATE, "-p")
@@ -411,7 +411,7 @@ def test_a_failing_trace_path_command_fails_the_private_installation(machine):
     assert machine.exists(PRIVATE + "/bin/trawlcfg")
 
 
-def test_a_failing_private_installation_has_unregistered_the_exploiter_all_the_same(machine):
+def test_a_failing_private_installation_has_unregistered_the_exploiter_anyway(machine):
     install_shared(machine, "ABC:XYZ:")
 
     outcome = machine.run("i", "ABC", "-s", "/no/such.spb", "-d", PRIVATE, "-p")
@@ -507,7 +507,7 @@ Private mode enabled
     same_tree(machine.tree(), before)
 
 
-def test_failing_stop_commands_do_not_keep_the_private_toolkit(machine):
+def test_failing_stop_commands_do_not_prevent_a_private_removal(machine):
     install(machine)
     machine.let_commands_fail(("trawl", 1))
 

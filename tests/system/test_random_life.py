@@ -1,6 +1,6 @@
 """Short lives of two installations on one machine, drawn from seeds.
 
-WZOR_LIVES sets how many lives are lived, WZOR_FIRST_LIFE the first seed, for a longer run:
+For a longer run, WZOR_LIVES sets the number of lives and WZOR_FIRST_LIFE the first seed:
 
     WZORINST=build/release/src/install/standalone/wzorinst WZOR_LIVES=5000 \\
         /usr/bin/python3 -m pytest -q -p no:cacheprovider tests/system/test_random_life.py
@@ -17,7 +17,7 @@ LIVES = int(os.environ.get("WZOR_LIVES", "150"))
 
 
 @pytest.mark.parametrize("seed", range(FIRST, FIRST + LIVES))
-def test_a_life_at_random(binary, seed):
+def test_a_random_life(binary, seed):
     failure = None
     try:
         Life(binary, seed).live(steps=12)

@@ -1,4 +1,4 @@
-"""Removal: who still needs the toolkit, and how it is deleted once nobody does."""
+"""Removal: who still needs the toolkit, and how it is deleted once no one does."""
 
 import pytest
 
@@ -151,7 +151,7 @@ ZOR_ConfigRootDirectory = /opt/corvan/zor
 
 
 @pytest.mark.parametrize("first, second", [("ABC", "XYZ"), ("XYZ", "ABC")])
-def test_the_last_of_two_exploiters_takes_the_toolkit_along(machine, first, second):
+def test_the_last_of_two_exploiters_removes_the_toolkit(machine, first, second):
     install(machine)
     assert machine.run("i", "XYZ", "-s", SPB).status == 0
 
@@ -181,7 +181,7 @@ Done.
 
 
 @pytest.mark.parametrize("exploiters", ["", " ", "::", "XABC:", "ABCX:", "abc:", "A:B:C:"])
-def test_an_exploiter_is_compared_whole(machine, exploiters):
+def test_whole_identifiers_are_compared(machine, exploiters):
     install(machine, exploiters)
     before = machine.tree()
 
@@ -237,7 +237,7 @@ def test_the_identifier_is_cut_out_where_its_text_first_occurs(machine, before, 
     assert f"\nZOR_Exploiters = {after}\n" in machine.read("/etc/zor/zor.ini")
 
 
-def test_an_identifier_without_its_colon_cannot_be_cut_out_and_the_toolkit_goes(machine):
+def test_an_identifier_without_its_colon_cannot_be_cut_out_and_the_toolkit_is_removed(machine):
     install(machine, "XYZ:ABC")
 
     not_printed(remove(machine), "Exploiter list")
@@ -245,7 +245,7 @@ def test_an_identifier_without_its_colon_cannot_be_cut_out_and_the_toolkit_goes(
     same_text(machine.listing("/etc", "/opt", "/usr/kel"), LEFT)
 
 
-def test_a_list_without_a_colon_behind_the_cut_counts_as_empty(machine):
+def test_a_list_without_a_colon_after_the_cut_counts_as_empty(machine):
     install(machine, "ABC:XYZ")
 
     printed_lines(
@@ -318,7 +318,7 @@ def test_a_removal_stops_the_scanners(machine):
     )
 
 
-def test_failing_stop_commands_do_not_keep_the_toolkit(machine):
+def test_failing_stop_commands_do_not_prevent_a_removal(machine):
     install(machine)
     machine.let_commands_fail(("trawl", 1))
 
@@ -411,7 +411,7 @@ def test_a_removal_in_a_home_with_a_blank_is_complete(machine):
     assert not machine.exists("/opt/my zor")
 
 
-def test_an_index_file_is_deleted_without_a_word(machine):
+def test_an_index_file_is_deleted_silently(machine):
     install(machine)
 
     not_printed(remove(machine), "ZOR_files\nRM")
@@ -435,7 +435,7 @@ def test_the_installers_own_files_are_deleted(machine):
     assert not machine.exists(HOME)
 
 
-def test_every_path_of_the_index_is_deleted_wherever_it_lies(machine):
+def test_every_path_of_the_index_is_deleted_wherever_it_is(machine):
     install(machine)
     machine.plant("/opt/elsewhere/file ", "x")
     machine.plant("/opt/elsewhere/file", "kept")
@@ -469,7 +469,7 @@ def test_a_listed_directory_is_not_deleted_as_a_file(machine):
     assert machine.exists("/opt/elsewhere")
 
 
-def test_a_line_longer_than_1023_bytes_is_taken_in_pieces(machine):
+def test_a_line_longer_than_1023_bytes_is_split_into_pieces(machine):
     install(machine)
     machine.plant("/tmp/victim", "x")
     machine.plant(HOME + "/ZOR_files", "~" * 1023 + "victim\n")
@@ -695,7 +695,7 @@ def test_an_added_directory_stays_where_only_files_are_deleted(machine, prepare,
 
 
 @ORDERS
-def test_files_beside_a_directory_that_stays_are_deleted(machine, prepare):
+def test_files_next_to_a_directory_that_stays_are_deleted(machine, prepare):
     install(machine)
     prepare(machine)
     machine.plant(HOME + "/logs/deep/mine", "mine")
@@ -933,7 +933,7 @@ def test_other_products_in_the_common_directory_are_left_alone(machine):
     assert machine.read("/usr/kel/corvan/common/file") == "kept"
 
 
-def test_a_missing_common_directory_is_no_trouble(machine):
+def test_a_missing_common_directory_is_ignored(machine):
     install(machine)
     machine.remove("/usr/kel")
 
@@ -945,7 +945,7 @@ def test_a_missing_common_directory_is_no_trouble(machine):
     )
 
 
-def test_a_common_directory_of_the_administrators_choice_is_cleaned(machine):
+def test_a_common_directory_that_the_administrator_chose_is_cleaned(machine):
     machine.plant("/etc/kel/corvan/common/cfg/log.properties", "corvan_common_dir=/srv/c\n")
     install(machine)
     machine.make_directory("/usr/kel/corvan/common/ZOR/logs")
@@ -967,9 +967,9 @@ def test_a_removal_does_not_write_the_setting_of_the_common_directory(machine):
     assert not machine.exists("/etc/kel")
 
 
-def test_a_registry_directory_that_is_not_empty_is_told_as_removed_all_the_same(machine):
+def test_a_registry_directory_that_is_not_empty_is_reported_as_removed_anyway(machine):
     install(machine)
-    machine.plant("/etc/zor/foreign", "kept")
+    machine.plant("/etc/zor/other", "kept")
 
     printed_lines(
         remove(machine),
@@ -978,7 +978,7 @@ def test_a_registry_directory_that_is_not_empty_is_told_as_removed_all_the_same(
         "Uninstallation successful, removing temporary files",
     )
 
-    assert machine.read("/etc/zor/foreign") == "kept"
+    assert machine.read("/etc/zor/other") == "kept"
     assert not machine.exists("/etc/zor/zor.ini")
 
 

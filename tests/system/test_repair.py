@@ -174,7 +174,7 @@ def test_a_repair_empties_the_cache(machine):
     assert not machine.exists(HOME + "/cache_data")
 
 
-def test_a_repair_cannot_do_without_the_settings_file(machine):
+def test_a_repair_needs_the_settings_file(machine):
     break_installation(machine)
     machine.remove(HOME + "/config/Zor.properties")
     before = machine.tree()

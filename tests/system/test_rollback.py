@@ -91,7 +91,7 @@ def test_a_missing_package_leaves_an_index_that_was_there(machine):
 
 
 @pytest.mark.parametrize(
-    "empty, told",
+    "empty, message",
     [
         ("bin/empty", "Bin dir file extraction failed\n"),
         ("properties/empty", ""),
@@ -100,7 +100,7 @@ def test_a_missing_package_leaves_an_index_that_was_there(machine):
         ("install/empty", "Extracting configs to '/opt/corvan/zor/config'\n"),
     ],
 )
-def test_an_empty_file_of_the_package_cannot_be_extracted(machine, empty, told):
+def test_an_empty_file_of_the_package_cannot_be_extracted(machine, empty, message):
     machine.pack({empty: b""})
     before = machine.tree()
 
@@ -109,7 +109,7 @@ def test_an_empty_file_of_the_package_cannot_be_extracted(machine, empty, told):
     printed(
         outcome,
         PREFIX
-        + told
+        + message
         + "File extraction failed, error = 1 (Cannot open file for reading)\n"
         + NO_SELINUX
         + FAILED,
@@ -510,7 +510,7 @@ def test_a_full_disk_under_the_registry_fails_the_installation(machine):
     )
 
 
-def test_an_unsound_registry_comes_back(machine):
+def test_an_invalid_registry_comes_back(machine):
     machine.plant("/etc/zor/zor.ini", "ZOR_Version = 2.x\n", 0o600)
     machine.let_commands_fail(("common_trace_path", 1))
     before = machine.tree()

@@ -35,7 +35,7 @@ def test_a_failing_stop_command_does_not_keep_the_later_ones_from_running(
     same_lines(install(machine, *options).commands, STOP_COMMANDS + [START_COMMAND])
 
 
-def test_a_missing_file_system_scanner_shows_as_the_shells_status(machine):
+def test_a_missing_file_system_scanner_gives_the_shells_status(machine):
     install(machine)
     machine.remove(HOME + "/bin/trawlfs")
 
@@ -116,7 +116,7 @@ def test_the_programs_of_a_per_user_installation_are_its_own(machine):
     )
 
 
-def test_a_failing_restart_is_not_told_when_it_succeeds(machine):
+def test_a_restart_that_succeeds_is_not_reported(machine):
     install(machine)
 
     not_printed(install(machine), "could not restart")

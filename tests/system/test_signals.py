@@ -89,7 +89,7 @@ def install(machine, **how):
 
 
 def arguments_of_commands(machine):
-    """What the scanner programs were told, from the first to the last."""
+    """The arguments of the calls of the scanner programs, from the first to the last."""
     return [line.partition(" ")[2] for line in machine.logged_commands()]
 
 
@@ -151,13 +151,13 @@ def test_the_scanners_are_enabled_again_after_a_signal(sending, name):
     _, ended = run(sending, "i", "ABC", "-s", SPB)
 
     assert ended == died_of(name)
-    told = arguments_of_commands(sending)[commands:]
-    assert told[:3] == [
+    calls = arguments_of_commands(sending)[commands:]
+    assert calls[:3] == [
         "[-shutdown]",
         "[-disable] [all]",
         "[-shutdown] [all] [-timeout] [60] [-force]",
     ]
-    assert told[-1] == "[-enable] [all]"
+    assert calls[-1] == "[-enable] [all]"
 
 
 @pytest.mark.parametrize("name", SIGNALS)
@@ -292,7 +292,7 @@ def test_the_first_of_several_signals_counts(sending):
     rolled_back(sending, before, FILE_INDEX, INSTALL_TYPE_FILE, COMMON_SETTING)
 
 
-def test_signals_during_the_way_back_do_not_stop_it(sending):
+def test_signals_during_the_rollback_do_not_stop_it(sending):
     """The restart of the scanners comes after the stop, before the rollback."""
     install(sending)
     before = sending.tree()

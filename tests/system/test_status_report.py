@@ -145,7 +145,7 @@ def test_the_home_directory_is_not_verified(machine):
     printed_lines(machine.run("t"), "Install dir = /no/such/home")
 
 
-def test_an_empty_exploiter_list_prints_nothing_behind_its_name(machine):
+def test_an_empty_exploiter_list_prints_nothing_after_its_name(machine):
     machine.plant("/etc/zor/zor.ini", "ZOR_Version=1\nZOR_Exploiters=\nZOR_HomeDirectory=/x\n")
 
     printed_lines(machine.run("t"), "Install version = 1.0.0.0000", "Exploiter list = ")
@@ -205,7 +205,7 @@ def test_a_setting_file_without_the_key_gives_the_default_common_directory(machi
     printed_lines(machine.run("t"), "Corvan common dir = /usr/kel/corvan/common")
 
 
-def test_a_common_directory_with_an_equals_sign_is_kept_whole(machine):
+def test_a_common_directory_with_an_equals_sign_is_kept_completely(machine):
     machine.plant(COMMON_SETTING, "corvan_common_dir=/srv/a=b\n")
 
     printed_lines(machine.run("t"), "Corvan common dir = /srv/a=b")

@@ -66,7 +66,7 @@ def test_a_script_without_a_last_newline_gets_one(machine, script):
 
 
 @SCRIPTS
-def test_a_script_keeps_carriage_returns_empty_lines_and_odd_bytes(machine, script):
+def test_a_script_keeps_carriage_returns_empty_lines_and_unusual_bytes(machine, script):
     same_text(installed(machine, script, b"a\r\n\n\n\x00b\xff \n"), "a\r\n\n\n\x00b\udcff \n")
 
 
@@ -162,7 +162,7 @@ def test_a_dangling_link_counts_as_a_missing_script(machine):
     assert not machine.exists("/nowhere")
 
 
-def test_a_script_that_cannot_be_read_costs_nothing(machine):
+def test_a_script_that_cannot_be_read_is_ignored(machine):
     machine.pack(without=("install/trawlcfg.sh",))
     machine.plant("/home/ann/corvan/zor/install/trawlcfg.sh", "$(ZOR_DestinationDir)\n", 0)
 
@@ -180,7 +180,7 @@ Updating file with variables /home/ann/corvan/zor/install/rmdirs.sh
     )
 
 
-def test_a_script_that_cannot_be_written_costs_nothing(machine):
+def test_a_script_that_cannot_be_written_is_ignored(machine):
     machine.pack(without=("install/trawlcfg.sh",))
     machine.plant("/home/ann/corvan/zor/install/trawlcfg.sh", "$(ZOR_DestinationDir)\n", 0o400)
 
@@ -199,7 +199,7 @@ Updating file with variables /home/ann/corvan/zor/install/rmdirs.sh
     assert machine.read("/home/ann/corvan/zor/install/trawlcfg.sh") == "$(ZOR_DestinationDir)\n"
 
 
-def test_a_directory_in_place_of_a_script_costs_nothing(machine):
+def test_a_directory_in_place_of_a_script_is_ignored(machine):
     machine.pack({"install/trawlcfg.sh/": b""}, without=("install/trawlcfg.sh",))
 
     outcome = machine.run("i", "ABC", "-s", SPB)

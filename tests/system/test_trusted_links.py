@@ -7,7 +7,7 @@ import os
 
 import pytest
 
-from harness.attacks import COMMON, HOME, ends, furnish, install, refused_modes
+from harness.attacks import COMMON, HOME, ends, install, prepare, refused_modes
 from harness.checks import printed_lines, same_text
 from harness.installations import SHARED_TRANSCRIPT
 from harness.machine import ANN as HER  # may change her own places only
@@ -34,7 +34,7 @@ def target_of(machine, path):
 
 
 @pytest.mark.parametrize("link", [HOME, "/opt/corvan"])
-def test_the_toolkit_lives_behind_a_link(machine, link):
+def test_the_toolkit_may_be_installed_through_a_link(machine, link):
     machine.link(link, BIG)
 
     outcome = machine.run("i", "ABC", "-s", SPB)
@@ -69,9 +69,9 @@ def test_a_loop_of_links_is_an_error(machine):
 
 
 @pytest.mark.parametrize("action", ["upgrade", "registration"])
-def test_an_installation_behind_a_link_goes_on(machine, action):
+def test_an_installation_through_a_link_is_upgraded_or_registered(machine, action):
     machine.link(HOME, BIG)
-    furnish(machine, action)
+    prepare(machine, action)
 
     outcome = machine.run("i", "XYZ", "-s", SPB)
 
@@ -81,19 +81,19 @@ def test_an_installation_behind_a_link_goes_on(machine, action):
     assert not machine.exists(BIG + "/$_ZOR_$")
 
 
-def test_an_installation_behind_a_link_is_removed(machine):
+def test_an_installation_through_a_link_is_removed(machine):
     machine.link(HOME, BIG)
     install(machine)
 
     outcome = machine.run("r", "ABC")
 
     ends(outcome, 0)
-    # rmdir does not follow links: the empty directory behind it is left.
+    # rmdir does not follow links: its empty target is left.
     assert target_of(machine, HOME) == BIG
     assert os.listdir(machine.at(BIG)) == []
 
 
-def test_users_may_keep_their_installation_behind_a_link_of_their_own(machine):
+def test_users_may_install_through_a_link_of_their_own(machine):
     machine.make_directory("/home/ann/disk")
     machine.link("/home/ann/corvan", "disk")
 
@@ -106,8 +106,8 @@ def test_users_may_keep_their_installation_behind_a_link_of_their_own(machine):
 # Directories of the installation.
 
 
-def test_modes_are_set_behind_links(machine):
-    furnish(machine, "registration")
+def test_modes_are_set_through_links(machine):
+    prepare(machine, "registration")
     for name in ("cache_data", "logs", "bin/etc/trawlfs", "bin/plugins"):
         if machine.exists(f"{HOME}/{name}"):
             machine.remove(f"{HOME}/{name}")
@@ -124,8 +124,8 @@ def test_modes_are_set_behind_links(machine):
     assert machine.mode(BIG + "/bin/plugins") == 0o755
 
 
-def test_modes_behind_dangling_links_are_skipped(machine):
-    furnish(machine, "registration")
+def test_modes_of_dangling_links_are_skipped(machine):
+    prepare(machine, "registration")
     machine.link(HOME + "/logs", "/srv/missing")
 
     outcome = machine.run("i", "XYZ", "-s", SPB)
@@ -136,13 +136,13 @@ def test_modes_behind_dangling_links_are_skipped(machine):
 
 
 def cache_behind_a_link(machine, action):
-    furnish(machine, action)
+    prepare(machine, action)
     machine.remove(HOME + "/cache_data")
     machine.plant(BIG + "/cache/deep/old.cache", "stale\n")
     machine.link(HOME + "/cache_data", BIG + "/cache")
 
 
-def test_an_upgrade_empties_the_cache_behind_a_link(machine):
+def test_an_upgrade_empties_a_linked_cache(machine):
     cache_behind_a_link(machine, "upgrade")
 
     outcome = machine.run("i", "XYZ", "-s", SPB)
@@ -155,7 +155,7 @@ def test_an_upgrade_empties_the_cache_behind_a_link(machine):
     assert os.listdir(machine.at(BIG + "/cache")) == []
 
 
-def test_a_removal_empties_the_cache_and_the_logs_behind_links(machine):
+def test_a_removal_empties_a_linked_cache_and_linked_logs(machine):
     cache_behind_a_link(machine, "removal")
     machine.plant(BIG + "/logs/scan.log", "log\n")
     machine.link(HOME + "/logs", BIG + "/logs")
@@ -170,7 +170,7 @@ def test_a_removal_empties_the_cache_and_the_logs_behind_links(machine):
 
 
 def test_links_within_a_cache_are_deleted_and_not_followed(machine):
-    furnish(machine, "upgrade")
+    prepare(machine, "upgrade")
     machine.plant(BIG + "/kept", "kept\n")
     machine.link(HOME + "/cache_data/link", BIG)
 
@@ -185,7 +185,7 @@ def test_links_within_a_cache_are_deleted_and_not_followed(machine):
 
 
 @pytest.mark.parametrize("link", ["/usr/kel", "/usr/kel/corvan", COMMON, COMMON + "/ZOR"])
-def test_the_common_directory_may_be_behind_a_link(machine, link):
+def test_the_common_directory_may_be_a_link(machine, link):
     machine.link(link, BIG)
 
     outcome = machine.run("i", "ABC", "-s", SPB)
@@ -210,7 +210,7 @@ def test_a_dangling_link_above_the_logs_is_an_ignored_error(machine):
     assert not machine.exists("/srv/missing")
 
 
-def test_a_removal_empties_the_common_logs_behind_a_link(machine):
+def test_a_removal_empties_linked_common_logs(machine):
     machine.link(COMMON + "/ZOR", BIG)
     install(machine)
     machine.plant(BIG + "/logs/scan.log", "log\n")
@@ -239,7 +239,7 @@ def test_the_setting_of_the_common_directory_may_be_a_link(machine):
 
 
 def test_a_registry_that_is_a_link_stays_one(machine):
-    furnish(machine, "registration")
+    prepare(machine, "registration")
     os.rename(machine.at("/etc/zor/zor.ini"), machine.at("/srv/registry"))
     machine.link("/etc/zor/zor.ini", "../../srv/registry")
 
@@ -253,7 +253,7 @@ def test_a_registry_that_is_a_link_stays_one(machine):
 
 
 def test_settings_that_are_a_link_stay_one(machine):
-    furnish(machine, "upgrade")
+    prepare(machine, "upgrade")
     path = HOME + "/config/Zor.properties"
     os.rename(machine.at(path), machine.at("/srv/settings"))
     machine.link(path, "/srv/settings")
@@ -267,7 +267,7 @@ def test_settings_that_are_a_link_stay_one(machine):
 
 
 def test_a_file_of_the_package_takes_the_place_of_a_link(machine):
-    furnish(machine, "upgrade")
+    prepare(machine, "upgrade")
     machine.plant("/srv/own", "own\n")
     machine.remove(HOME + "/bin/trawlhw")
     machine.link(HOME + "/bin/trawlhw", "/srv/own")
@@ -280,7 +280,7 @@ def test_a_file_of_the_package_takes_the_place_of_a_link(machine):
 
 
 def test_a_file_of_the_package_is_written_through_a_dangling_link(machine):
-    furnish(machine, "upgrade")
+    prepare(machine, "upgrade")
     machine.remove(HOME + "/bin/trawlhw")
     machine.link(HOME + "/bin/trawlhw", "/srv/new")
 
@@ -292,7 +292,7 @@ def test_a_file_of_the_package_is_written_through_a_dangling_link(machine):
 
 
 def test_hard_links_of_the_administrator_get_their_modes(machine):
-    furnish(machine, "registration")
+    prepare(machine, "registration")
     path = HOME + "/config/ZorHWConfig.xml"
     os.link(machine.at(path), machine.at("/srv/second"))
     machine.change_mode(path, 0o600)
@@ -326,7 +326,7 @@ def test_the_log_goes_to_standard_error_by_its_name(machine):
     same_text(outcome.stderr, SHARED_TRANSCRIPT)
 
 
-def test_the_log_goes_into_a_pipe_behind_a_descriptor(machine):
+def test_the_log_goes_into_the_pipe_of_a_descriptor(machine):
     outcome = log_of(machine, "/dev/fd/7", script='{ "$0" "$@" 7>&1 >/tmp/out; } | cat')
 
     same_text(outcome.stdout, SHARED_TRANSCRIPT)

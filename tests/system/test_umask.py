@@ -1,4 +1,4 @@
-"""The process umask has no say in what an installation leaves behind."""
+"""The process umask does not affect what an installation leaves behind."""
 
 import pytest
 

@@ -304,7 +304,7 @@ def test_an_upgrade_deletes_the_obsolete_files(machine):
         "libxerces-c.so.26",
     ],
 )
-def test_of_the_obsolete_files_only_those_that_exist_are_told(machine, name):
+def test_of_the_obsolete_files_only_those_that_exist_are_logged(machine, name):
     install_older(machine)
     machine.plant(f"{HOME}/bin/{name}", "obsolete")
 
@@ -380,7 +380,7 @@ def test_over_a_newer_build_only_the_exploiter_is_registered(machine, version, d
     assert "\nZOR_Exploiters = OLD:ABC:\n" in machine.read("/etc/zor/zor.ini")
 
 
-def test_a_build_date_that_is_not_year_first_is_compared_as_it_stands(machine):
+def test_a_build_date_that_is_not_year_first_is_compared_unchanged(machine):
     # 31 December 2022, day first: 311222 is more than 221202.
     install_older(machine, "9.2.30.0000", "31/12/22")
 
@@ -467,7 +467,7 @@ def test_a_newer_installation_of_an_older_date_takes_the_date(machine):
     )
 
 
-def test_a_newer_date_alone_is_reason_to_save_the_registry(machine):
+def test_a_newer_date_alone_saves_the_registry(machine):
     install_older(machine, "10.0.0.0000", "20/01/01")
 
     printed_lines(
@@ -545,7 +545,7 @@ def test_without_registration_the_exploiter_is_not_added(machine):
     assert "\nZOR_Exploiters = OLD:\n" in machine.read("/etc/zor/zor.ini")
 
 
-def test_a_skipped_registration_is_not_told_for_a_registered_exploiter(machine):
+def test_a_skipped_registration_is_not_logged_for_a_registered_exploiter(machine):
     install_older(machine)
 
     not_printed(upgrade(machine, "-n", exploiter="OLD"), "registration skipped")
@@ -576,7 +576,7 @@ def test_an_exploiter_joins_a_list_of_one_colon(machine):
 
 
 def settings_after_upgrade(machine, settings):
-    """What becomes of the text `settings` in the installed Zor.properties."""
+    """The installed Zor.properties after an upgrade of one that holds `settings`."""
     install_older(machine)
     machine.plant(MAIN, settings)
     upgrade(machine)
@@ -694,7 +694,7 @@ def test_the_property_file_keeps_carriage_returns_and_comments(machine):
 
 
 def traces_after_upgrade(machine, settings, traces):
-    """What an upgrade makes of the package's text `traces` with the installed `settings`."""
+    """The package's trace properties `traces` after an upgrade that keeps `settings`."""
     install_older(machine)
     machine.plant(MAIN, settings)
     machine.pack({"config/ZorTrace.properties": traces.encode()})
@@ -1026,7 +1026,7 @@ def test_the_cache_is_emptied_by_an_upgrade(machine):
     assert not machine.exists(HOME + "/cache_data")
 
 
-def test_the_index_keeps_files_that_newer_packages_no_longer_carry(machine):
+def test_the_index_keeps_files_that_newer_packages_no_longer_contain(machine):
     machine.pack({"bin/gone": b"1"})
     install_older(machine)
     machine.pack()
@@ -1062,7 +1062,7 @@ def test_an_upgrade_leaves_the_install_type_as_it_was(machine):
     )
 
 
-def test_failing_stop_commands_cost_nothing(machine):
+def test_failing_stop_commands_are_ignored(machine):
     install_older(machine)
     machine.let_commands_fail(("-shutdown", 3), ("-disable", 4))
 
@@ -1080,7 +1080,7 @@ def test_failing_stop_commands_cost_nothing(machine):
     )
 
 
-def test_a_failing_restart_is_told_and_costs_nothing(machine):
+def test_a_failing_restart_is_reported_and_ignored(machine):
     install_older(machine)
     machine.let_commands_fail(("-enable", 9))
 

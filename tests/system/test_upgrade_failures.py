@@ -77,7 +77,7 @@ def fail(machine, *options, **how):
     return outcome
 
 
-def test_a_missing_package_is_told_after_the_properties_are_gone(machine):
+def test_a_missing_package_is_reported_after_the_properties_are_deleted(machine):
     install_older(machine)
     machine.remove(SPB)
     before = machine.tree()
@@ -94,14 +94,14 @@ def test_a_missing_package_is_told_after_the_properties_are_gone(machine):
 
 
 @pytest.mark.parametrize(
-    "empty, told",
+    "empty, message",
     [
         ("bin/empty", "Bin dir file extraction failed\n"),
         ("properties/empty", ""),
         ("config/empty", "Extracting configs to '/opt/corvan/zor/config'\n"),
     ],
 )
-def test_a_failed_extraction_brings_back_the_replaced_files(machine, empty, told):
+def test_a_failed_extraction_brings_back_the_replaced_files(machine, empty, message):
     install_older(machine)
     machine.pack({empty: b""})
     before = machine.tree()
@@ -111,7 +111,7 @@ def test_a_failed_extraction_brings_back_the_replaced_files(machine, empty, told
     printed(
         outcome,
         UP_TO_EXTRACTION
-        + told
+        + message
         + "File extraction failed, error = 1 (Cannot open file for reading)\n"
         "File extraction failed\n" + RESTARTED_AND_FAILED,
         status=1,
@@ -120,7 +120,7 @@ def test_a_failed_extraction_brings_back_the_replaced_files(machine, empty, told
     assert not machine.exists(HOME + "/ZOR_files")
 
 
-def test_a_failure_in_the_last_directory_costs_the_xss_files(machine):
+def test_a_failure_in_the_last_directory_loses_the_xss_files(machine):
     install_older(machine)
     machine.pack({"install/empty": b""})
     before = machine.tree()
@@ -182,7 +182,7 @@ def test_the_scanners_are_started_again_before_the_rollback(machine):
     )
 
 
-def test_a_failing_restart_after_a_failure_is_told(machine):
+def test_a_failing_restart_after_a_failure_is_reported(machine):
     install_older(machine)
     machine.remove(SPB)
     machine.let_commands_fail(("-enable", 1))
@@ -338,7 +338,7 @@ def test_a_full_disk_under_the_backup_of_the_registry_fails_the_upgrade(machine)
     )
 
 
-def test_a_registry_that_cannot_be_written_whole_comes_back(machine):
+def test_a_registry_that_cannot_be_written_completely_comes_back(machine):
     install_older(machine)
     machine.register(version="10.0.0.0000", exploiters="OLD:")
     machine.change_mode("/etc/zor/zor.ini", 0o640)
@@ -379,7 +379,7 @@ def test_a_registration_only_that_cannot_save_the_registry_fails(machine):
     same_tree(machine.tree(), before)
 
 
-def test_a_script_that_the_package_does_not_carry_stays_filled_in(machine):
+def test_a_script_that_the_package_does_not_contain_stays_filled_in(machine):
     install_older(machine)
     machine.pack(without=("install/trawlcfg.sh",))
     machine.plant(HOME + "/install/trawlcfg.sh", "older $(ZOR_DestinationDir)\n", 0o700)
@@ -418,7 +418,7 @@ def test_the_single_user_flag_is_made_after_a_failure_too(machine):
     assert machine.index(HOME).endswith("\n/opt/corvan/zor/config/SingleUserMode\n")
 
 
-def test_without_rollback_the_replaced_files_stay_beside_the_new_ones(machine):
+def test_without_rollback_the_replaced_files_stay_next_to_the_new_ones(machine):
     install_older(machine)
     machine.make_directory("/etc/zor/zor.ini.bak")
 

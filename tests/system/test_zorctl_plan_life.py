@@ -1,6 +1,6 @@
 """Short lives at random in which every plan is compared with what then happens.
 
-WZOR_LIVES sets how many lives are lived, WZOR_FIRST_LIFE the first seed.
+WZOR_LIVES sets the number of lives, WZOR_FIRST_LIFE the first seed.
 """
 
 import os

@@ -60,7 +60,7 @@ protected:
     std::string errors;
 };
 
-TEST_F(CommandLineTest, TheUsageGoesToStandardOutputAndIs1)
+TEST_F(CommandLineTest, TheUsageGoesToStandardOutputAndReturns1)
 {
     testing::internal::CaptureStdout();
     const int code = printUsage();
@@ -237,7 +237,7 @@ TEST_F(CommandLineTest, OMayRedirectAgain)
     EXPECT_EQ("Target directory: /b\n", readFile(dir / "b"));
 }
 
-TEST_F(CommandLineTest, ALogThatCannotBeOpenedSwallowsWhatFollows)
+TEST_F(CommandLineTest, ALogThatCannotBeOpenedLosesWhatFollows)
 {
     EXPECT_EQ(0, parse({"r", "ABC", "-o", (dir / "missing/log").c_str(), "-d", "/opt/x"}));
 
@@ -261,7 +261,7 @@ TEST_F(CommandLineTest, NSkipsTheRegistration)
     EXPECT_TRUE(skipExploiterRegistration);
 }
 
-TEST_F(CommandLineTest, RIsSingleUserMode)
+TEST_F(CommandLineTest, RTurnsSingleUserModeOn)
 {
     EXPECT_EQ(0, parse({"r", "ABC", "-r"}));
 
@@ -274,7 +274,7 @@ TEST_F(CommandLineTest, RIsSingleUserMode)
     EXPECT_TRUE(applySingleUserMode);
 }
 
-TEST_F(CommandLineTest, PIsPrivateModeWithTheActionOfTheRun)
+TEST_F(CommandLineTest, PTurnsPrivateModeOnWithTheActionOfTheRun)
 {
     EXPECT_EQ(0, parse({"r", "ABC", "-p", "-d", "/opt/x"}));
 
@@ -290,7 +290,7 @@ TEST_F(CommandLineTest, PNeedsATarget)
     EXPECT_EQ("", output + log.text());
 }
 
-TEST_F(CommandLineTest, ThePrivatePathIsMissedBeforeThePackage)
+TEST_F(CommandLineTest, AMissingPrivatePathIsReportedBeforeAMissingPackage)
 {
     EXPECT_EQ(1, parse({"i", "ABC", "-p"}));
 
@@ -298,14 +298,14 @@ TEST_F(CommandLineTest, ThePrivatePathIsMissedBeforeThePackage)
     EXPECT_EQ("", output + log.text());
 }
 
-TEST_F(CommandLineTest, VIsDebugMode)
+TEST_F(CommandLineTest, VTurnsDebugModeOn)
 {
     EXPECT_EQ(0, parse({"r", "ABC", "-v"}));
 
     EXPECT_TRUE(debugMode);
 }
 
-TEST_F(CommandLineTest, NorollbackIsAnOptionOfManyLetters)
+TEST_F(CommandLineTest, NorollbackIsALongOption)
 {
     EXPECT_EQ(0, parse({"r", "ABC", "-norollback"}));
 
@@ -320,7 +320,7 @@ TEST_F(CommandLineTest, LAndGAndZAreHiddenUntilEeo)
     expectUsageError({"r", "ABC", "-z"}, "Invalid option: -z\n");
 }
 
-TEST_F(CommandLineTest, LIsAPerUserInstallation)
+TEST_F(CommandLineTest, LChoosesAPerUserInstallation)
 {
     EXPECT_EQ(0, parse({"r", "ABC", "-eeo", "-l"}));
 
@@ -328,7 +328,7 @@ TEST_F(CommandLineTest, LIsAPerUserInstallation)
     EXPECT_EQ("", log.text());
 }
 
-TEST_F(CommandLineTest, GIsASharedInstallation)
+TEST_F(CommandLineTest, GChoosesASharedInstallation)
 {
     localInstall = true;
 
@@ -354,7 +354,7 @@ TEST_F(CommandLineTest, TheLastOfTwoInstallTypesWinsWithAWarning)
               log.text());
 }
 
-TEST_F(CommandLineTest, OtherOptionsWorkBehindEeo)
+TEST_F(CommandLineTest, OtherOptionsWorkAfterEeo)
 {
     EXPECT_EQ(0, parse({"i", "ABC", "-eeo", "-s", "x.spb", "-n", "-eeo", "-v"}));
 
@@ -377,7 +377,7 @@ TEST_F(CommandLineTest, TheFirstWrongOptionEndsTheParse)
     EXPECT_FALSE(debugMode);
 }
 
-TEST_F(CommandLineTest, AnOptionMayMissItsArgument)
+TEST_F(CommandLineTest, AnOptionWithoutItsArgumentIsAnError)
 {
     for (const char* const option : {"-d", "-f", "-s", "-o", "-c"})
         expectUsageError({"i", "ABC", option},

@@ -21,7 +21,7 @@ bool isNull(int fd)
            status.st_rdev == null.st_rdev;
 }
 
-TEST(DescriptorsTest, ClosedStandardDescriptorsAreOpenedOnNull)
+TEST(DescriptorsTest, ClosedStandardDescriptorsAreOpenedOnDevNull)
 {
     EXPECT_TRUE(passesInChild([] {
         (void)close(0);

@@ -13,7 +13,7 @@ namespace {
 
 const std::string Home = "/opt/corvan/zor";
 
-/// The record of "/etc/zor/zor.ini", with a valid installation behind it where a test says so.
+/// The record of "/etc/zor/zor.ini", with a valid installation where a test says so.
 class DiscoveryTest : public MachineTest {
 protected:
     DiscoveryTest()
@@ -73,7 +73,7 @@ TEST_F(DiscoveryTest, WithoutARegistryTheDestinationIsInstalledAfresh)
               log.text());
 }
 
-TEST_F(DiscoveryTest, ADestinationThatExistsIsSeen)
+TEST_F(DiscoveryTest, AnExistingDestinationIsDetected)
 {
     commandLine.destDir = dir.path();
 

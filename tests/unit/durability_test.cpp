@@ -30,7 +30,7 @@ TEST_F(DurabilityTest, AFileSystemThatCannotWriteIsCode5)
     }
 }
 
-TEST_F(DurabilityTest, AFileSystemThatHasNoSyncIsNoFailure)
+TEST_F(DurabilityTest, AFileSystemWithoutSyncIsNotAFailure)
 {
     EXPECT_TRUE(passesInChild([&] {
         failSystemCall(SYS_syncfs, ENOSYS);

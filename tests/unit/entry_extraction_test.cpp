@@ -72,7 +72,7 @@ TEST_F(ExtractFileTest, OverwritesInPlaceInATransactionWithoutBackups)
     EXPECT_EQ("2 " + dir / "file" + "\n", journalText(transaction));
 }
 
-TEST_F(ExtractFileTest, AnArchiveThatAnEntryReplacesIsReadAnew)
+TEST_F(ExtractFileTest, AnArchiveThatAnEntryReplacesIsReadAgain)
 {
     const std::string path = dir / "package.spb";
     writeFile(path, zipBytes({{storedItem("a", "first"), storedItem("b", "replacing"),
@@ -114,7 +114,7 @@ TEST_F(ExtractFileTest, Mode0LeavesThePermissionsOfTheCreation)
     EXPECT_EQ(0640U, modeOf(dir / "file"));
 }
 
-TEST_F(ExtractFileTest, AModeThatCannotBeSetIsNoFailure)
+TEST_F(ExtractFileTest, AModeThatCannotBeSetIsNotAFailure)
 {
     EXPECT_TRUE(passesInChild([&] {
         failSystemCall(SYS_fchmod, EPERM);

@@ -104,7 +104,7 @@ TEST_F(ExtractEntriesTest, EverythingIsJournalledInTheOrderOfTheArchive)
               journalText(transaction));
 }
 
-TEST_F(ExtractEntriesTest, PassesOverOtherNamesWithoutAWord)
+TEST_F(ExtractEntriesTest, SkipsOtherNamesSilently)
 {
     makeDirectories(dir / "to");
 
@@ -134,7 +134,7 @@ TEST_F(ExtractEntriesTest, ADestinationOfOneCharacterIsSkipped)
     EXPECT_TRUE(transaction.journal.empty());
 }
 
-TEST_F(ExtractEntriesTest, NamesOfTheSkipListArePassedOver)
+TEST_F(ExtractEntriesTest, NamesOnTheSkipListAreSkipped)
 {
     makeDirectories(dir / "to");
     std::string skipList;
@@ -441,11 +441,11 @@ TEST_F(ExtractPackageTest, TheInstallersUmaskIsInForceAndThePreviousOneRestored)
     EXPECT_EQ(077U, umask(022));
 }
 
-TEST_F(ExtractPackageTest, AMissingOrEmptyOrForeignPackageIsCode1AndChangesNothing)
+TEST_F(ExtractPackageTest, AMissingOrEmptyOrInvalidPackageIsCode1AndChangesNothing)
 {
     writeFile(dir / "empty.spb", zipBytes({}));
-    writeFile(dir / "foreign.spb", "no archive");
-    for (const char* const name : {"missing.spb", "empty.spb", "foreign.spb"})
+    writeFile(dir / "invalid.spb", "no archive");
+    for (const char* const name : {"missing.spb", "empty.spb", "invalid.spb"})
         EXPECT_EQ(1, extractPackage(dir / name, transaction, installation, true, &indexPath))
             << name;
 
@@ -456,7 +456,7 @@ TEST_F(ExtractPackageTest, AMissingOrEmptyOrForeignPackageIsCode1AndChangesNothi
     EXPECT_FALSE(pathExists(home));
 }
 
-TEST_F(ExtractPackageTest, AnIndexSurvivesAPackageThatIsNotThere)
+TEST_F(ExtractPackageTest, AMissingPackageLeavesTheIndex)
 {
     makeDirectories(dir / "index");
     writeFile(indexPath, "/of/an/earlier/installation\n");
@@ -507,7 +507,7 @@ TEST_F(ExtractPackageTest, WithoutAnIndexPathNoIndexIsWritten)
     EXPECT_TRUE(pathExists(home + "/bin/trawlcfg"));
 }
 
-TEST_F(ExtractPackageTest, AnIndexThatCannotBeOpenedCostsAWarningOnly)
+TEST_F(ExtractPackageTest, AnIndexThatCannotBeOpenedOnlyCausesAWarning)
 {
     makeDirectories(indexPath);
 
@@ -528,7 +528,7 @@ TEST_F(ExtractPackageTest, TheDirectoriesOfTheIndexAreJournalledAndTheIndexItsel
               journalText(transaction));
 }
 
-TEST_F(ExtractPackageTest, AFailureInBinHasALineOfItsOwn)
+TEST_F(ExtractPackageTest, AFailureInBinIsLoggedSeparately)
 {
     EXPECT_EQ(1, extract({{"bin/", ""}, {"bin/empty", ""}, {"properties/", ""}}));
 

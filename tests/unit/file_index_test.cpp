@@ -23,7 +23,7 @@ const std::string HeaderStart = "# File created by ZOR: 22/12/02zor_9.2.30.0000 
 
 class FileIndexTest : public InstallerTest {
 protected:
-    /// The lines behind the header of the index at `index`, whose header must be sound.
+    /// The lines after the header of the index at `index`, whose header must be valid.
     std::string pathsOfIndex()
     {
         const std::string content = readFile(index);
@@ -126,14 +126,14 @@ TEST_F(FileIndexTest, AHomeThatEndsWithASlashGetsNoSecondOne)
 
 // Writing.
 
-TEST_F(FileIndexTest, TheIndexListsEachPathBehindItsHeader)
+TEST_F(FileIndexTest, TheIndexListsEachPathAfterItsHeader)
 {
     writeFileIndex(index, {"/a/x", "/a/b"});
 
     EXPECT_EQ("/a/b\n/a/x\n", pathsOfIndex());
 }
 
-TEST_F(FileIndexTest, PathsComeInTheOrderOfTheirBytes)
+TEST_F(FileIndexTest, PathsAreSortedByTheirBytes)
 {
     writeFileIndex(index, {"/\xC3\xA4", "/z", "/a", "/B", "/a/b", "/a.b", "/\x7F"});
 
@@ -147,7 +147,7 @@ TEST_F(FileIndexTest, PathsAreWrittenAsTheyAre)
     EXPECT_EQ(std::string("/a\0b\n", 5) + "/a\tb\n/a b \n", pathsOfIndex());
 }
 
-TEST_F(FileIndexTest, TheHeaderTellsTheLocalTime)
+TEST_F(FileIndexTest, TheHeaderHasTheLocalTime)
 {
     const std::time_t before = std::time(nullptr);
     writeFileIndex(index, {});
@@ -162,7 +162,7 @@ TEST_F(FileIndexTest, TheHeaderTellsTheLocalTime)
     EXPECT_LE(written, after);
 }
 
-TEST_F(FileIndexTest, AnIndexOfBeforeIsReplaced)
+TEST_F(FileIndexTest, AnOlderIndexIsReplaced)
 {
     writeFile(index, std::string(10000, 'x'));
 
@@ -179,7 +179,7 @@ TEST_F(FileIndexTest, AnIndexThatCannotBeWrittenIsSkippedSilently)
     EXPECT_EQ("", log.text());
 }
 
-TEST_F(FileIndexTest, WhatWasReadIsWrittenBackSortedAndOnce)
+TEST_F(FileIndexTest, WhatWasReadIsWrittenBackSortedWithoutDuplicates)
 {
     writeFile(index, "/a/x\n#comment\n\n/a/b\n/a/x\n");
     Files files;
@@ -190,7 +190,7 @@ TEST_F(FileIndexTest, WhatWasReadIsWrittenBackSortedAndOnce)
     EXPECT_EQ("/a/b\n/a/x\n", pathsOfIndex());
 }
 
-TEST_F(FileIndexTest, ATrailingBlankMakesAnotherPath)
+TEST_F(FileIndexTest, ATrailingBlankMakesADifferentPath)
 {
     writeFile(index, "/a/b\n/a/b \n");
     Files files;
@@ -214,7 +214,7 @@ TEST_F(FileIndexTest, ARefreshedIndexListsTheInstallersFilesToo)
               pathsOfIndex());
 }
 
-TEST_F(FileIndexTest, ARefreshMakesAMissingIndex)
+TEST_F(FileIndexTest, ARefreshCreatesAMissingIndex)
 {
     InstallRegistry registry;
     registry.homeDirectory = "/h";
@@ -305,7 +305,7 @@ TEST_F(FileIndexTest, TheDirectoriesOfTheIndexAreJournalledAndTheIndexIsNot)
     EXPECT_EQ("4 " + (dir / "etc") + "\n4 " + (dir / "etc/zor") + "\n", journalText(transaction));
 }
 
-TEST_F(FileIndexTest, AnIndexThatCannotBeOpenedIsWarnedOf)
+TEST_F(FileIndexTest, AnIndexThatCannotBeOpenedCausesAWarning)
 {
     writeFile(dir / "file", "");
     index = dir / "file/ZOR_files";

@@ -151,7 +151,7 @@ TEST_F(BackupCopyTest, ReplacesAnOlderBackup)
     EXPECT_EQ("old", readFile(dir / "zor.ini.bak"));
 }
 
-TEST_F(BackupCopyTest, AFailedCopyGivesItsCodeAndLeavesNoBackupAndNoEntry)
+TEST_F(BackupCopyTest, AFailedCopyReturnsItsCodeAndLeavesNoBackupAndNoEntry)
 {
     makeDirectories(dir / "zor.ini");
 
@@ -161,7 +161,7 @@ TEST_F(BackupCopyTest, AFailedCopyGivesItsCodeAndLeavesNoBackupAndNoEntry)
     EXPECT_TRUE(transaction.journal.empty());
 }
 
-TEST_F(BackupCopyTest, AMissingFileIsCode1AndCostsTheOlderBackup)
+TEST_F(BackupCopyTest, AMissingFileIsCode1AndDeletesTheOlderBackup)
 {
     writeFile(dir / "zor.ini.bak", "older");
 
@@ -190,7 +190,7 @@ protected:
     }
 };
 
-TEST_F(FullDiskTest, ACopyThatDoesNotFitIsCode6AndItsPartStays)
+TEST_F(FullDiskTest, ACopyThatDoesNotFitIsCode6AndLeavesWhatFits)
 {
     writeFile(dir / "source", noiseBytes(100000, 1));
     const SmallDisk disk(dir / "disk", 64);
@@ -248,7 +248,7 @@ TEST_F(CopyFileWithBackupTest, AFileThatCannotBeBackedUpIsCode9AndStays)
     EXPECT_EQ("old", readFile(dir / "file"));
 }
 
-TEST_F(CopyFileWithBackupTest, AFailedCopyGivesItsCodeAndOnlyTheBackupIsRecorded)
+TEST_F(CopyFileWithBackupTest, AFailedCopyReturnsItsCodeAndOnlyTheBackupIsRecorded)
 {
     makeDirectories(dir / "unreadable");
     writeFile(dir / "file", "old");
@@ -382,7 +382,7 @@ TEST_F(CreatePathTest, CreatesEveryDirectoryBeforeTheLastSlash)
     EXPECT_EQ("4 a\n4 a/b\n", journalText(transaction));
 }
 
-TEST_F(CreatePathTest, CreatesAPathThatEndsInASlashAsAWhole)
+TEST_F(CreatePathTest, CreatesAllOfAPathThatEndsInASlash)
 {
     EXPECT_EQ(0, createPath(transaction, "a/b/", 0755));
 
@@ -400,7 +400,7 @@ TEST_F(CreatePathTest, CreatesNothingForABareName)
     EXPECT_TRUE(transaction.journal.empty());
 }
 
-TEST_F(CreatePathTest, PassesOverWhatExists)
+TEST_F(CreatePathTest, SkipsWhatExists)
 {
     makeDirectories(dir / "opt");
     ASSERT_EQ(0, chmod("opt", 0700));
@@ -412,7 +412,7 @@ TEST_F(CreatePathTest, PassesOverWhatExists)
     EXPECT_EQ(0700U, modeOf("opt"));
 }
 
-TEST_F(CreatePathTest, PassesOverAFileOfThatName)
+TEST_F(CreatePathTest, SkipsAFileOfThatName)
 {
     writeFile("a", "");
 
@@ -500,7 +500,7 @@ TEST_F(CreateFullPathTest, CreatesNothingForAnEmptyPath)
     EXPECT_TRUE(tree().empty());
 }
 
-TEST_F(CreateFullPathTest, PassesOverWhatExists)
+TEST_F(CreateFullPathTest, SkipsWhatExists)
 {
     makeDirectories(dir / "a");
     writeFile(dir / "a/file", "");

@@ -59,7 +59,8 @@ TEST_F(ReadLineTest, ALineMayBeOfAnyLength)
 
 TEST_F(ReadLineTest, AFailedReadGivesNoLine)
 {
-    const ScopedFile file(std::fopen(dir.path().c_str(), "r")); // a directory: opens, reads not
+    const ScopedFile file(
+        std::fopen(dir.path().c_str(), "r")); // a directory can be opened, but not read
     ASSERT_NE(nullptr, file);
     std::string line = "kept from before";
 

@@ -47,14 +47,14 @@ TEST_F(FileWritingTest, WriteAllOfNothingSucceeds)
     EXPECT_EQ(0, writeAll(-1, nullptr, 0));
 }
 
-TEST_F(FileWritingTest, WriteAllTellsThatTheDiskIsFull)
+TEST_F(FileWritingTest, WriteAllReportsAFullDisk)
 {
     const ScopedFd full(open("/dev/full", O_WRONLY));
 
     EXPECT_EQ(6, writeAll(full.get(), "x", 1));
 }
 
-TEST_F(FileWritingTest, WriteAllTellsThatAFileCannotBeWritten)
+TEST_F(FileWritingTest, WriteAllReportsAFileThatCannotBeWritten)
 {
     writeFile(path, "old");
     const ScopedFd readOnly(open(path.c_str(), O_RDONLY));
@@ -64,7 +64,7 @@ TEST_F(FileWritingTest, WriteAllTellsThatAFileCannotBeWritten)
     EXPECT_EQ("old", readFile(path));
 }
 
-TEST_F(FileWritingTest, CloseWrittenGivesTheFileUp)
+TEST_F(FileWritingTest, CloseWrittenReleasesTheFile)
 {
     ScopedFd file(open(path.c_str(), O_WRONLY | O_CREAT, 0600));
 
@@ -73,7 +73,7 @@ TEST_F(FileWritingTest, CloseWrittenGivesTheFileUp)
     EXPECT_FALSE(file.isOpen());
 }
 
-TEST_F(FileWritingTest, CloseWrittenTellsThatClosingFailed)
+TEST_F(FileWritingTest, CloseWrittenReportsAFailedClose)
 {
     ScopedFd closed(open(path.c_str(), O_WRONLY | O_CREAT, 0600));
     ASSERT_EQ(0, close(closed.get()));

@@ -20,7 +20,7 @@ const std::string Index = "/opt/corvan/zor/ZOR_files";
 
 using SubdirTest = InstallerTest;
 
-TEST_F(SubdirTest, IsCreatedWithWhatIsMissingAboveIt)
+TEST_F(SubdirTest, IsCreatedWithItsMissingParents)
 {
     EXPECT_EQ(0, makeSubdir(transaction, dir / "zor/bin", "etc", 0750));
 
@@ -157,7 +157,7 @@ TEST_F(FreshInstallTest, LogsEachOfItsStepsInOrder)
               log.text());
 }
 
-TEST_F(FreshInstallTest, CreatesTheDirectoriesThatThePackageDoesNotCarry)
+TEST_F(FreshInstallTest, CreatesTheDirectoriesThatThePackageDoesNotContain)
 {
     useEmptyPackage();
     plantConfiguration();
@@ -186,7 +186,7 @@ TEST_F(FreshInstallTest, TheCacheDirectoryOfAnOrdinaryUserIsClosedToOthers)
     }));
 }
 
-TEST_F(FreshInstallTest, AFlagOfSingleUserModeGovernsEveryDirectory)
+TEST_F(FreshInstallTest, TheSingleUserFlagAppliesToEveryDirectory)
 {
     plantConfiguration();
     writeFile(Home + "/config/SingleUserMode", "");
@@ -318,7 +318,7 @@ TEST_F(FreshInstallTest, TheRecordOfTheInstallTypeIsNotJournalled)
     EXPECT_EQ(std::string::npos, journalText(transaction).find("zor_install.properties"));
 }
 
-TEST_F(FreshInstallTest, AnInstallTypeThatCannotBeRecordedIsNoFailure)
+TEST_F(FreshInstallTest, AnInstallTypeThatCannotBeRecordedIsNotAFailure)
 {
     makeDirectories(Home + "/install/zor_install.properties");
 
@@ -340,7 +340,7 @@ TEST_F(FreshInstallTest, WorksWithoutAnIndex)
     EXPECT_TRUE(pathExists(Home + "/config/SingleUserMode"));
 }
 
-TEST_F(FreshInstallTest, CreatesTheFlagOfSingleUserModeWhenAsked)
+TEST_F(FreshInstallTest, CreatesTheSingleUserFlagWhenAsked)
 {
     createSingleUserModeFile = true;
 
@@ -354,7 +354,7 @@ TEST_F(FreshInstallTest, CreatesTheFlagOfSingleUserModeWhenAsked)
     EXPECT_EQ(index.size() - last.size(), index.rfind(last));
 }
 
-TEST_F(FreshInstallTest, CreatesTheFlagOfSingleUserModeAlsoAfterAFailure)
+TEST_F(FreshInstallTest, CreatesTheSingleUserFlagAlsoAfterAFailure)
 {
     createSingleUserModeFile = true;
     makeDirectories(Home + "/config");
@@ -365,7 +365,7 @@ TEST_F(FreshInstallTest, CreatesTheFlagOfSingleUserModeAlsoAfterAFailure)
     EXPECT_TRUE(pathExists(Home + "/config/SingleUserMode"));
 }
 
-TEST_F(FreshInstallTest, ASharedInstallationTellsTheToolkitWhereItsTracesGo)
+TEST_F(FreshInstallTest, ASharedInstallationConfiguresTheTraceDirectory)
 {
     EXPECT_EQ(0, install());
 
@@ -383,7 +383,7 @@ TEST_F(FreshInstallTest, APerUserInstallationNeverRunsTheScannerControl)
     EXPECT_FALSE(pathExists("/usr/kel"));
 }
 
-TEST_F(FreshInstallTest, APerUserInstallationWithItsOwnTracePathTellsIt)
+TEST_F(FreshInstallTest, APerUserInstallationConfiguresItsOwnTracePath)
 {
     localInstall = true;
 
@@ -520,7 +520,7 @@ TEST_F(FreshInstallTest, APropertyFileThatCannotBeSavedFailsTheInstallation)
     EXPECT_FALSE(pathExists("/etc/zor"));
 }
 
-TEST_F(FreshInstallTest, ARegistryDirectoryThatCannotBeMadeShowsWhenTheRegistryIsSaved)
+TEST_F(FreshInstallTest, ARegistryDirectoryThatCannotBeMadeFailsTheSaveOfTheRegistry)
 {
     ASSERT_EQ(0, chmod("/etc", 0555));
     {

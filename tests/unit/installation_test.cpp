@@ -36,7 +36,7 @@ protected:
                                       "");
     }
 
-    /// What the log ends with: `text`, or that many characters of it that are there.
+    /// The end of the log, as many characters as `text` has.
     [[nodiscard]] std::string endOfLog(const std::string& text) const
     {
         const std::string all = log.text();
@@ -58,7 +58,7 @@ protected:
     PackageFiles toolkit = toolkitFiles(dir / "calls");
 };
 
-TEST_F(InstallationTest, AFreshInstallationIsTheRequestsAndIsCommitted)
+TEST_F(InstallationTest, AFreshInstallationUsesTheRequestAndIsCommitted)
 {
     EXPECT_EQ(0, run(false));
 
@@ -69,7 +69,7 @@ TEST_F(InstallationTest, AFreshInstallationIsTheRequestsAndIsCommitted)
     EXPECT_FALSE(pathExists(Home + "/config/xss/schema.xss.bak"));
 }
 
-TEST_F(InstallationTest, AnUpgradeIsOfTheRegisteredInstallationAndIsCommitted)
+TEST_F(InstallationTest, AnUpgradeChangesTheRegisteredInstallationAndIsCommitted)
 {
     plantInstallation();
 
@@ -111,7 +111,7 @@ TEST_F(InstallationTest, WithoutTheFlagNothingIsDisabledAndNoRegistryIsWritten)
     EXPECT_FALSE(pathExists("/root/.zor/zor.ini"));
 }
 
-TEST_F(InstallationTest, AFailedFreshInstallationIsRolledBackAndItsResultKept)
+TEST_F(InstallationTest, AFailedFreshInstallationIsRolledBackAndReturnsItsCode)
 {
     toolkit = toolkitFiles(dir / "calls", "common_trace_path");
 
@@ -124,7 +124,7 @@ TEST_F(InstallationTest, AFailedFreshInstallationIsRolledBackAndItsResultKept)
     EXPECT_TRUE(transaction.journal.empty());
 }
 
-TEST_F(InstallationTest, AFailedUpgradeIsRolledBackAndItsResultKept)
+TEST_F(InstallationTest, AFailedUpgradeIsRolledBackAndReturnsItsCode)
 {
     plantInstallation();
     toolkit = without(toolkit, "config/ZorTrace.properties");
@@ -184,7 +184,7 @@ TEST_F(InstallationTest, TheIndexIsReadableForEverybodyAlsoAfterAFailure)
     EXPECT_EQ(0644U, modeOf(Index));
 }
 
-TEST_F(InstallationTest, AMissingIndexIsNoFailure)
+TEST_F(InstallationTest, AMissingIndexIsNotAFailure)
 {
     contentOf(toolkit, "bin/trawlhw") = "";
 

@@ -10,7 +10,7 @@
 
 namespace {
 
-TEST(InterruptionTest, ASignalIsNotedOnlyByWhatCanBeUndone)
+TEST(InterruptionTest, OnlyWhatCanBeUndoneIsInterrupted)
 {
     EXPECT_TRUE(passesInChild([] {
         watchForSignals();

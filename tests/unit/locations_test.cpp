@@ -181,7 +181,7 @@ TEST_F(InstallTypeTest, WithoutAPropertyFileItIsUnknown)
               log.text());
 }
 
-TEST_F(InstallTypeTest, TheKeyTellsLocal)
+TEST_F(InstallTypeTest, TheKeyIdentifiesALocalInstallation)
 {
     record("# comment\nZOR_InstallType=local\n");
     EXPECT_EQ(1, installedTypeOf(dir.path()));

@@ -66,7 +66,7 @@ TEST_F(PackageWindowTest, AnyBytesAreThoseOfTheFile)
     }
 }
 
-TEST_F(PackageWindowTest, TheLastBytesAreThereAndNoneBehindThem)
+TEST_F(PackageWindowTest, TheLastBytesAreThereAndNoneAfterThem)
 {
     EXPECT_EQ(expected(FileSize - 5, 5), bytes(FileSize - 5, 5));
     EXPECT_EQ("(none)", bytes(FileSize - 5, 6));
@@ -76,7 +76,7 @@ TEST_F(PackageWindowTest, TheLastBytesAreThereAndNoneBehindThem)
     EXPECT_EQ(expected(0, 5), bytes(0, 5));
 }
 
-TEST_F(PackageWindowTest, NoBytesAreThereAnywhere)
+TEST_F(PackageWindowTest, ZeroBytesCanBeReadAnywhere)
 {
     EXPECT_EQ("", bytes(0, 0));
     EXPECT_EQ("", bytes(FileSize, 0));
@@ -106,12 +106,12 @@ TEST_F(PackageWindowTest, TheFirstReadIsSmall)
     EXPECT_EQ(4096U, heldFrom(100));
 }
 
-TEST_F(PackageWindowTest, ReadsGrowWhileTheyGoForward)
+TEST_F(PackageWindowTest, ForwardReadsGrow)
 {
     for (std::int64_t at = 0; at < 1000000; at += 1000)
         (void)bytes(at, 900);
 
-    // 4, 8, ... 128 KiB end at 258048 or little before, and from there each window has 256 KiB.
+    // 4, 8, ... 128 KiB end at 258048 or shortly before, and from there each window has 256 KiB.
     const std::size_t held = heldFrom(999900);
     EXPECT_GT(held, 20000U);
     EXPECT_LE(held, 262144U);

@@ -17,7 +17,7 @@ namespace {
 
 using Lines = std::vector<std::string>;
 
-/// A whole installed tree below the test's directory, everything in it with mode 0700 or 0600.
+/// A complete installed tree below the test's directory, everything in it with mode 0700 or 0600.
 class PermissionsTest : public MachineTest {
 protected:
     PermissionsTest()
@@ -92,7 +92,7 @@ TEST_F(PermissionsTest, TheRegistryAndItsDirectoryGetTheirModes)
     EXPECT_EQ(0644U, modeOf("/etc/zor/zor.ini"));
 }
 
-TEST_F(PermissionsTest, ThePerUserRegistryIsTheOneOfAPerUserInstallation)
+TEST_F(PermissionsTest, APerUserInstallationSetsTheModesOfItsOwnRegistry)
 {
     localInstall = true;
     makeDirectories("/root/.zor");
@@ -172,7 +172,7 @@ TEST_F(PermissionsTest, TheHomeOfAPerUserInstallationIsNotOpenedInSingleUserMode
     EXPECT_EQ(0700U, modeOf(home));
 }
 
-TEST_F(PermissionsTest, WhatDoesNotExistIsPassedOverSilently)
+TEST_F(PermissionsTest, WhatDoesNotExistIsSkippedSilently)
 {
     std::filesystem::remove_all(home + "/bin");
     std::filesystem::remove_all(home + "/config/xss");

@@ -77,7 +77,7 @@ TEST_F(PrivateModeTest, AnInstallationKeepsNoBackups)
     EXPECT_FALSE(pathExists(home + "/config/xss/schema.xss.bak"));
 }
 
-TEST_F(PrivateModeTest, AFailedInstallationGivesItsCodeAndIsNotRolledBack)
+TEST_F(PrivateModeTest, AFailedInstallationReturnsItsCodeAndIsNotRolledBack)
 {
     localInstall = true;
     toolkit = without(toolkit, "config/ZorTrace.properties");
@@ -117,7 +117,7 @@ TEST_F(PrivateModeTest, ARemovalStopsTheScannersAndDeletesThePrivatePath)
               readFile(dir / "calls"));
 }
 
-TEST_F(PrivateModeTest, ARemovalLogsItsLineBehindTheDeletions)
+TEST_F(PrivateModeTest, ARemovalLogsItsLineAfterTheDeletions)
 {
     makeDirectories(home);
 
@@ -137,7 +137,7 @@ TEST_F(PrivateModeTest, ARemovalSucceedsWhateverHappened)
     EXPECT_TRUE(logHolds("Performing private remove\n"));
 }
 
-TEST_F(PrivateModeTest, ScannersThatCannotBeStoppedDoNotKeepThePrivatePath)
+TEST_F(PrivateModeTest, ScannersThatCannotBeStoppedDoNotPreventTheRemoval)
 {
     ignoreUpdateErrors = false;
     plantScanners(home, dir / "calls", "-shutdown");

@@ -152,7 +152,7 @@ TEST_F(PropertyFileTest, AFailingWriteIsNotDetected)
 
 // Queries.
 
-TEST_F(PropertyFileTest, AValueIsTheTrimmedTextBehindTheFirstEqualsSign)
+TEST_F(PropertyFileTest, AValueIsTheTrimmedTextAfterTheFirstEqualsSign)
 {
     PropertyFile file{{"a = 1", "b=x=y ", "c=", "\td e\t=\tf g\r"}};
 
@@ -263,7 +263,7 @@ TEST_F(PropertyFileTest, SettingAValueGivesALineWithoutAnEqualsSignOne)
     EXPECT_EQ(Lines{"a=5"}, file.lines);
 }
 
-TEST_F(PropertyFileTest, AFragmentQualifiesEveryKeyThatContainsIt)
+TEST_F(PropertyFileTest, AFragmentMatchesEveryKeyThatContainsIt)
 {
     PropertyFile file{
         {" trace.level = 1", "fscanner.tracefile=f", "#trace.level=1", "level=trace", "trace"}};

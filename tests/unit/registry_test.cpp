@@ -42,7 +42,7 @@ TEST_F(RegistryTest, TheKeysHaveTheirTexts)
 
 // Parsing.
 
-TEST_F(RegistryTest, AWholeFileFillsTheRecord)
+TEST_F(RegistryTest, ACompleteFileFillsTheRecord)
 {
     EXPECT_EQ(0, codeOf(SampleText));
 
@@ -179,17 +179,17 @@ TEST_F(RegistryTest, ADirectoryGives2)
     EXPECT_EQ(2, parseRegistry(dir.path(), &registry));
 }
 
-TEST_F(RegistryTest, ABadVersionGives3AndNothingBehindItIsRead)
+TEST_F(RegistryTest, ABadVersionGives3AndNothingAfterItIsRead)
 {
     EXPECT_EQ(3, codeOf("ZOR_HomeDirectory = /before\n"
                         "ZOR_Version = 2.x\n"
-                        "ZOR_HomeDirectory = /behind\n"));
+                        "ZOR_HomeDirectory = /after\n"));
 
     EXPECT_EQ("/before", registry.homeDirectory);
     EXPECT_EQ("0.0.0.0000", formatVersion(registry.version));
 }
 
-TEST_F(RegistryTest, ABadVersionGives3AlsoBehindAGoodOne)
+TEST_F(RegistryTest, ABadVersionGives3AlsoAfterAGoodOne)
 {
     EXPECT_EQ(3, codeOf(SampleText + "ZOR_Version = 1..2\n"));
 }
@@ -388,7 +388,7 @@ TEST_F(RegistryTest, ALongListOnAFullDiskGives5)
 {
     ASSERT_EQ(0, symlink("/dev/full", path.c_str()));
     transaction.backup = false;
-    registry.exploiters = std::string(100000, 'x'); // more than a stream holds back
+    registry.exploiters = std::string(100000, 'x'); // more than a stream buffers
 
     EXPECT_EQ(5, writeRegistry(transaction, path, registry));
 }

@@ -86,7 +86,7 @@ TEST_F(RemoveListedFilesTest, ALastLineWithoutNewlineCounts)
     EXPECT_FALSE(pathExists(dir / "a"));
 }
 
-TEST_F(RemoveListedFilesTest, FilesThatCannotBeDeletedArePassedOver)
+TEST_F(RemoveListedFilesTest, FilesThatCannotBeDeletedAreSkipped)
 {
     const std::string index = dir / "ZOR_files";
     makeDirectories(dir / "directory");
@@ -98,7 +98,7 @@ TEST_F(RemoveListedFilesTest, FilesThatCannotBeDeletedArePassedOver)
     EXPECT_EQ(Lines{"d 0755 directory"}, treeOf(dir.path()));
 }
 
-TEST_F(RemoveListedFilesTest, ALineOf1023BytesIsTakenAsAWhole)
+TEST_F(RemoveListedFilesTest, ALineOf1023BytesIsOnePath)
 {
     const std::string index = dir / "ZOR_files";
     const std::string line(1023, 'x');
@@ -109,7 +109,7 @@ TEST_F(RemoveListedFilesTest, ALineOf1023BytesIsTakenAsAWhole)
     EXPECT_EQ("RM FILE: " + line + "\n", log.text());
 }
 
-TEST_F(RemoveListedFilesTest, ALongerLineIsTakenInPieces)
+TEST_F(RemoveListedFilesTest, ALongerLineIsSplitIntoPieces)
 {
     const std::string index = dir / "ZOR_files";
     writeFile(dir / "victim", "");
@@ -264,7 +264,7 @@ TEST_F(RemovalTest, AnEmptyListIsNoReasonToRemove)
     EXPECT_TRUE(pathExists(Home));
 }
 
-TEST_F(RemovalTest, AnyExploiterMayRemoveAnInstallationOfNobody)
+TEST_F(RemovalTest, AnyExploiterMayRemoveAnInstallationWithoutExploiters)
 {
     registry.exploiters = ":";
     list({"bin/trawlcfg", "bin/trawlfs"});
@@ -361,7 +361,7 @@ TEST_F(RemovalTest, TheListedFilesAreDeletedOneByOneAndTheInstallersOwnWithThem)
     EXPECT_FALSE(pathExists(Home));
 }
 
-TEST_F(RemovalTest, AfterTheListedFilesWhatIsLeftGoesInItsOrder)
+TEST_F(RemovalTest, AfterTheListedFilesTheDirectoriesAreRemovedInOrder)
 {
     plantEverywhere();
     list({"bin/trawlcfg", "bin/trawlfs", "bin/plugins/f", "bin/customscanners/f",
@@ -379,7 +379,7 @@ TEST_F(RemovalTest, AfterTheListedFilesWhatIsLeftGoesInItsOrder)
     EXPECT_FALSE(pathExists(Home));
 }
 
-TEST_F(RemovalTest, AFileOfTheUsersInAWholeDirectoryGoes)
+TEST_F(RemovalTest, AUsersFileInADirectoryThatIsRemovedWithEverythingIsDeleted)
 {
     for (const char* const name : {"properties/mine/f", "config/mine/f", "cache_data/mine/f",
                                    "logs/f", "install/f", "_uninst/f"})
@@ -391,7 +391,7 @@ TEST_F(RemovalTest, AFileOfTheUsersInAWholeDirectoryGoes)
     EXPECT_FALSE(pathExists(Home));
 }
 
-TEST_F(RemovalTest, AFileOfTheUsersAmongTheBinariesKeepsThemAndTheHome)
+TEST_F(RemovalTest, AUsersFileAmongTheBinariesKeepsTheirDirectoryAndTheHome)
 {
     plant("bin/mine");
     list({"bin/trawlcfg", "bin/trawlfs"});
@@ -402,7 +402,7 @@ TEST_F(RemovalTest, AFileOfTheUsersAmongTheBinariesKeepsThemAndTheHome)
     EXPECT_FALSE(pathExists("/etc/zor"));
 }
 
-TEST_F(RemovalTest, FilesOfTheUsersStayInDirectoriesThatAreRemovedOnlyWhenEmpty)
+TEST_F(RemovalTest, UsersFilesStayInDirectoriesThatAreRemovedOnlyWhenEmpty)
 {
     for (const char* const name :
          {"bin/plugins/f", "bin/customscanners/f", "install/QMX_CLI/linux-ix86/bin/f",
@@ -429,7 +429,7 @@ TEST_F(RemovalTest, SubdirectoriesOfTheLogsStayAndKeepThem)
     EXPECT_EQ(Lines({"d 0755 logs", "d 0755 logs/old", "f 0644 logs/old/f"}), treeOf(Home));
 }
 
-TEST_F(RemovalTest, WithoutAnIndexEverythingGoesFromItsKnownPlaceInItsOrder)
+TEST_F(RemovalTest, WithoutAnIndexTheKnownDirectoriesAreEmptiedInOrder)
 {
     plantEverywhere();
 
@@ -465,7 +465,7 @@ TEST_F(RemovalTest, WithoutAnIndexEverythingGoesFromItsKnownPlaceInItsOrder)
     EXPECT_FALSE(pathExists(Home));
 }
 
-TEST_F(RemovalTest, WithoutAnIndexFilesOfTheUsersAmongTheBinariesGoToo)
+TEST_F(RemovalTest, WithoutAnIndexUsersFilesAmongTheBinariesAreDeletedToo)
 {
     plant("bin/mine");
     plant("mine");
@@ -546,7 +546,7 @@ TEST_F(RemovalTest, TheCommonDirectoryIsNeitherCreatedNorNamed)
     EXPECT_FALSE(pathExists("/etc/kel"));
 }
 
-TEST_F(RemovalTest, TheCommonLogDirectoryLiesWhereTheSettingSays)
+TEST_F(RemovalTest, TheCommonLogDirectoryIsWhereTheSettingSays)
 {
     makeDirectories("/etc/kel/corvan/common/cfg");
     writeFile("/etc/kel/corvan/common/cfg/log.properties",
@@ -582,13 +582,13 @@ TEST_F(RemovalTest, APerUserInstallationLeavesTheCommonDirectoryAlone)
     EXPECT_TRUE(logHolds("DEL: /root/.zor/zor.ini\nRMDIR: /root/.zor\n"));
 }
 
-TEST_F(RemovalTest, TheDirectoryOfTheRegistryStaysWithAForeignFileButIsLogged)
+TEST_F(RemovalTest, TheDirectoryOfTheRegistryStaysWithAnotherFileInItButIsLogged)
 {
-    writeFile("/etc/zor/foreign", "");
+    writeFile("/etc/zor/other", "");
 
     EXPECT_EQ(0, remove());
 
-    EXPECT_EQ(Lines{"f 0644 foreign"}, treeOf("/etc/zor"));
+    EXPECT_EQ(Lines{"f 0644 other"}, treeOf("/etc/zor"));
     EXPECT_TRUE(logHolds("DEL: /etc/zor/zor.ini\nRMDIR: /etc/zor\n"));
 }
 

@@ -25,7 +25,7 @@ TEST(PathExistsTest, FilesAndDirectoriesExist)
     EXPECT_FALSE(pathExists(""));
 }
 
-TEST(PathExistsTest, ALinkExistsWhenItLeadsSomewhere)
+TEST(PathExistsTest, ALinkExistsIfItsTargetDoes)
 {
     const TempDir dir;
     writeFile(dir / "file", "");
@@ -54,7 +54,7 @@ TEST_F(PathIsMissingTest, ANameThatIsNotThereIsMissing)
     EXPECT_TRUE(pathIsMissing(dir / "file"));
 }
 
-TEST_F(PathIsMissingTest, ALinkThatLeadsNowhereIsMissing)
+TEST_F(PathIsMissingTest, ADanglingLinkIsMissing)
 {
     ASSERT_EQ(0, symlink("nowhere", (dir / "link").c_str()));
 
@@ -68,7 +68,7 @@ TEST_F(PathIsMissingTest, ALinkToItselfIsMissing)
     EXPECT_TRUE(pathIsMissing(dir / "link"));
 }
 
-TEST_F(PathIsMissingTest, ANameLongerThanTheFileSystemTakesIsMissing)
+TEST_F(PathIsMissingTest, ANameLongerThanTheFileSystemAllowsIsMissing)
 {
     EXPECT_TRUE(pathIsMissing(dir / std::string(300, 'n')));
 }
@@ -90,7 +90,7 @@ TEST_F(PathIsMissingTest, AnythingInADirectoryThatMayNotBeSearchedIsMissing)
     EXPECT_TRUE(pathIsMissing(dir / "closed/file"));
 }
 
-TEST_F(PathIsMissingTest, WhatAFailingDiskDoesNotShowIsNotMissing)
+TEST_F(PathIsMissingTest, AnErrorOfTheDiskDoesNotMeanMissing)
 {
     EXPECT_TRUE(passesInChild([this] {
         failSystemCall(SYS_openat2, EIO);
@@ -120,7 +120,7 @@ TEST_F(SafePathTest, APlaceIsTheDirectoryAndTheLastName)
     EXPECT_EQ(".", nameAt("/", LastLink::Follow));
 }
 
-TEST_F(SafePathTest, APathThatTheSystemWouldNotTakeIsRefusedForItsReason)
+TEST_F(SafePathTest, APathThatTheSystemRefusesFailsWithTheSameError)
 {
     writeFile(dir / "file", "");
     ASSERT_EQ(0, symlink("loop", (dir / "loop").c_str()));
@@ -198,7 +198,7 @@ TEST_F(SafePathTest, AFifoThatMayBePlantedIsRefusedWithoutWaiting)
     EXPECT_EQ(ENXIO, openForWriting(dir / "open/fifo", Existing::Truncate, 0600, file));
 }
 
-TEST_F(SafePathTest, OurOwnFifoIsOpenedAsAlways)
+TEST_F(SafePathTest, OurOwnFifoIsOpenedAsUsual)
 {
     ASSERT_EQ(0, chmod(dir.path().c_str(), 0755));
     ASSERT_EQ(0, mkfifo((dir / "fifo").c_str(), 0600));
@@ -241,7 +241,7 @@ TEST_F(SafePathTest, AHardLinkOfOursIsAnOrdinaryFile)
     EXPECT_EQ(0640U, modeOf(dir / "two"));
 }
 
-TEST_F(SafePathTest, ANewFileIsCreatedAlsoThroughALinkOfOursThatLeadsNowhere)
+TEST_F(SafePathTest, ANewFileIsCreatedAlsoThroughADanglingLinkOfOurs)
 {
     ASSERT_EQ(0, symlink("target", (dir / "link").c_str()));
     WritableFile file;

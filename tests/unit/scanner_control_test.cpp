@@ -110,7 +110,7 @@ TEST_F(ScannerControlTest, StoppingSucceedsByDefaultWithoutAnyControlProgram)
     EXPECT_EQ(0, stopScanners(home, true, true));
 }
 
-TEST_F(ScannerControlTest, NoStatusIsLookedAtByDefault)
+TEST_F(ScannerControlTest, StatusesAreIgnoredByDefault)
 {
     plantScanners(home, commandLog, "-");
 
@@ -209,7 +209,7 @@ TEST_F(ScannerControlTest, RestartingEnablesAllScanners)
               log.text());
 }
 
-TEST_F(ScannerControlTest, RestartingGivesTheRawStatusOfTheCommand)
+TEST_F(ScannerControlTest, RestartingReturnsTheRawStatusOfTheCommand)
 {
     plantScanners(home, commandLog, "-enable");
 

@@ -118,7 +118,7 @@ TEST_F(StatusReportTest, ARegistryWithABadVersionIsNotInstalled)
     EXPECT_EQ("INI file = /etc/zor/zor.ini\nNot installed\n", block(false));
 }
 
-TEST_F(StatusReportTest, AnInstallationWithoutItsFilesIsShownAllTheSame)
+TEST_F(StatusReportTest, AnInstallationWithoutItsFilesIsShownAnyway)
 {
     plantRegistry("/root/.zor",
                   "ZOR_HomeDirectory = /nowhere\nZOR_Exploiters = ABC:\nZOR_Version = 1\n");

@@ -108,7 +108,7 @@ TEST_F(UpdateScriptTest, LogsWhatItDoes)
               log.text());
 }
 
-TEST_F(UpdateScriptTest, AMissingScriptIsNoFailure)
+TEST_F(UpdateScriptTest, AMissingScriptIsNotAFailure)
 {
     EXPECT_EQ(0, updateScript("trawlcfg.sh", dir.path(), "/common"));
 
@@ -125,7 +125,7 @@ TEST_F(UpdateScriptTest, AHomeThatEndsInASlashGetsNoSecondOne)
               log.text());
 }
 
-TEST_F(UpdateScriptTest, AScriptThatCannotBeLoadedGivesTheReasonAndStays)
+TEST_F(UpdateScriptTest, AScriptThatCannotBeLoadedReturnsTheErrorAndStays)
 {
     writeFile(script, "$(ZOR_DestinationDir)\n");
     ASSERT_EQ(0, chmod(script.c_str(), 0));
@@ -142,7 +142,7 @@ TEST_F(UpdateScriptTest, AScriptThatCannotBeLoadedGivesTheReasonAndStays)
     EXPECT_EQ("$(ZOR_DestinationDir)\n", readFile(script));
 }
 
-TEST_F(UpdateScriptTest, AScriptThatCannotBeSavedGivesTheReason)
+TEST_F(UpdateScriptTest, AScriptThatCannotBeSavedReturnsTheError)
 {
     writeFile(script, "$(ZOR_DestinationDir)\n");
     ASSERT_EQ(0, chmod(script.c_str(), 0444));

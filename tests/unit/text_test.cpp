@@ -53,7 +53,7 @@ TEST(TrimRightTest, EmptiesATextOfBlanks)
     EXPECT_EQ("", trimmedRight(""));
 }
 
-TEST(NameListTest, EachNameGetsItsFrame)
+TEST(NameListTest, EachNameGetsTwoSeparators)
 {
     std::string list;
     appendToNameList(list, "bin/a");
@@ -109,7 +109,7 @@ TEST(LineTest, AKeyOfBlanksIsNotTrimmed)
     EXPECT_EQ("  ", keyOfLine("  "));
 }
 
-TEST(LineTest, TheTextBehindTheFirstEqualsSignStandsAsItIs)
+TEST(LineTest, TheTextAfterTheFirstEqualsSignIsUnchanged)
 {
     EXPECT_EQ(" b = c ", textAfterEquals("a= b = c "));
     EXPECT_EQ("", textAfterEquals("a="));

@@ -177,7 +177,7 @@ TEST(UniqueStampTest, SummerTimeDoesNotMoveTheStartOf1970)
     EXPECT_EQ("20231114221320_1073741824", uniqueStamp(1700000000));
 }
 
-TEST(UniqueStampTest, TheTextIsWrittenWholeWhateverTheSizeOfTheBuffer)
+TEST(UniqueStampTest, TheWholeTextIsWrittenWhateverTheSizeOfTheBuffer)
 {
     const TimeZone zone("UTC0");
     Buffer buffer;
@@ -187,7 +187,7 @@ TEST(UniqueStampTest, TheTextIsWrittenWholeWhateverTheSizeOfTheBuffer)
     EXPECT_STREQ("20231114221320_1073741824", buffer.bytes);
 }
 
-TEST(UniqueStampTest, TheBufferIsZeroBehindTheText)
+TEST(UniqueStampTest, TheBufferIsZeroAfterTheText)
 {
     const TimeZone zone("UTC0");
     Buffer buffer;

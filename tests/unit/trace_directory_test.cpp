@@ -34,7 +34,7 @@ TEST_F(CustomLogDirTest, IsCreatedWithItsParents)
     EXPECT_EQ("Setting logs dir='" + dir / "a/b/logs" + "'\n", log.text());
 }
 
-TEST_F(CustomLogDirTest, ThatExistsIsLeftAsItIsWithoutAWord)
+TEST_F(CustomLogDirTest, ThatExistsIsLeftAsItIsSilently)
 {
     makeDirectories(dir / "logs");
 
@@ -164,7 +164,7 @@ TEST_F(CommonLogDirTest, IsUndoneByARollbackButTheSettingStays)
     EXPECT_TRUE(pathExists("/etc/kel/corvan/common/cfg/log.properties"));
 }
 
-TEST_F(CommonLogDirTest, LiesWhereTheSettingSays)
+TEST_F(CommonLogDirTest, IsWhereTheSettingSays)
 {
     nameCommonDirectory(dir / "common");
 
@@ -185,7 +185,7 @@ TEST_F(CommonLogDirTest, ThatExistsIsNotMentioned)
     EXPECT_EQ(0755U, modeOf("/usr/kel/corvan/common/ZOR/logs"));
 }
 
-TEST_F(CommonLogDirTest, ACommonDirectoryThatCannotBeCreatedShowsInTheLogOnly)
+TEST_F(CommonLogDirTest, ACommonDirectoryThatCannotBeCreatedIsOnlyLogged)
 {
     writeFile(dir / "file", "");
     nameCommonDirectory(dir / "file/common");

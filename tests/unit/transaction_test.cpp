@@ -94,7 +94,7 @@ TEST_F(TransactionTest, RollbackPutsBackTheFileThatTheRunReplaced)
     EXPECT_FALSE(pathExists(dir / "zor.ini.bak"));
 }
 
-TEST_F(TransactionTest, RollbackPutsABackupOverWhatLiesInItsPlace)
+TEST_F(TransactionTest, RollbackMovesABackupOverWhatReplacedTheFile)
 {
     writeFile(dir / "file.bak", "old");
     writeFile(dir / "file", "of somebody else");
@@ -122,12 +122,12 @@ TEST_F(TransactionTest, RollbackDeletesFilesBeforeTheirDirectories)
 TEST_F(TransactionTest, RollbackLeavesADirectoryThatHoldsWhatNoEntryRecorded)
 {
     makeDirectories(dir / "a");
-    writeFile(dir / "a/foreign", "");
+    writeFile(dir / "a/other", "");
     record(transaction, DirectoryCreated, dir / "a");
 
     EXPECT_EQ(0, rollback(transaction));
 
-    EXPECT_TRUE(pathExists(dir / "a/foreign"));
+    EXPECT_TRUE(pathExists(dir / "a/other"));
 }
 
 TEST_F(TransactionTest, RollbackNeverRemovesADirectoryInPlaceOfAFile)
@@ -255,7 +255,7 @@ TEST_F(TransactionTest, CommitAndRollbackSkipKindsThatTheyDoNotKnow)
     }
 }
 
-TEST_F(TransactionTest, ATransactionServesAgainAfterItsEnd)
+TEST_F(TransactionTest, ATransactionCanBeReusedAfterItsEnd)
 {
     record(transaction, BackedUp, dir / "earlier");
     EXPECT_EQ(0, commit(transaction));
@@ -294,7 +294,7 @@ TEST_F(JournalFileTest, ShowsAnUnknownKindAsABlank)
     EXPECT_EQ("  /a\n  /b\n", readFile(dir / "journal"));
 }
 
-TEST_F(JournalFileTest, IsWrittenAnew)
+TEST_F(JournalFileTest, IsOverwritten)
 {
     writeFile(dir / "journal", "C /of/an/older/and/longer/journal\n");
     record(transaction, Created, "/a");
@@ -381,7 +381,7 @@ TEST_F(JournalFileTest, ALineOfFewerThanThreeCharactersIsCode4)
     }
 }
 
-TEST_F(JournalFileTest, AnUnknownKindDoesNotComeBack)
+TEST_F(JournalFileTest, AnUnknownKindIsNotLoaded)
 {
     record(transaction, 3, "/a");
     EXPECT_EQ(0, saveJournal(transaction, dir / "journal"));
@@ -654,7 +654,7 @@ TEST_F(BackupFileTest, ADirectoryThatCannotBeWrittenIsCode9)
     EXPECT_EQ("old", readFile(dir / "closed/file"));
 }
 
-TEST_F(BackupFileTest, ALinkThatLeadsNowhereCountsAsMissing)
+TEST_F(BackupFileTest, ADanglingLinkCountsAsMissing)
 {
     std::filesystem::create_symlink("nowhere", dir / "link");
 

@@ -246,7 +246,7 @@ TEST_F(RegistrationOnlyTest, ARegistryThatCannotBeSavedIsTheResult)
     EXPECT_TRUE(logHolds("*** Error: could not open or write to INI file. Error = 4\n"));
 }
 
-TEST_F(RegistrationOnlyTest, APerUserInstallationSetsNoCommonLogDirectoryUp)
+TEST_F(RegistrationOnlyTest, APerUserInstallationDoesNotSetUpTheCommonLogDirectory)
 {
     localInstall = true;
     makeDirectories("/root/.zor");
@@ -257,7 +257,7 @@ TEST_F(RegistrationOnlyTest, APerUserInstallationSetsNoCommonLogDirectoryUp)
     EXPECT_TRUE(pathExists("/root/.zor/zor.ini"));
 }
 
-TEST_F(RegistrationOnlyTest, ACustomTracePathSetsNoLogDirectoryUp)
+TEST_F(RegistrationOnlyTest, ACustomTracePathDoesNotSetUpALogDirectory)
 {
     EXPECT_EQ(0, upgrade(true, true));
 
@@ -276,7 +276,7 @@ TEST_F(RegistrationOnlyTest, DetectsSingleUserMode)
     EXPECT_EQ(0755U, modeOf("/usr/kel/corvan/common/ZOR/logs"));
 }
 
-TEST_F(RegistrationOnlyTest, CreatesTheFlagOfSingleUserModeWhenAsked)
+TEST_F(RegistrationOnlyTest, CreatesTheSingleUserFlagWhenAsked)
 {
     createSingleUserModeFile = true;
 
@@ -369,7 +369,7 @@ TEST_F(DeploymentTest, ScannersThatCannotBeStoppedEndItWith7)
     EXPECT_EQ("trawlfs [-shutdown]\ntrawlcfg [-disable] [all]\n", scannerCalls());
 }
 
-TEST_F(DeploymentTest, CreatesTheFlagOfSingleUserModeAlsoWhenTheScannersCannotBeStopped)
+TEST_F(DeploymentTest, CreatesTheSingleUserFlagAlsoWhenTheScannersCannotBeStopped)
 {
     ignoreUpdateErrors = false;
     createSingleUserModeFile = true;
@@ -380,7 +380,7 @@ TEST_F(DeploymentTest, CreatesTheFlagOfSingleUserModeAlsoWhenTheScannersCannotBe
     EXPECT_TRUE(pathExists(Home + "/config/SingleUserMode"));
 }
 
-TEST_F(DeploymentTest, ARestartThatFailsIsLoggedAndIsNoFailure)
+TEST_F(DeploymentTest, ARestartThatFailsIsLoggedAndIsNotAFailure)
 {
     toolkit = toolkitFiles(dir / "calls", "-enable");
 
@@ -474,7 +474,7 @@ TEST_F(DeploymentTest, LeavesTheScriptsOfAPerUserInstallationAlone)
     EXPECT_EQ("rmdir $(CorvanCommonDir)/ZOR\n", readFile(Home + "/install/rmdirs.sh"));
 }
 
-TEST_F(DeploymentTest, SetsTheCommonLogDirectoryOfASharedInstallationUp)
+TEST_F(DeploymentTest, SetsUpTheCommonLogDirectoryOfASharedInstallation)
 {
     EXPECT_EQ(0, upgrade());
 
@@ -542,7 +542,7 @@ TEST_F(ObsoleteFilesTest, AreDeletedFromTheBinariesInTheirOrder)
               log.text());
 }
 
-TEST_F(ObsoleteFilesTest, ThatAreNotThereArePassedOverSilently)
+TEST_F(ObsoleteFilesTest, ThatAreMissingAreSkippedSilently)
 {
     makeDirectories(dir / "bin");
     writeFile(dir / "bin/libzor.so", "");
@@ -552,7 +552,7 @@ TEST_F(ObsoleteFilesTest, ThatAreNotThereArePassedOverSilently)
     EXPECT_EQ("DEL: " + dir / "bin/libzor.so" + "\n", log.text());
 }
 
-TEST_F(ObsoleteFilesTest, EmptyDirectoriesOfTheirNamesGoAsWell)
+TEST_F(ObsoleteFilesTest, EmptyDirectoriesOfTheirNamesAreDeletedToo)
 {
     makeDirectories(dir / "bin/trawlnet");
 

@@ -37,7 +37,7 @@ TEST(VersionTest, AFinalDotAndWhiteSpaceAroundAreAccepted)
     EXPECT_EQ("1.2.3.0004.5", shown("1.2.3.4.5."));
 }
 
-TEST(VersionTest, RejectsWhatIsNoVersionAndLeavesTheRecordAlone)
+TEST(VersionTest, RejectsInvalidTextsAndLeavesTheRecordAlone)
 {
     for (const char* const text : {"2..3", "-1", "+1", "2.x", "x", "1 2", "1.2.3.4.5.6", "2.3.a"}) {
         ZorVersion version = {7, 7, 7, 7, 7};

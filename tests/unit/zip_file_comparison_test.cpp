@@ -130,7 +130,7 @@ std::string anyDeflate(Dice& dice, const std::string& content)
     return data;
 }
 
-// Wounds.
+// Damage.
 
 /// Another size than `size`, at least 1: by little, by much, or at a step of the readers.
 std::uint32_t otherSize(Dice& dice, std::uint32_t size, bool smaller)
@@ -160,7 +160,7 @@ void flipBits(Dice& dice, std::string& data)
     }
 }
 
-/// Does one thing wrong; returns it in words.
+/// Damages the sample in one way; returns a description.
 const char* wound(Dice& dice, std::string& data, ZipEntry& entry, bool& cut)
 {
     switch (dice.below(8)) {
@@ -254,7 +254,7 @@ private:
     int calls_ = 0;
 };
 
-/// What a call has brought.
+/// What a call returned.
 struct Answer {
     int count = 0;
     std::string bytes;
@@ -336,7 +336,7 @@ protected:
 
             EXPECT_EQ(expected.count, answer.count) << "read of " << call.len;
             EXPECT_TRUE(expected.bytes == answer.bytes) << "bytes of a read of " << call.len;
-            EXPECT_EQ(expected.available, answer.available) << "behind a read of " << call.len;
+            EXPECT_EQ(expected.available, answer.available) << "after a read of " << call.len;
             if (HasFailure())
                 return Mismatch;
             delivered += answer.bytes;
@@ -376,7 +376,7 @@ TEST_F(StreamComparisonTest, TheStreamDoesWhatItsModelDoesOnRandomEntries)
     }
 }
 
-TEST_F(StreamComparisonTest, TheProgramEndsWhereTheModelSaysSo)
+TEST_F(StreamComparisonTest, TheProgramAbortsWhereTheModelDoes)
 {
     int deaths = 0;
     for (std::uint32_t seed = FirstSeed; deaths < 10; ++seed) {

@@ -54,7 +54,7 @@ std::string readBlock(InputStream& stream, int len)
 
 class ZipStreamTest : public testing::Test {
 protected:
-    /// A stream over the first item of an archive that has only one, with `tail` behind it.
+    /// A stream over the first item of an archive that has only one, followed by `tail`.
     std::unique_ptr<InputStream> openItem(const ZipItem& item, const std::string& tail = {})
     {
         return openOf({{item}}, tail);
@@ -711,7 +711,7 @@ TEST_F(IntactEntryTest, DataInStoredBlocksOfSizesAroundWholeBlocksArrivesWhole)
 
 TEST_F(IntactEntryTest, OneRepeatedByteOfSizesAroundWholeBlocksArrivesWhole)
 {
-    // The last match of up to 258 bytes crosses the end of a block; no input is left behind it.
+    // The last match of up to 258 bytes crosses the end of a block; no input is left after it.
     std::vector<std::string> contents;
     for (std::size_t size = 7800; size <= 8800; ++size)
         contents.emplace_back(size, 'r');
@@ -774,7 +774,7 @@ TEST_F(ZipStreamDeathTest, AnEntryThatInflatesToMoreThanItsSizeEndsTheProgram)
                 testing::Eq(assertionMessage()));
 }
 
-TEST_F(ZipStreamDeathTest, TheProgramEndsInTheBlockThatBringsTheSurplus)
+TEST_F(ZipStreamDeathTest, TheProgramEndsInTheBlockWithTheSurplus)
 {
     const std::string content = textBytes(20000, 1);
     ZipItem item = deflatedItem("a", content);

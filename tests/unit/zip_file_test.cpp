@@ -385,7 +385,7 @@ TEST_F(ZipDirectoryTest, ALocalNameCutShortLeadsToTheScan)
     EXPECT_EQ((Names{"one", "two"}), namesOf(archive));
 }
 
-TEST_F(ZipDirectoryTest, BytesBeforeTheArchiveSpoilDirectoryAndScan)
+TEST_F(ZipDirectoryTest, BytesBeforeTheArchiveBreakDirectoryAndScan)
 {
     EXPECT_EQ(3, codeOf(std::string("#!") + zipBytes(twoRoads())));
     EXPECT_TRUE(entries.empty());
@@ -474,7 +474,7 @@ TEST_F(ZipDirectoryTest, TheScanGoesOnWhenOnlyOneOfCrcAndSizesIsKnown)
     EXPECT_EQ(FromScan, namesOf(archive));
 }
 
-TEST_F(ZipDirectoryTest, TheScanTakesAnEmptyFileWithoutTheFlagForWhatItIs)
+TEST_F(ZipDirectoryTest, TheScanListsAnEmptyFileWithoutTheFlag)
 {
     ZipArchive archive = {{storedItem("one", ""), storedItem("two", "2")}};
     archive.items[0].local.flags = 0xFFF7; // all but the one that says that sizes follow
@@ -612,7 +612,7 @@ TEST_F(ZipDirectoryTest, SizesThatFollowTheDataGive8)
     EXPECT_TRUE(entries.empty());
 }
 
-TEST_F(ZipDirectoryTest, TheNameIsReadBeforeTheSizesAreJudged)
+TEST_F(ZipDirectoryTest, TheNameIsReadBeforeTheSizesAreChecked)
 {
     LocalHeader header;
     header.flags = 8;

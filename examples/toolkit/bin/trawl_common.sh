@@ -1,12 +1,12 @@
 # What the toolkit's programs share. It is sourced by a program that has set `program` to its own
-# name and `home` to the toolkit's home directory; it is no program itself.
+# name and `home` to the toolkit's home directory; it is not a program itself.
 #
 # The state of the toolkit is "config/trawlcfg.state", lines of key=value that differ from the
 # start-up state:
 #   scanners=disabled        the scanners refuse to run
 #   common_trace_path=DIR    where the scanners write their traces
-# A state that says nothing but start-up values is no file at all, so switching something on and
-# off again leaves the configuration as it was, byte for byte.
+# A state of nothing but start-up values has no file, so switching something on and off again leaves
+# the configuration as it was, byte for byte.
 #
 # Every command line that trawlcfg and trawlfs receive is appended to a command log, one line each:
 # the program's name and its arguments, those with a blank in them in double quotes. Two variables
@@ -99,7 +99,7 @@ receive()
     fi
 
     failure=$(wanted_failure)
-    [ -z "$failure" ] || die "$failure" "told to fail: $command_line"
+    [ -z "$failure" ] || die "$failure" "made to fail: $command_line"
 }
 
 # Ends a command that succeeded.

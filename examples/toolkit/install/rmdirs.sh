@@ -1,7 +1,7 @@
 #!/bin/sh
-# Removes directories of the toolkit that a removal left behind because something lay in them that
-# has been taken away since: only empty ones, the deepest first. The installer fills in the three
-# directories; whoever wants to use this after a removal takes a copy before it.
+# Removes directories of the toolkit that a removal left because they were not empty: only those
+# that are empty now, the deepest first. The installer fills in the three directories; to use this
+# after a removal, copy it before.
 # shellcheck disable=SC2016 # what looks like a command is a placeholder
 set -eu
 

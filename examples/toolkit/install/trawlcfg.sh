@@ -1,6 +1,6 @@
 #!/bin/sh
-# Runs the scanner control of the toolkit that lies in this directory's parent, with the toolkit's
-# libraries in reach. The installer fills in the three directories.
+# Runs the scanner control of the toolkit in this directory's parent, with the toolkit's libraries
+# on the library path. The installer fills in the three directories.
 # shellcheck disable=SC2016 # what looks like a command is a placeholder
 set -eu
 

@@ -6,8 +6,7 @@
 //                                           and makes a symbolic link A to TARGET
 //     race_attacker plant TARGET PATH...    makes symbolic links PATH to TARGET when PATH is free
 //     race_attacker hold PATH...            opens each PATH for writing as soon as it can, and
-//     writes
-//                                           "stolen" to it when SIGTERM comes
+//                                           writes "stolen" to it when SIGTERM comes
 //
 // It prints "ready" once it is about to begin, and ends with status 0 after SIGTERM.
 #include <csignal>

@@ -1,4 +1,4 @@
-// What a stream over a deflated entry must do, in the plainest form: the measure for faster ones.
+// What a stream over a deflated entry must do, in its simplest form: the reference for faster ones.
 //
 // It works in small steps, on bytes in memory, and is meant to be read rather than to be fast:
 // compressed data is read ahead 4096 bytes at a time, and each piece goes through inflate into the

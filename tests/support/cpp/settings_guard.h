@@ -3,7 +3,7 @@
 
 #include <functional>
 
-/// Takes down every setting that can be written and restores them all at its end.
+/// Saves every setting that can be written, and restores them all at its end.
 class SettingsGuard {
 public:
     SettingsGuard();

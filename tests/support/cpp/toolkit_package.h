@@ -1,4 +1,4 @@
-// A small toolkit for tests: its files, the SPB that carries them, and scanner programs that log
+// A small toolkit for tests: its files, the SPB that contains them, and scanner programs that log
 // their calls.
 #pragma once
 
@@ -23,7 +23,7 @@ std::string scannerProgram(const std::string& log, const std::string& failing = 
 void plantScanners(const std::string& home, const std::string& log,
                    const std::string& failing = "");
 
-/// The files of a whole toolkit, its scanner programs as above.
+/// The files of a complete toolkit, its scanner programs as above.
 PackageFiles toolkitFiles(const std::string& log, const std::string& failing = "");
 
 /// The content of the file `name` in `files`, to be changed; the test fails when there is none.

@@ -33,7 +33,7 @@ def install(machine, *options, user=ROOT):
     assert outcome.status == 0, outcome.stdout + outcome.stderr
 
 
-def furnish(machine, action, home=HOME, registry="/etc/zor/zor.ini", user=ROOT):
+def prepare(machine, action, home=HOME, registry="/etc/zor/zor.ini", user=ROOT):
     """Installs the toolkit and makes the machine one on which `action` does what its name says."""
     install(machine, user=user)
     if action == "installation":
@@ -55,7 +55,7 @@ def register(machine, user, registry, home, version, date):
 
 
 class Untouched:
-    """With it, a run must leave everything in `places` as it was, but what is in `without`."""
+    """A context in which everything in `places` but what is in `without` must stay as it was."""
 
     def __init__(self, machine, places=OUTSIDE, without=ITS_OWN):
         self.look = lambda: machine.state(*places, without=without)

@@ -25,7 +25,7 @@ def same_lines(actual, expected, what="lines"):
 
 
 def printed(outcome, expected, status=0, stderr=""):
-    """Checks all that a run left behind in its streams, and its exit status."""
+    """Checks the output streams of a run, and its exit status."""
     same_text(outcome.stdout, expected, "standard output")
     same_text(outcome.stderr, stderr, "standard error")
     assert outcome.status == status, f"exit status expected: {status}, found: {outcome.status}"

@@ -3,7 +3,7 @@
 A run that ends with status 0 must leave the tree of an undisturbed run; one that ends with status 1
 the tree that it found. Each rule names one way in which the installer deliberately does less, and
 excuses the difference at one path only where the failing call, the outcome and the content found
-there all speak for it. What no rule excuses is a violation.
+there all support that. What no rule excuses is a violation.
 """
 
 import os
@@ -45,7 +45,7 @@ CONTROL_FAILED = re.compile(r"^Exec '\S*/bin/trawlcfg .*' returned [1-9]", re.M)
 
 TRACE_PATH_SET = re.compile(r"^Setting common trace path='.*' result=0$", re.M)
 
-# Calls that look at a name or at what is behind it.
+# Calls that look at a name or at what it refers to.
 LOOKS = ("access", "fstat", "open", "read", "stat", "walk")
 
 
@@ -321,7 +321,7 @@ def second_pass_takes_the_backup(case, path):
     )
 
 
-# Steps whose failure is not looked at.
+# Steps whose failure is ignored.
 
 
 @rule(

@@ -19,7 +19,7 @@ from harness.scenarios import INDEX, PACKAGES
 TRACE = "/var/strace/trace"
 TIME_LIMIT = 30  # seconds
 
-# What each kind of call can give of the four errors. A write and a close can give what a network
+# Which of the four errors each kind of call can return. A write and a close can give what a network
 # file system reports late; on a local one a close never fails.
 ERRORS = {
     "access": ("EIO", "EACCES"),
@@ -107,7 +107,7 @@ NOT_OF_FILES = {
 FIRST_CALL = re.compile(r"getuid(32)?\(")
 
 CALL = re.compile(r"(\w+)\((.*)\) += +(.*)$")
-# A path, with the directory that it starts from, and a descriptor with what is open behind it.
+# A path, with the directory that it starts from, and a descriptor with what it refers to.
 PATH = re.compile(r'(?:(?:AT_FDCWD|\d+)<([^>]*)>(?:\(deleted\))?, )?"((?:[^"\\]|\\.)*)"')
 OPENED = re.compile(r"(\d+)<(/[^>]*)>")
 DESCRIPTOR = re.compile(r"^\d+<(.*?)>(?:\(deleted\))?(?:, |$)")
@@ -115,7 +115,7 @@ DESCRIPTOR = re.compile(r"^\d+<(.*?)>(?:\(deleted\))?(?:, |$)")
 
 @dataclass(frozen=True)
 class Point:
-    """The `count`th call by the name `name`, on `path`: for a descriptor, the path behind it.
+    """The `count`th call by the name `name`, on `path`, or on the path of a descriptor.
 
     `late` is true once the procedure of an installation is over: its commit or rollback and the
     modes of the tree follow. `result` is what the call gave in the traced run, `entry` the file
@@ -190,7 +190,7 @@ def paths_of(kind, arguments):
 def points_of(trace):
     """The points of a trace of a whole run, in the order made."""
     points, counts, begun, late = [], {}, False, False
-    opened = {}  # what is behind the names of descriptors below /proc
+    opened = {}  # what the names of descriptors below /proc refer to
     for line in trace.splitlines():
         begun = begun or FIRST_CALL.match(line) is not None
         call = CALL.match(line)

@@ -1,7 +1,7 @@
 """A random life: a seeded sequence of actions, options, packages, planted files and failures.
 
 After each action the model (life_model.py) says what must have happened. A failing life prints
-its seed and its steps; the same seed lives the same life again.
+its seed and its steps; the same seed gives the same life.
 """
 
 import random
@@ -24,7 +24,7 @@ from harness.life_model import (
 )
 from harness.machine import SPB, Machine
 
-# Parts of one another, so that the text search of a removal meets its odd cases.
+# Parts of one another, so that the text search of a removal reaches its edge cases.
 EXPLOITERS = ("ABC", "XABC", "BC", "Q")
 
 FAILING_COMMANDS = ("common_trace_path", "-enable", "-shutdown", "-disable")

@@ -1,6 +1,6 @@
-"""The model behind the random lives: what an action must do, from the history alone.
+"""The model of the random lives: what an action must do, from the history alone.
 
-A life is lived on one machine with two places: the shared installation of root and the one of
+A life takes place on one machine with two places: the shared installation of root and the one of
 the user ann. For each place the model holds the `Record` that its registry must contain.
 Everything else that an action depends on it reads from the tree as it was before the action.
 """

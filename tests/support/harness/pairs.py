@@ -1,8 +1,8 @@
-"""Two runs of the installer at once, and what may come of them.
+"""Two runs of the installer at once, and their permitted outcomes.
 
 Both run on one machine, the second a moment after the first. A round is right when statuses and
 tree are those of the two runs one after the other, in either order. Without a lock that is only
-measured; but whatever happens, the registry must be whole, and not from before both runs.
+measured; but the registry must always be complete, and newer than before both runs.
 """
 
 import json
@@ -38,7 +38,7 @@ class Pair:
     name: str
     title: str
     runs: tuple
-    furnish: object
+    prepare: object
     user: object = ROOT
 
     @property

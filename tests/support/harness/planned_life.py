@@ -1,4 +1,4 @@
-"""A life at random in which every run of the installer is planned before, and the plan compared."""
+"""A random life in which every run of the installer is planned first and compared with its plan."""
 
 import json
 
@@ -42,7 +42,7 @@ class PlannedLife(Life):
         return outcome
 
     def depends_on_failing_command(self, plan, outcome):
-        """A plan takes it that commands succeed: one that fails may make the run fail."""
+        """A plan assumes that commands succeed: one that fails may make the run fail."""
         return (
             plan["succeeds"]
             and outcome.status == 1

@@ -1,6 +1,6 @@
 """Races between a run of the installer as root and an attacker who changes names meanwhile.
 
-A `Race` is furnished once. Each round gets a copy of that machine, starts the attacker
+The machine of a `Race` is set up once. Each round gets a copy of that machine, starts the attacker
 (tests/support/cpp/race_attacker.cpp) with a user id of its own, runs the installer once, and looks
 at what the attacker could not have changed alone: if it has changed, the attacker has won.
 """
@@ -17,7 +17,7 @@ from dataclasses import dataclass
 from typing import Callable
 
 from harness import bubblewrap
-from harness.attacks import BIN_ETC, HOME, PROBE, furnish
+from harness.attacks import BIN_ETC, HOME, PROBE, prepare
 from harness.machine import BINARY, ROOT, SPB
 from harness.shared_machine import GUEST, HANGS, OUTSIDE, SECRET, SharedMachine
 
@@ -53,7 +53,7 @@ class Race:
     name: str
     title: str
     win_rate: float
-    furnish: Callable
+    prepare: Callable
     attack: tuple  # the attacker's command line, paths of the machine
     command: tuple  # the installer's
     stolen: str = ""  # the file that must not hold what the attacker writes
@@ -107,12 +107,12 @@ def cache_of_the_guest(machine):
 
 
 def upgrade_with_cache(machine):
-    furnish(machine, "upgrade")
+    prepare(machine, "upgrade")
     cache_of_the_guest(machine)
 
 
 def removal_with_cache(machine):
-    furnish(machine, "removal")
+    prepare(machine, "removal")
     cache_of_the_guest(machine)
 
 
@@ -121,7 +121,7 @@ def upgrade_with_deep_cache(machine):
 
     Where the directory is moved to, others have files whose names are next to it in the cache.
     """
-    furnish(machine, "upgrade")
+    prepare(machine, "upgrade")
     fill(machine, SECRET + "/names")
     fill(machine, "/tmp")
     machine.as_user(GUEST, lambda: fill(machine, CACHE + "/top"))
@@ -137,13 +137,13 @@ CUSTOM_FILES = {
 
 def upgrade_with_custom_scanners(machine):
     machine.pack(CUSTOM_FILES)
-    furnish(machine, "upgrade")
+    prepare(machine, "upgrade")
 
 
 def upgrade_with_scanners_below(machine):
     machine.pack({**CUSTOM_FILES, "bin/customscanners/sub/run.sh": b"run\n"})
     machine.make_directory(CUSTOM + "/sub")
-    furnish(machine, "upgrade")
+    prepare(machine, "upgrade")
     as_guest(machine, os.mkdir, GUESTS + "/dir")
     machine.link_as(GUEST, GUESTS + "/link", SECRET)
     os.rename(machine.at(GUESTS + "/dir"), machine.at(CUSTOM + "/guests"))
@@ -166,7 +166,7 @@ def board_of_all(machine):
 
 
 def hard_links_in_bin_etc(machine):
-    furnish(machine, "registration")
+    prepare(machine, "registration")
     board_of_all(machine)
     for name in ("trawlfs", "trawlhw", "trawlsw"):
         own = machine.at(f"{BIN_ETC}/{name}")
@@ -177,7 +177,7 @@ def hard_links_in_bin_etc(machine):
 
 
 def hard_link_at_the_probe(machine):
-    furnish(machine, "registration")
+    prepare(machine, "registration")
     board_of_all(machine)
     machine.give_to(GUEST, HOME)
     machine.as_user(GUEST, lambda: open(machine.at(PROBE), "w", encoding="ascii").close())
@@ -185,13 +185,13 @@ def hard_link_at_the_probe(machine):
 
 
 def directory_in_bin_etc(machine):
-    furnish(machine, "registration")
+    prepare(machine, "registration")
     as_guest(machine, os.mkdir, BIN_ETC + "/trawlfs")
     machine.link_as(GUEST, GUESTS + "/link", SECRET)
 
 
 def common_directory_of_the_guest(machine):
-    furnish(machine, "registration")
+    prepare(machine, "registration")
     machine.remove("/usr/kel/corvan")
     as_guest(machine, os.mkdir, "/usr/kel/corvan")
     machine.link_as(GUEST, GUESTS + "/link", SECRET)
@@ -338,18 +338,18 @@ class Course:
     def __init__(self, race, binary, attacker):
         self.race = race
         self.attacker = attacker
-        self.furnished = SharedMachine(binary)
-        race.furnish(self.furnished)
+        self.prepared = SharedMachine(binary)
+        race.prepare(self.prepared)
 
     def __enter__(self):
         return self
 
     def __exit__(self, *_):
-        bubblewrap.delete_root(self.furnished.root)
+        bubblewrap.delete_root(self.prepared.root)
 
     def run(self, rounds):
         result = Result(self.race)
-        before = self.outside(self.furnished)
+        before = self.outside(self.prepared)
         for _ in range(rounds):
             damage = self.round(before)
             result.rounds += 1
@@ -360,11 +360,11 @@ class Course:
 
     def round(self, before):
         """Runs one round; returns what the attacker has achieved, or an empty text."""
-        machine = copy.copy(self.furnished)
+        machine = copy.copy(self.prepared)
         machine.root = os.path.join(tempfile.mkdtemp(prefix="wzorinst-race-"), "root")
         try:
             os.chmod(os.path.dirname(machine.root), 0o755)
-            subprocess.run(["cp", "-a", self.furnished.root, machine.root], check=True)
+            subprocess.run(["cp", "-a", self.prepared.root, machine.root], check=True)
             hangs = self.contend(machine)
             return hangs or self.damage(before, machine)
         finally:

@@ -1,4 +1,4 @@
-"""What `zorctl doctor --apply` makes of an installation whose run was killed.
+"""What `zorctl doctor --apply` does with an installation whose run was killed.
 
 Afterwards the installation must be the old one, the new one, or none at all, and sound. Where it
 can only be one of them with an exception, the exception is named here.
@@ -20,7 +20,7 @@ SECOND_PASS = "in config/xss, whose second extraction takes the place of the old
 
 @dataclass
 class Repair:
-    """A run of `scenario` killed at `point`, and what the doctor made of it.
+    """A run of `scenario` killed at `point`, and what the doctor did.
 
     `state` is "old", "new", "none", or "again": the interrupted removal has to be run again, which
     the doctor says and a second run does.

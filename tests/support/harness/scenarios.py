@@ -1,7 +1,7 @@
 """The scenarios of the sweeps: what is on the machine, and the command given.
 
 A `Scenario` is a command line of the installer together with the tree that it finds. Its machine is
-furnished once, with the real binary and the example toolkit, and kept as a tree; `restore` brings
+prepared once, with the real binary and the example toolkit, and kept as a tree; `restore` brings
 any machine back to such a tree, byte for byte and mode for mode, and owner for owner where root
 runs the sweep.
 """
@@ -33,7 +33,7 @@ SITE_COMMON = "/usr/kel/site/common"
 STORED_SPB = "/media/stored.spb"
 PACKAGES = (SPB, STORED_SPB)
 
-# Outside of what a tree shows, so that the number of commands plays no part in it.
+# Outside of what a tree shows, so that the number of commands does not matter.
 COMMAND_LOG = "/var/commands"
 
 OLD_FILE = HOME + "/bin/trawlold"
@@ -54,7 +54,7 @@ class Scenario:
     name: str
     title: str
     arguments: tuple
-    furnish: object
+    prepare: object
     fails: bool = False
     environment: dict = field(default_factory=dict)
 
@@ -107,7 +107,7 @@ def can_give_files_away(machine):
         machine.remove("/tmp/trial")
 
 
-# Furnishing.
+# Preparing.
 
 
 def nothing_installed(_):
@@ -167,14 +167,14 @@ def last_exploiter(machine):
     machine.plant(REGISTRY, machine.read(REGISTRY).replace("SHOP:DESK:", "SHOP:"), 0o640)
 
 
-def with_registry_that_cannot_be_saved(furnish):
+def with_registry_that_cannot_be_saved(prepare):
     """A directory at the registry's backup name stops the last fatal step."""
 
-    def furnish_so(machine):
-        furnish(machine)
+    def prepare_so(machine):
+        prepare(machine)
         machine.make_directory(REGISTRY + ".bak")
 
-    return furnish_so
+    return prepare_so
 
 
 SCENARIOS = {
@@ -253,11 +253,11 @@ def differences(wanted, got):
     return [path for path in sorted(set(wanted) | set(got)) if wanted.get(path) != got.get(path)]
 
 
-def furnished(scenario, binary, packages):
+def prepared(scenario, binary, packages):
     """The tree of the machine on which `scenario` begins."""
     machine = new_machine(binary, packages)
     try:
-        scenario.furnish(machine)
+        scenario.prepare(machine)
         for path in filter(machine.exists, GIVEN_AWAY):
             machine.give(path, OPERATORS)
         return tree_of(machine)

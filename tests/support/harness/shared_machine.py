@@ -24,7 +24,7 @@ TIME_LIMIT = 20
 
 HANGS = "the run hangs"
 
-# What the attacks aim at. None of it is any business of a run of the installer.
+# What the attacks aim at. No run of the installer has any reason to touch it.
 SECRET = "/etc/secret"
 KEY = "/etc/secret/key"
 SHADOW = "/etc/shadow"

@@ -25,8 +25,8 @@ from harness.scenarios import (
     INDEX,
     REGISTRY,
     SCENARIOS,
-    furnished,
     new_machine,
+    prepared,
     restore,
     toolkit_packages,
     tree_of,
@@ -148,7 +148,7 @@ class Laboratory:
         try:
             return list(pool.map(on_a_free_machine, jobs))
         finally:
-            pool.shutdown(cancel_futures=True)  # of an interrupted sweep: not the rest as well
+            pool.shutdown(cancel_futures=True)  # after Ctrl-C, the rest is not run
 
 
 class Bench:
@@ -157,7 +157,7 @@ class Bench:
     def __init__(self, laboratory, scenario):
         self.scenario = scenario
         self.spare = laboratory.spare
-        self.before = furnished(scenario, laboratory.binary, laboratory.packages)
+        self.before = prepared(scenario, laboratory.binary, laboratory.packages)
         restore(self.spare, self.before)
         self.undisturbed, self.points = failure_points.trace(scenario, self.spare)
         self.normal = tree_of(self.spare)
