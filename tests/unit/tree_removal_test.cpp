@@ -2,12 +2,16 @@
 #include "paths.h"
 #include "process_limits.h"
 #include "safe_path.h"
+#include "settings.h"
 #include "tree_removal.h"
 
 #include <gtest/gtest.h>
 
 #include <algorithm>
 #include <filesystem>
+#include <functional>
+#include <ostream>
+#include <streambuf>
 
 #include <fcntl.h>
 #include <sys/resource.h>
@@ -30,6 +34,33 @@ Lines sortedLines(const std::string& text)
     std::sort(lines.begin(), lines.end());
     return lines;
 }
+
+/// A log that calls a function when a given line was printed.
+class WatchedLog : public std::streambuf {
+public:
+    WatchedLog(std::string line, std::function<void()> act)
+        : awaited_(std::move(line)), act_(std::move(act))
+    {
+    }
+
+protected:
+    int_type overflow(int_type character) override
+    {
+        if (character != '\n') {
+            line_ += static_cast<char>(character);
+            return character;
+        }
+        if (line_ == awaited_)
+            act_();
+        line_.clear();
+        return character;
+    }
+
+private:
+    std::string awaited_;
+    std::function<void()> act_;
+    std::string line_;
+};
 
 using DeleteFileTest = InstallerTest;
 
@@ -211,6 +242,46 @@ TEST_F(RemoveTreeTest, ADirectoryThatIsNotEmptyStaysWithoutAMessage)
     EXPECT_EQ("DEL: " + dir / "tree/sub/deep/file" + "\n", log.text());
 }
 
+TEST_F(RemoveTreeTest, ASubdirectoryThatIsNotEmptyStaysWithoutAMessage)
+{
+    protect("tree/sub/deep");
+
+    EXPECT_FALSE(removeTree(dir / "tree", true, false));
+
+    EXPECT_EQ(Lines({"DEL: " + dir / "tree/file", "DEL: " + dir / "tree/sub/deep/file",
+                     "DEL: " + dir / "tree/sub/file"}),
+              sortedLines(log.text()));
+}
+
+TEST_F(RemoveTreeTest, ADirectoryThatIsMovedAwayMeanwhileStays)
+{
+    makeDirectories(dir / "away");
+    WatchedLog watched("DEL: " + dir / "tree/sub/deep/file",
+                       [&] { fs::rename(dir / "tree/sub/deep", dir / "away/deep"); });
+    std::ostream stream(&watched);
+    logstream = &stream;
+
+    EXPECT_TRUE(removeTree(dir / "tree", true, false));
+
+    EXPECT_EQ(Lines({"d 0755 away", "d 0755 away/deep"}), treeOf(dir.path()));
+}
+
+TEST_F(RemoveTreeTest, ADirectoryWhoseParentIsMovedElsewhereTooStays)
+{
+    makeDirectories(dir / "away");
+    ASSERT_TRUE(fs::remove(dir / "tree/sub/file"));
+    WatchedLog watched("DEL: " + dir / "tree/sub/deep/file", [&] {
+        fs::rename(dir / "tree/sub/deep", dir / "away/deep");
+        fs::rename(dir / "tree/sub", dir / "away/sub");
+    });
+    std::ostream stream(&watched);
+    logstream = &stream;
+
+    EXPECT_TRUE(removeTree(dir / "tree", true, false));
+
+    EXPECT_EQ(Lines({"d 0755 away", "d 0755 away/deep", "d 0755 away/sub"}), treeOf(dir.path()));
+}
+
 TEST_F(RemoveTreeTest, AFailureInASubdirectoryAloneIsHidden)
 {
     protect("tree/sub/deep");
@@ -307,7 +378,7 @@ TEST_F(RemoveTreeTest, RemovingFilesNeverFails)
 
 TEST_F(RemoveTreeTest, ADeepTreeTakesFewDescriptorsAndLittleStack)
 {
-    constexpr int Levels = 2000;
+    constexpr int Levels = 500; // about 260 bytes of stack each
     const int top = open(dir.path().c_str(), O_RDONLY | O_DIRECTORY);
     int level = top;
     for (int depth = 0; depth < Levels; ++depth) {
