@@ -46,7 +46,17 @@ def tree(files):
     }
 
 
-def failed(scenario, status, kind, hit, *, before=None, after=None, normal=None, **more):
+def case(**arguments):
+    """The arguments of a case, for the functions below."""
+    return arguments
+
+
+def but(**changes):
+    """What differs from a case."""
+    return changes
+
+
+def failed(scenario, status, kind, hit, before=None, after=None, normal=None, **more):
     """A run in which the call of `kind` on `hit` failed."""
     references = more.get("references", {})
     return FailedCall(
@@ -64,7 +74,7 @@ def failed(scenario, status, kind, hit, *, before=None, after=None, normal=None,
     )
 
 
-def killed(scenario, status, *, before=None, between=None, after=None, normal=None, twice=None):
+def killed(scenario, status, before=None, between=None, after=None, normal=None, twice=None):
     """A run that was killed, and the same command again."""
     return Interruption(
         scenario=SCENARIOS[scenario],
@@ -110,214 +120,153 @@ OF_SHOP, OF_DESK = b"exploiters SHOP", b"exploiters SHOP DESK"
 INDEXED = b"# index\n/a\n/b\n"
 OLD, NEW = b"old", b"new"
 
-# The rule, a path, a case that it excuses there, and defects that it must not excuse.
+# The rule, a path, a case that it excuses there, and how the defects that it must not excuse differ
+# from that case.
 OF_FAILED_CALLS = [
     (
         "a failed deletion of the probe",
         PROBE,
-        failed("upgrade", 0, "unlink", PROBE, after={PROBE: b""}),
-        [
-            failed("upgrade", 0, "unlink", TOOL, after={PROBE: b""}),
-            failed("upgrade", 0, "unlink", PROBE, after={PROBE: b"text"}),
-        ],
+        case(scenario="upgrade", status=0, kind="unlink", hit=PROBE, after={PROBE: b""}),
+        [but(hit=TOOL), but(after={PROBE: b"text"})],
     ),
     (
         "a failed step of a commit",
         TOOL + ".bak",
-        failed(
-            "upgrade", 0, "unlink", TOOL + ".bak", before={TOOL: OLD}, after={TOOL + ".bak": OLD}
+        case(
+            scenario="upgrade",
+            status=0,
+            kind="unlink",
+            hit=TOOL + ".bak",
+            before={TOOL: OLD},
+            after={TOOL + ".bak": OLD},
         ),
-        [
-            failed(
-                "upgrade",
-                0,
-                "unlink",
-                TOOL + ".bak",
-                before={TOOL: OLD},
-                after={TOOL + ".bak": b"ol"},
-            ),
-            failed(
-                "upgrade", 0, "unlink", XSS + ".bak", before={TOOL: OLD}, after={TOOL + ".bak": OLD}
-            ),
-        ],
+        [but(after={TOOL + ".bak": b"ol"}), but(hit=XSS + ".bak")],
     ),
     (
         "a failed step of a rollback",
         TOOL,
-        failed(
-            "failing-upgrade",
-            1,
-            "rename",
-            TOOL + ".bak",
+        case(
+            scenario="failing-upgrade",
+            status=1,
+            kind="rename",
+            hit=TOOL + ".bak",
             late=True,
             before={TOOL: OLD},
             after={TOOL + ".bak": OLD},
         ),
-        [
-            failed("failing-upgrade", 1, "rename", TOOL + ".bak", late=True, before={TOOL: OLD}),
-            failed(
-                "failing-upgrade",
-                1,
-                "rename",
-                TOOL + ".bak",
-                before={TOOL: OLD},
-                after={TOOL + ".bak": OLD},
-            ),
-            failed(
-                "failing-upgrade",
-                1,
-                "rename",
-                XSS + ".bak",
-                late=True,
-                before={TOOL: OLD},
-                after={TOOL + ".bak": OLD},
-            ),
-        ],
+        [but(after=None), but(late=False), but(hit=XSS + ".bak")],
     ),
     (
         "a removal is best effort",
         TOOL,
-        failed("remove", 0, "unlink", TOOL, before={TOOL: OLD}, after={TOOL: OLD}),
-        [
-            failed("remove", 0, "unlink", TOOL, before={TOOL: OLD}, after={TOOL: b""}),
-            failed("remove", 0, "unlink", XSS, before={TOOL: OLD}, after={TOOL: OLD}),
-        ],
+        case(
+            scenario="remove",
+            status=0,
+            kind="unlink",
+            hit=TOOL,
+            before={TOOL: OLD},
+            after={TOOL: OLD},
+        ),
+        [but(after={TOOL: b""}), but(hit=XSS)],
     ),
     (
         "deletions of an upgrade are best effort",
         OBSOLETE,
-        failed("upgrade", 0, "unlink", OBSOLETE, before={OBSOLETE: OLD}, after={OBSOLETE: OLD}),
-        [
-            failed("upgrade", 0, "unlink", OBSOLETE, before={OBSOLETE: OLD}, after={OBSOLETE: NEW}),
-            failed("upgrade", 0, "unlink", TOOL, before={OBSOLETE: OLD}, after={OBSOLETE: OLD}),
-        ],
+        case(
+            scenario="upgrade",
+            status=0,
+            kind="unlink",
+            hit=OBSOLETE,
+            before={OBSOLETE: OLD},
+            after={OBSOLETE: OLD},
+        ),
+        [but(after={OBSOLETE: NEW}), but(hit=TOOL)],
     ),
     (
         "the index is not journalled",
         INDEX,
-        failed("upgrade", 1, "write", TOOL, before={INDEX: INDEXED}, after={INDEX: b"# index\n/a"}),
-        [
-            failed("upgrade", 1, "write", TOOL, before={INDEX: INDEXED}, after={INDEX: b"\0\0"}),
-            failed("upgrade", 1, "write", TOOL, before={INDEX: INDEXED}),
-        ],
+        case(
+            scenario="upgrade",
+            status=1,
+            kind="write",
+            hit=TOOL,
+            before={INDEX: INDEXED},
+            after={INDEX: b"# index\n/a"},
+        ),
+        [but(after={INDEX: b"\0\0"}), but(after=None)],
     ),
     (
         "the index is best effort",
         INDEX,
-        failed(
-            "upgrade",
-            0,
-            "write",
-            INDEX,
+        case(
+            scenario="upgrade",
+            status=0,
+            kind="write",
+            hit=INDEX,
             before={INDEX: INDEXED},
             normal={INDEX: INDEXED},
             after={INDEX: b"# index\n/a\n"},
         ),
-        [
-            failed(
-                "upgrade",
-                0,
-                "write",
-                INDEX,
-                before={INDEX: INDEXED},
-                normal={INDEX: INDEXED},
-                after={INDEX: b"# index\n/etc/passwd\n"},
-            ),
-            failed(
-                "upgrade",
-                0,
-                "write",
-                TOOL,
-                before={INDEX: INDEXED},
-                normal={INDEX: INDEXED},
-                after={INDEX: b"# index\n/a\n"},
-            ),
-        ],
+        [but(after={INDEX: b"# index\n/etc/passwd\n"}), but(hit=TOOL)],
     ),
     (
         "a removal deletes what the index lists",
         TOOL,
-        failed(
-            "remove",
-            0,
-            "read",
-            INDEX,
+        case(
+            scenario="remove",
+            status=0,
+            kind="read",
+            hit=INDEX,
             before={TOOL: OLD},
             after={TOOL: OLD},
             references={"with an index that lists nothing": {TOOL: OLD}},
         ),
-        [
-            failed(
-                "remove",
-                0,
-                "read",
-                INDEX,
-                before={TOOL: OLD},
-                after={TOOL: b""},
-                references={"with an index that lists nothing": {TOOL: OLD}},
-            ),
-            failed(
-                "remove",
-                0,
-                "read",
-                REGISTRY,
-                before={TOOL: OLD},
-                after={TOOL: OLD},
-                references={"with an index that lists nothing": {TOOL: OLD}},
-            ),
-        ],
+        [but(after={TOOL: b""}), but(hit=REGISTRY)],
     ),
     (
         "the install type is best effort",
         INSTALL_TYPE,
-        failed("install", 0, "rename", INSTALL_TYPE, normal={INSTALL_TYPE: NEW}),
+        case(
+            scenario="install",
+            status=0,
+            kind="rename",
+            hit=INSTALL_TYPE,
+            normal={INSTALL_TYPE: NEW},
+        ),
         [
-            failed(
-                "install",
-                0,
-                "rename",
-                INSTALL_TYPE,
-                normal={INSTALL_TYPE: NEW},
-                after={INSTALL_TYPE: b"n"},
-            ),
-            failed("install", 0, "rename", TOOL, normal={INSTALL_TYPE: NEW}),
-            failed("install", 1, "rename", TOOL, after={INSTALL_TYPE: b"ZOR_Install"}),
+            but(after={INSTALL_TYPE: b"n"}),
+            but(hit=TOOL),
+            but(status=1, hit=TOOL, after={INSTALL_TYPE: b"ZOR_Install"}, normal=None),
         ],
     ),
     (
         "the single-user flag is not journalled",
         SINGLE_USER_FLAG,
-        failed("failing-install", 1, "write", TOOL, after={SINGLE_USER_FLAG: b""}),
-        [
-            failed("failing-install", 1, "write", TOOL, before={SINGLE_USER_FLAG: b""}),
-            failed("failing-install", 1, "write", TOOL, after={SINGLE_USER_FLAG: b"text"}),
-        ],
+        case(
+            scenario="failing-install",
+            status=1,
+            kind="write",
+            hit=TOOL,
+            after={SINGLE_USER_FLAG: b""},
+        ),
+        [but(before={SINGLE_USER_FLAG: b""}, after=None), but(after={SINGLE_USER_FLAG: b"text"})],
     ),
     (
         "the common setting outlives a rollback",
         COMMON_SETTING,
-        failed(
-            "install",
-            1,
-            "write",
-            TOOL,
+        case(
+            scenario="install",
+            status=1,
+            kind="write",
+            hit=TOOL,
             after={COMMON_SETTING: b"corvan_common_dir=/usr/kel/corvan/common\n"},
         ),
         [
-            failed("install", 1, "write", TOOL, after={COMMON_SETTING: b""}),
-            failed(
-                "upgrade",
-                1,
-                "write",
-                TOOL,
-                before={COMMON_SETTING: OLD},
-                after={COMMON_SETTING: b"corvan_common_dir=/usr/kel/corvan/common\n"},
-            ),
-            failed(
-                "install",
-                0,
-                "write",
-                COMMON_SETTING,
+            but(after={COMMON_SETTING: b""}),
+            but(scenario="upgrade", before={COMMON_SETTING: OLD}),
+            but(
+                status=0,
+                hit=COMMON_SETTING,
                 normal={COMMON_SETTING: NEW},
                 after={COMMON_SETTING: b""},
             ),
@@ -326,363 +275,207 @@ OF_FAILED_CALLS = [
     (
         "a common setting that cannot be read is left alone",
         LOGS,
-        failed(
-            "upgrade",
-            0,
-            "read",
-            COMMON_SETTING,
+        case(
+            scenario="upgrade",
+            status=0,
+            kind="read",
+            hit=COMMON_SETTING,
             after={LOGS: DIRECTORY},
             references={"without a common setting": {LOGS: DIRECTORY}},
         ),
-        [
-            failed(
-                "upgrade",
-                0,
-                "read",
-                TOOL,
-                after={LOGS: DIRECTORY},
-                references={"without a common setting": {LOGS: DIRECTORY}},
-            ),
-            failed(
-                "upgrade",
-                0,
-                "read",
-                COMMON_SETTING,
-                after={LOGS: Node("d", 0o700)},
-                references={"without a common setting": {LOGS: DIRECTORY}},
-            ),
-        ],
+        [but(hit=TOOL), but(after={LOGS: Node("d", 448)})],
     ),
     (
         "the common directory is best effort",
         LOGS,
-        failed("install", 0, "mkdir", LOGS, normal={LOGS: DIRECTORY}),
-        [
-            failed("install", 0, "mkdir", HOME, normal={LOGS: DIRECTORY}),
-            failed("install", 0, "write", LOGS, normal={LOGS: DIRECTORY}),
-        ],
+        case(scenario="install", status=0, kind="mkdir", hit=LOGS, normal={LOGS: DIRECTORY}),
+        [but(hit=HOME), but(kind="write")],
     ),
     (
         "an upgrade's deletions are not undone",
         OBSOLETE,
-        failed("upgrade", 1, "write", TOOL, before={OBSOLETE: OLD}, output=DEPLOYING),
-        [
-            failed("register", 1, "write", REGISTRY, before={OBSOLETE: OLD}),
-            failed(
-                "upgrade",
-                1,
-                "write",
-                TOOL,
-                before={OBSOLETE: OLD},
-                after={OBSOLETE: NEW},
-                output=DEPLOYING,
-            ),
-        ],
+        case(
+            scenario="upgrade",
+            status=1,
+            kind="write",
+            hit=TOOL,
+            before={OBSOLETE: OLD},
+            output=DEPLOYING,
+        ),
+        [but(scenario="register", hit=REGISTRY, output=""), but(after={OBSOLETE: NEW})],
     ),
     (
         "the settings are not journalled",
         SETTINGS,
-        failed(
-            "upgrade",
-            1,
-            "write",
-            REGISTRY,
+        case(
+            scenario="upgrade",
+            status=1,
+            kind="write",
+            hit=REGISTRY,
             before={SETTINGS: OLD},
             normal={SETTINGS: NEW},
             after={SETTINGS: NEW},
         ),
-        [
-            failed(
-                "upgrade",
-                1,
-                "write",
-                REGISTRY,
-                before={SETTINGS: OLD},
-                normal={SETTINGS: NEW},
-                after={SETTINGS: b"ne"},
-            ),
-            failed("upgrade", 1, "write", REGISTRY, before={SETTINGS: OLD}, normal={SETTINGS: NEW}),
-        ],
+        [but(after={SETTINGS: b"ne"}), but(after=None)],
     ),
     (
         "a property file that cannot be written keeps its old content",
         SETTINGS,
-        failed(
-            "upgrade",
-            0,
-            "write",
-            SETTINGS + ".wzorinst-new",
+        case(
+            scenario="upgrade",
+            status=0,
+            kind="write",
+            hit=SETTINGS + ".wzorinst-new",
             before={SETTINGS: OLD},
             normal={SETTINGS: NEW},
             after={SETTINGS: OLD},
         ),
         [
-            failed(
-                "upgrade",
-                0,
-                "write",
-                SETTINGS,
-                before={SETTINGS: OLD},
-                normal={SETTINGS: NEW},
-                after={SETTINGS: b""},
-            ),
-            failed(
-                "upgrade",
-                0,
-                "write",
-                SETTINGS,
-                before={SETTINGS: OLD},
-                normal={SETTINGS: NEW},
-                after={SETTINGS: b"ne"},
-            ),
-            failed(
-                "upgrade",
-                0,
-                "write",
-                TOOL,
-                before={SETTINGS: OLD},
-                normal={SETTINGS: NEW},
-                after={SETTINGS: OLD},
-            ),
+            but(hit=SETTINGS, after={SETTINGS: b""}),
+            but(hit=SETTINGS, after={SETTINGS: b"ne"}),
+            but(hit=TOOL),
         ],
     ),
     (
         'the second pass over "config/xss" takes the backup',
         XSS,
-        failed(
-            "upgrade",
-            1,
-            "write",
-            TOOL,
+        case(
+            scenario="upgrade",
+            status=1,
+            kind="write",
+            hit=TOOL,
             before={XSS: OLD},
             name_changes=[moved(XSS), moved(XSS, False), deleted(XSS + ".bak"), moved(XSS)],
         ),
         [
             # A rollback that deletes the backups instead of restoring them.
-            failed(
-                "upgrade",
-                1,
-                "write",
-                TOOL,
-                before={XSS: OLD},
-                name_changes=[moved(XSS), deleted(XSS + ".bak")],
-            ),
-            failed(
-                "upgrade",
-                1,
-                "write",
-                TOOL,
-                before={XSS: OLD},
-                name_changes=[moved(XSS), moved(XSS, False)],
-            ),
-            failed("upgrade", 1, "write", TOOL, before={XSS: OLD}),
+            but(name_changes=[moved(XSS), deleted(XSS + ".bak")]),
+            but(name_changes=[moved(XSS), moved(XSS, False)]),
+            but(name_changes=[]),
         ],
     ),
     (
         "modes are best effort",
         TOOL,
-        failed(
-            "upgrade", 0, "chmod", TOOL, normal={TOOL: NEW}, after={TOOL: Node("f", 0o600, NEW)}
+        case(
+            scenario="upgrade",
+            status=0,
+            kind="chmod",
+            hit=TOOL,
+            normal={TOOL: NEW},
+            after={TOOL: Node("f", 384, NEW)},
         ),
         [
-            failed(
-                "upgrade", 0, "chmod", TOOL, normal={TOOL: NEW}, after={TOOL: Node("f", 0o600, OLD)}
-            ),
-            failed(
-                "upgrade",
-                0,
-                "chmod",
-                TOOL,
-                normal={TOOL: NEW},
-                after={TOOL: Node("f", 0o600, NEW, (1, 1))},
-            ),
-            failed(
-                "upgrade", 0, "chmod", XSS, normal={TOOL: NEW}, after={TOOL: Node("f", 0o600, NEW)}
-            ),
+            but(after={TOOL: Node("f", 384, OLD)}),
+            but(after={TOOL: Node("f", 384, NEW, (1, 1))}),
+            but(hit=XSS),
         ],
     ),
     (
         "scripts are best effort",
         SCRIPTS[0],
-        failed(
-            "upgrade",
-            0,
-            "read",
-            SCRIPTS[0],
+        case(
+            scenario="upgrade",
+            status=0,
+            kind="read",
+            hit=SCRIPTS[0],
             normal={SCRIPTS[0]: NEW},
             after={SCRIPTS[0]: b"$(home)"},
         ),
-        [
-            failed(
-                "upgrade", 0, "read", SCRIPTS[0], normal={SCRIPTS[0]: NEW}, after={SCRIPTS[0]: b""}
-            ),
-            failed(
-                "upgrade", 0, "read", TOOL, normal={SCRIPTS[0]: NEW}, after={SCRIPTS[0]: b"$(home)"}
-            ),
-        ],
+        [but(after={SCRIPTS[0]: b""}), but(hit=TOOL)],
     ),
     (
         "a damaged entry is a shorter file",
         TOOL,
-        failed("upgrade", 0, "read", SPB, entry=TOOL, normal={TOOL: NEW}, after={TOOL: b"ne"}),
-        [
-            failed("upgrade", 0, "read", SPB, entry=TOOL, normal={TOOL: NEW}, after={TOOL: b"xx"}),
-            failed("upgrade", 0, "read", SPB, entry=XSS, normal={TOOL: NEW}, after={TOOL: b"ne"}),
-            failed("upgrade", 0, "write", SPB, entry=TOOL, normal={TOOL: NEW}, after={TOOL: b"ne"}),
-        ],
+        case(
+            scenario="upgrade",
+            status=0,
+            kind="read",
+            hit=SPB,
+            entry=TOOL,
+            normal={TOOL: NEW},
+            after={TOOL: b"ne"},
+        ),
+        [but(after={TOOL: b"xx"}), but(entry=XSS), but(kind="write")],
     ),
     (
         "a scanner control that does not run changes no state",
         CONTROL_STATE,
-        failed(
-            "upgrade",
-            0,
-            "write",
-            TOOL,
+        case(
+            scenario="upgrade",
+            status=0,
+            kind="write",
+            hit=TOOL,
             output=CONTROL_FAILED,
             after={CONTROL_STATE: b"scanners=disabled\n"},
         ),
-        [
-            failed("upgrade", 0, "write", TOOL, after={CONTROL_STATE: b"scanners=disabled\n"}),
-            failed(
-                "upgrade", 0, "write", TOOL, output=CONTROL_FAILED, after={CONTROL_STATE: b"text"}
-            ),
-        ],
+        [but(output=""), but(after={CONTROL_STATE: b"text"})],
     ),
     (
         "the common trace path is the scanner control's",
         CONTROL_STATE,
-        failed(
-            "install",
-            1,
-            "syncfs",
-            HOME,
+        case(
+            scenario="install",
+            status=1,
+            kind="syncfs",
+            hit=HOME,
             output=TRACED,
             normal={CONTROL_STATE: NEW},
             after={CONTROL_STATE: NEW},
         ),
-        [
-            failed(
-                "install", 1, "write", HOME, normal={CONTROL_STATE: NEW}, after={CONTROL_STATE: NEW}
-            ),
-            failed(
-                "install",
-                1,
-                "syncfs",
-                HOME,
-                output=TRACED,
-                normal={CONTROL_STATE: NEW},
-                after={CONTROL_STATE: b""},
-            ),
-            failed(
-                "upgrade",
-                1,
-                "syncfs",
-                HOME,
-                output=TRACED,
-                normal={CONTROL_STATE: NEW},
-                after={CONTROL_STATE: NEW},
-            ),
-        ],
+        [but(kind="write", output=""), but(after={CONTROL_STATE: b""}), but(scenario="upgrade")],
     ),
     (
         "the toolkit's programs leave their own files",
         SCRATCH,
-        failed("install", 1, "write", TOOL, output=CONTROL_FAILED, after={SCRATCH: b""}),
-        [
-            failed("install", 1, "write", TOOL, after={SCRATCH: b""}),
-            failed("install", 1, "write", TOOL, output=CONTROL_FAILED, after={SCRATCH: b"text"}),
-        ],
+        case(
+            scenario="install",
+            status=1,
+            kind="write",
+            hit=TOOL,
+            output=CONTROL_FAILED,
+            after={SCRATCH: b""},
+        ),
+        [but(output=""), but(after={SCRATCH: b"text"})],
     ),
     (
         "a registry that cannot be read or verified counts as none",
         REGISTRY,
-        failed(
-            "register",
-            0,
-            "read",
-            REGISTRY,
+        case(
+            scenario="register",
+            status=0,
+            kind="read",
+            hit=REGISTRY,
             after={REGISTRY: NEW},
             references={"with an empty registry": {REGISTRY: NEW}},
         ),
-        [
-            failed(
-                "register",
-                0,
-                "read",
-                REGISTRY,
-                after={REGISTRY: b""},
-                references={"with an empty registry": {REGISTRY: NEW}},
-            ),
-            failed(
-                "register",
-                0,
-                "write",
-                REGISTRY,
-                after={REGISTRY: NEW},
-                references={"with an empty registry": {REGISTRY: NEW}},
-            ),
-        ],
+        [but(after={REGISTRY: b""}), but(kind="write")],
     ),
     (
         "a scanner control that cannot be looked at counts as broken",
         REGISTRY,
-        failed(
-            "register",
-            0,
-            "stat",
-            CONTROL,
+        case(
+            scenario="register",
+            status=0,
+            kind="stat",
+            hit=CONTROL,
             after={REGISTRY: NEW},
             references={"without a scanner control": {REGISTRY: NEW}},
         ),
-        [
-            failed(
-                "register",
-                0,
-                "stat",
-                CONTROL,
-                after={REGISTRY: OLD},
-                references={"without a scanner control": {REGISTRY: NEW}},
-            ),
-            failed(
-                "register",
-                0,
-                "stat",
-                TOOL,
-                after={REGISTRY: NEW},
-                references={"without a scanner control": {REGISTRY: NEW}},
-            ),
-        ],
+        [but(after={REGISTRY: OLD}), but(hit=TOOL)],
     ),
     (
         "a removal is not rolled back",
         REGISTRY + ".bak",
-        failed(
-            "unregister",
-            1,
-            "write",
-            REGISTRY,
+        case(
+            scenario="unregister",
+            status=1,
+            kind="write",
+            hit=REGISTRY,
             before={REGISTRY: OF_DESK},
             after={REGISTRY: OF_DESK, REGISTRY + ".bak": OF_DESK},
         ),
-        [
-            failed(
-                "unregister",
-                1,
-                "write",
-                REGISTRY,
-                before={REGISTRY: OF_DESK},
-                after={REGISTRY: OF_DESK, REGISTRY + ".bak": b"text"},
-            ),
-            failed(
-                "register",
-                1,
-                "write",
-                REGISTRY,
-                before={REGISTRY: OF_DESK},
-                after={REGISTRY: OF_DESK, REGISTRY + ".bak": OF_DESK},
-            ),
-        ],
+        [but(after={REGISTRY: OF_DESK, REGISTRY + ".bak": b"text"}), but(scenario="register")],
     ),
 ]
 
@@ -690,81 +483,62 @@ OF_KILLED_RUNS = [
     (
         "the installation was registered already",
         SETTINGS,
-        killed("install", 0, between={REGISTRY: NEW}, after={SETTINGS: NEW}, twice={SETTINGS: NEW}),
-        [
-            killed(
-                "install", 0, between={REGISTRY: NEW}, after={SETTINGS: b""}, twice={SETTINGS: NEW}
-            ),
-            killed("install", 0, after={SETTINGS: NEW}, twice={SETTINGS: NEW}),
-        ],
+        case(
+            scenario="install",
+            status=0,
+            between={REGISTRY: NEW},
+            after={SETTINGS: NEW},
+            twice={SETTINGS: NEW},
+        ),
+        [but(after={SETTINGS: b""}), but(between=None)],
     ),
     (
         "what only a fresh installation makes",
         INSTALL_TYPE,
-        killed("install", 0, between={REGISTRY: NEW}, normal={INSTALL_TYPE: NEW}),
-        [
-            killed(
-                "install", 0, between={REGISTRY: NEW, INSTALL_TYPE: NEW}, normal={INSTALL_TYPE: NEW}
-            ),
-            killed("install", 0, normal={INSTALL_TYPE: NEW}),
-        ],
+        case(scenario="install", status=0, between={REGISTRY: NEW}, normal={INSTALL_TYPE: NEW}),
+        [but(between={REGISTRY: NEW, INSTALL_TYPE: NEW}), but(between=None)],
     ),
     (
         "the index was being written",
         INDEX,
-        killed(
-            "upgrade",
-            0,
+        case(
+            scenario="upgrade",
+            status=0,
             before={INDEX: INDEXED},
             between={INDEX: b"# index\n"},
             after={INDEX: b"# index\n/a\n"},
             normal={INDEX: INDEXED},
         ),
-        [
-            killed(
-                "upgrade",
-                0,
-                before={INDEX: INDEXED},
-                between={INDEX: INDEXED},
-                after={INDEX: b"# index\n/a\n"},
-                normal={INDEX: INDEXED},
-            ),
-            killed(
-                "upgrade",
-                0,
-                before={INDEX: INDEXED},
-                between={INDEX: b"# index\n"},
-                after={INDEX: b"# index\n/etc/passwd\n"},
-                normal={INDEX: INDEXED},
-            ),
-        ],
+        [but(between={INDEX: INDEXED}), but(after={INDEX: b"# index\n/etc/passwd\n"})],
     ),
     (
         "the scanner control was deleted already",
         TOOL,
-        killed("remove", 1, between={REGISTRY: OLD, TOOL: OLD}, after={REGISTRY: OLD, TOOL: OLD}),
+        case(
+            scenario="remove",
+            status=1,
+            between={REGISTRY: OLD, TOOL: OLD},
+            after={REGISTRY: OLD, TOOL: OLD},
+        ),
         [
-            killed("remove", 1, between={REGISTRY: OLD, TOOL: OLD}, after={REGISTRY: OLD}),
-            killed(
-                "remove",
-                1,
-                between={REGISTRY: OLD, CONTROL: OLD},
-                after={REGISTRY: OLD, CONTROL: OLD},
-            ),
+            but(after={REGISTRY: OLD}),
+            but(between={REGISTRY: OLD, CONTROL: OLD}, after={REGISTRY: OLD, CONTROL: OLD}),
         ],
     ),
     (
         "the registry was deleted already",
         "/etc/zor",
-        killed("remove", 1, between={"/etc/zor": DIRECTORY}, after={"/etc/zor": DIRECTORY}),
+        case(
+            scenario="remove",
+            status=1,
+            between={"/etc/zor": DIRECTORY},
+            after={"/etc/zor": DIRECTORY},
+        ),
         [
-            killed(
-                "remove",
-                1,
-                between={"/etc/zor": DIRECTORY, TOOL: OLD},
-                after={"/etc/zor": DIRECTORY, TOOL: OLD},
+            but(
+                between={"/etc/zor": DIRECTORY, TOOL: OLD}, after={"/etc/zor": DIRECTORY, TOOL: OLD}
             ),
-            killed("unregister", 1, between={"/etc/zor": DIRECTORY}, after={"/etc/zor": DIRECTORY}),
+            but(scenario="unregister"),
         ],
     ),
 ]
@@ -773,78 +547,80 @@ OF_POWER_CUTS = [
     (
         "an upgrade's deletions have no backup",
         OBSOLETE,
-        cut(UNDECIDED, {OBSOLETE: OLD}, {}, {}),
-        [
-            cut(UNDECIDED, {OBSOLETE: OLD}, {OBSOLETE: OLD}, {}),
-            cut(UNDECIDED, {OBSOLETE: OLD}, {}, {}, scenario="register"),
-        ],
+        case(status=UNDECIDED, before={OBSOLETE: OLD}, live={}, after={}),
+        [but(live={OBSOLETE: OLD}), but(scenario="register")],
     ),
     (
         "the index has no backup",
         INDEX,
-        cut(UNDECIDED, {INDEX: OLD}, {INDEX: b""}, {INDEX: b""}),
-        [cut(UNDECIDED, {INDEX: OLD}, {INDEX: OLD}, {INDEX: b""})],
+        case(status=UNDECIDED, before={INDEX: OLD}, live={INDEX: b""}, after={INDEX: b""}),
+        [but(live={INDEX: OLD})],
     ),
     (
         "settings are replaced without a backup",
         SETTINGS,
-        cut(UNDECIDED, {SETTINGS: OLD}, {SETTINGS: NEW}, {SETTINGS: NEW}),
-        [
-            cut(UNDECIDED, {SETTINGS: OLD}, {SETTINGS: NEW}, {SETTINGS: b""}),
-            cut(UNDECIDED, {SETTINGS: OLD}, {SETTINGS: OLD}, {SETTINGS: NEW}),
-        ],
+        case(status=UNDECIDED, before={SETTINGS: OLD}, live={SETTINGS: NEW}, after={SETTINGS: NEW}),
+        [but(after={SETTINGS: b""}), but(live={SETTINGS: OLD})],
     ),
     (
         'the second pass over "config/xss" takes the backup',
         XSS,
-        cut(UNDECIDED, {XSS: OLD}, {XSS: NEW, XSS + ".bak": NEW}, {XSS + ".bak": b""}),
-        [
-            cut(UNDECIDED, {XSS: OLD}, {XSS: NEW, XSS + ".bak": OLD}, {XSS + ".bak": b""}),
-            cut(UNDECIDED, {XSS: OLD}, {XSS: OLD}, {}),
-        ],
+        case(
+            status=UNDECIDED,
+            before={XSS: OLD},
+            live={XSS: NEW, XSS + ".bak": NEW},
+            after={XSS + ".bak": b""},
+        ),
+        [but(live={XSS: NEW, XSS + ".bak": OLD}), but(live={XSS: OLD}, after={})],
     ),
     (
         "the scanners' state is their own",
         CONTROL_STATE,
-        cut(COMMITTED, {}, {CONTROL_STATE: NEW}, {CONTROL_STATE: b""}),
-        [cut(COMMITTED, {}, {CONTROL_STATE: NEW}, {CONTROL_STATE: b"\0\0\0"})],
+        case(status=COMMITTED, before={}, live={CONTROL_STATE: NEW}, after={CONTROL_STATE: b""}),
+        [but(after={CONTROL_STATE: b"\0\0\0"})],
     ),
 ]
 
 TABLES = (
-    (exemptions.RULES, OF_FAILED_CALLS),
-    (interruptions.RULES, OF_KILLED_RUNS),
-    (power.RULES, OF_POWER_CUTS),
+    (exemptions.RULES, failed, OF_FAILED_CALLS),
+    (interruptions.RULES, killed, OF_KILLED_RUNS),
+    (power.RULES, cut, OF_POWER_CUTS),
 )
 
 EACH_RULE = [
-    pytest.param(next(r for r in rules if r.name == row[0]), *row[1:], id=row[0])
-    for rules, table in TABLES
-    for row in table
+    pytest.param(
+        next(rule for rule in rules if rule.name == name),
+        path,
+        make(**arguments),
+        [make(**{**arguments, **difference}) for difference in differences],
+        id=name,
+    )
+    for rules, make, table in TABLES
+    for name, path, arguments, differences in table
 ]
 
 
-@pytest.mark.parametrize("rules, table", TABLES)
+@pytest.mark.parametrize("rules, table", [(rules, table) for rules, _, table in TABLES])
 def test_there_are_defects_for_every_rule(rules, table):
     assert [rule.name for rule in rules] == [name for name, *_ in table]
-    assert all(defects for *_, defects in table)
+    assert all(differences for *_, differences in table)
 
 
-@pytest.mark.parametrize("rule, path, case, defects", EACH_RULE)
-def test_a_rule_excuses_what_it_is_for(rule, path, case, defects):
-    assert case.status in rule.statuses
-    assert rule.excuses(case, path)
+@pytest.mark.parametrize("rule, path, excused, defects", EACH_RULE)
+def test_a_rule_excuses_what_it_is_for(rule, path, excused, defects):
+    assert excused.status in rule.statuses
+    assert rule.excuses(excused, path)
 
 
-@pytest.mark.parametrize("rule, path, case, defects", EACH_RULE)
-def test_a_rule_excuses_no_defect(rule, path, case, defects):
-    excused = [
+@pytest.mark.parametrize("rule, path, excused, defects", EACH_RULE)
+def test_a_rule_excuses_no_defect(rule, path, excused, defects):
+    missed = [
         defect
         for defect in defects
         if defect.status in rule.statuses and rule.excuses(defect, path)
     ]
 
-    assert not excused
+    assert not missed
 
 
 def test_a_directory_stays_only_for_what_is_excused_in_it():
@@ -873,8 +649,8 @@ def test_a_directory_stays_only_for_what_is_excused_in_it():
     ],
 )
 def test_a_power_cut_is_judged_by_what_is_complete(status, after, lost):
-    case = cut(status, {REGISTRY: OF_SHOP}, {REGISTRY: OF_DESK}, after, {REGISTRY: OF_DESK})
+    run = cut(status, {REGISTRY: OF_SHOP}, {REGISTRY: OF_DESK}, after, {REGISTRY: OF_DESK})
 
-    power.judge(case)
+    power.judge(run)
 
-    assert case.violations == lost
+    assert run.violations == lost
