@@ -3,6 +3,7 @@
 import pytest
 
 from harness.checks import not_printed, printed, printed_lines, same_text
+from harness.installations import NOT_FOUND
 from harness.machine import ANN, SPB
 
 USAGE = """\
@@ -25,19 +26,13 @@ Usage: wzorinst i|r|t <exploiterID> [-o <log file>] [-s <spblock_path>] [-d <tar
 """
 
 # What `r` says on a machine without an installation, once its options are accepted.
-NOTHING_TO_REMOVE = """\
-ZOR version: 22/12/02zor_9.2.30.0000
-Install type: global
-Register exploiter: yes
-Default dest: /opt/corvan/zor
-INI location: /etc/zor/zor.ini
-Looking for INI file: /etc/zor/zor.ini
-INI file not found or outdated (code=1)
-Log file is: /opt/corvan/zor/ZOR_files
-currentZorHome = '/opt/corvan/zor' currentCfgHome = '/opt/corvan/zor'
+NOTHING_TO_REMOVE = (
+    NOT_FOUND
+    + """\
 *** Error: INI file not found: nothing to remove.
 Done.
 """
+)
 
 
 def test_no_argument_prints_the_usage(machine):

@@ -3,6 +3,7 @@
 import pytest
 
 from harness.checks import not_printed, printed, printed_lines, same_text, same_tree
+from harness.installations import FOUND, HOMES, SETTINGS
 from harness.machine import ANN, SPB, STRANGER
 
 NOT_REGISTERED = """\
@@ -132,19 +133,7 @@ def test_an_empty_home_directory_counts_as_none(machine):
 def test_an_intact_installation_is_found_and_verified(machine):
     printed(
         look(machine, WELL_FORMED),
-        """\
-ZOR version: 22/12/02zor_9.2.30.0000
-Install type: global
-Register exploiter: yes
-Default dest: /opt/corvan/zor
-INI location: /etc/zor/zor.ini
-Looking for INI file: /etc/zor/zor.ini
-INI file found, verifying...
-ZOR directory verified ok
-Log file is: /opt/corvan/zor/ZOR_files
-currentZorHome = '/opt/corvan/zor' currentCfgHome = '/opt/corvan/zor'
-"""
-        + NOT_REGISTERED,
+        FOUND + NOT_REGISTERED,
     )
 
 
@@ -323,17 +312,11 @@ def test_a_missing_home_directory_is_no_installation(machine):
 
     printed(
         machine.run("r", "ABC"),
-        """\
-ZOR version: 22/12/02zor_9.2.30.0000
-Install type: global
-Register exploiter: yes
-Default dest: /opt/corvan/zor
-INI location: /etc/zor/zor.ini
-Looking for INI file: /etc/zor/zor.ini
-INI file found, verifying...
-*** Error: cannot create file in INI home dir.
-Log file is: /opt/corvan/zor/ZOR_files
-currentZorHome = '/opt/corvan/zor' currentCfgHome = '/opt/corvan/zor'
+        SETTINGS
+        + "INI file found, verifying...\n"
+        + "*** Error: cannot create file in INI home dir.\n"
+        + HOMES
+        + """\
 *** Error: INI file not found: nothing to remove.
 Done.
 """,

@@ -3,7 +3,7 @@
 import pytest
 
 from harness.checks import not_printed, printed, printed_lines, same_lines, same_text, same_tree
-from harness.installations import SHARED_INDEX, SHARED_TREE, tree_with
+from harness.installations import FRESH_START, SHARED_INDEX, SHARED_TREE, tree_with
 from harness.machine import ANN, SPB
 
 
@@ -390,20 +390,8 @@ def test_debug_mode_traces_the_extraction_and_shows_what_commands_print(machine)
 
     printed(
         outcome,
-        f"""\
-SPB file: /media/toolkit.spb
-ZOR version: 22/12/02zor_9.2.30.0000
-Install type: global
-Register exploiter: yes
-Default dest: /opt/corvan/zor
-INI location: /etc/zor/zor.ini
-Looking for INI file: /etc/zor/zor.ini
-INI file not found or outdated (code=1)
-Log file is: /opt/corvan/zor/ZOR_files
-currentZorHome = '/opt/corvan/zor' currentCfgHome = '/opt/corvan/zor'
-Loading file /opt/corvan/zor/install/zor_install.properties error: 2 (No such file or directory)
-Performing fresh install on /opt/corvan/zor (config=/opt/corvan/zor/config)
-Starting file extraction...
+        FRESH_START
+        + f"""\
 {TRACED}Extracting configs to '/opt/corvan/zor/config'
 {TRACED_LATER}Exec '/usr/sbin/selinuxenabled' returned 32512
 SELinux not enabled or not supported

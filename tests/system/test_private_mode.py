@@ -3,19 +3,12 @@
 import pytest
 
 from harness.checks import not_printed, printed, printed_lines, same_lines, same_text, same_tree
+from harness.installations import HOMES, SETTINGS
 from harness.machine import ANN, SPB
 
 PRIVATE = "/opt/private"
 
-SETTINGS = """\
-Target directory: /opt/private
-ZOR version: 22/12/02zor_9.2.30.0000
-Install type: global
-Register exploiter: yes
-Default dest: /opt/corvan/zor
-INI location: /etc/zor/zor.ini
-Looking for INI file: /etc/zor/zor.ini
-"""
+TO_PRIVATE = "Target directory: /opt/private\n" + SETTINGS
 
 NOT_FOUND = """\
 Log file is: /opt/private/ZOR_files
@@ -82,7 +75,7 @@ def test_a_private_installation_prints_its_progress(machine):
     printed(
         install(machine),
         "SPB file: /media/toolkit.spb\n"
-        + SETTINGS
+        + TO_PRIVATE
         + """\
 INI file not found or outdated (code=1)
 Private mode enabled
@@ -218,14 +211,15 @@ def test_a_private_installation_unregisters_the_exploiter_of_the_shared_one(mach
     printed(
         install(machine),
         "SPB file: /media/toolkit.spb\n"
-        + SETTINGS
+        + TO_PRIVATE
         + """\
 INI file found, verifying...
 ZOR directory verified ok
 Private mode enabled
 Changing Global install to remove
-Log file is: /opt/corvan/zor/ZOR_files
-currentZorHome = '/opt/corvan/zor' currentCfgHome = '/opt/corvan/zor'
+"""
+        + HOMES
+        + """\
 Exploiter list not empty, updating INI file only
 Saving INI file to /etc/zor/zor.ini
 Uninstallation successful, removing temporary files
@@ -433,7 +427,7 @@ def test_a_private_removal_prints_its_progress(machine):
     head, _, deleted = outcome.stdout.partition(PRIVATE_STOPPED)
     same_text(
         head,
-        SETTINGS
+        TO_PRIVATE
         + """\
 INI file not found or outdated (code=1)
 Private mode enabled
@@ -494,7 +488,7 @@ def test_a_private_removal_of_nothing_succeeds(machine):
 
     printed(
         outcome,
-        SETTINGS
+        TO_PRIVATE
         + """\
 INI file not found or outdated (code=1)
 Private mode enabled

@@ -3,29 +3,10 @@
 import pytest
 
 from harness.checks import not_printed, printed, printed_lines, same_lines, same_text, same_tree
+from harness.installations import FOUND, STOPPED
 from harness.machine import ANN, SPB
 
 HOME = "/opt/corvan/zor"
-
-FOUND = """\
-ZOR version: 22/12/02zor_9.2.30.0000
-Install type: global
-Register exploiter: yes
-Default dest: /opt/corvan/zor
-INI location: /etc/zor/zor.ini
-Looking for INI file: /etc/zor/zor.ini
-INI file found, verifying...
-ZOR directory verified ok
-Log file is: /opt/corvan/zor/ZOR_files
-currentZorHome = '/opt/corvan/zor' currentCfgHome = '/opt/corvan/zor'
-"""
-
-STOPPED = """\
-Exec '/opt/corvan/zor/bin/trawlfs -shutdown >/dev/null 2>&1' returned 0
-Exec '/opt/corvan/zor/bin/trawlcfg -disable all >/dev/null 2>&1' returned 0
-Exec '/opt/corvan/zor/bin/trawlcfg -shutdown all -timeout 60 -force >/dev/null 2>&1' returned 0
-Exec '/opt/corvan/zor/bin/trawlcfg -shutdown all -timeout 120 >/dev/null 2>&1' returned 0
-"""
 
 LISTED_FILES = """\
 RM FILE: /opt/corvan/zor/bin/libzor.so
@@ -623,7 +604,7 @@ def test_an_added_file_is_deleted_with_the_toolkit(machine, prepare, path):
     same_text(machine.listing("/etc", "/opt", "/usr/kel"), LEFT)
 
 
-@pytest.mark.parametrize(
+KEPT_UNLESS_EMPTY = pytest.mark.parametrize(
     "path",
     [
         "bin/mine",
@@ -635,6 +616,9 @@ def test_an_added_file_is_deleted_with_the_toolkit(machine, prepare, path):
         "install/QMX_CLI/linux-ix86/msg_cat/C/mine",
     ],
 )
+
+
+@KEPT_UNLESS_EMPTY
 def test_an_added_file_stays_where_only_empty_directories_are_removed(machine, path):
     install(machine)
     machine.plant(f"{HOME}/{path}", "mine")
@@ -646,18 +630,7 @@ def test_an_added_file_stays_where_only_empty_directories_are_removed(machine, p
     assert not machine.exists("/etc/zor")
 
 
-@pytest.mark.parametrize(
-    "path",
-    [
-        "bin/mine",
-        "bin/plugins/mine",
-        "bin/customscanners/mine",
-        "mine",
-        "install/QMX_CLI/linux-ix86/bin/mine",
-        "install/QMX_CLI/linux-ix86/lib/mine",
-        "install/QMX_CLI/linux-ix86/msg_cat/C/mine",
-    ],
-)
+@KEPT_UNLESS_EMPTY
 def test_by_known_places_an_added_file_is_deleted_there_too(machine, path):
     install(machine)
     without_index(machine)
@@ -708,28 +681,8 @@ def test_files_next_to_a_directory_that_stays_are_deleted(machine, prepare):
     assert machine.listing(HOME + "/logs").count("\n") == 3
 
 
-@ORDERS
-def test_empty_directories_of_the_layout_are_removed(machine, prepare):
-    install(machine)
-    prepare(machine)
-    for path in (
-        "_uninst",
-        "install/QMX_CLI/linux-ix86/bin",
-        "install/QMX_CLI/linux-ix86/lib",
-        "install/QMX_CLI/linux-ix86/msg_cat/C",
-        "bin/etc/trawlvpd",
-        "bin/plugins",
-        "bin/customscanners",
-        "logs",
-    ):
-        machine.make_directory(f"{HOME}/{path}")
-
-    remove(machine)
-
-    same_text(machine.listing("/opt"), "d 0755 /opt\nd 0755 /opt/corvan\n")
-
-
-def test_the_directories_are_removed_in_a_fixed_order_by_the_index(machine):
+def install_with_every_directory(machine):
+    """Installs the toolkit, with every directory that a removal knows."""
     install(machine)
     for path in (
         "_uninst",
@@ -747,6 +700,20 @@ def test_the_directories_are_removed_in_a_fixed_order_by_the_index(machine):
         "logs",
     ):
         machine.make_directory(f"{HOME}/{path}")
+
+
+@ORDERS
+def test_empty_directories_of_the_layout_are_removed(machine, prepare):
+    install_with_every_directory(machine)
+    prepare(machine)
+
+    remove(machine)
+
+    same_text(machine.listing("/opt"), "d 0755 /opt\nd 0755 /opt/corvan\n")
+
+
+def test_the_directories_are_removed_in_a_fixed_order_by_the_index(machine):
+    install_with_every_directory(machine)
 
     # Those removed only if empty are removed without a message.
     printed_lines(
@@ -774,24 +741,8 @@ def test_the_directories_are_removed_in_a_fixed_order_by_the_index(machine):
 
 
 def test_the_directories_are_removed_in_a_fixed_order_by_known_places(machine):
-    install(machine)
+    install_with_every_directory(machine)
     without_index(machine)
-    for path in (
-        "_uninst",
-        "install/QMX_CLI/linux-ix86/bin",
-        "install/QMX_CLI/linux-ix86/lib",
-        "install/QMX_CLI/linux-ix86/msg_cat/C",
-        "bin/etc/trawlhw",
-        "bin/etc/trawluse",
-        "bin/etc/trawlnet",
-        "bin/etc/trawlfs",
-        "bin/etc/trawlsw",
-        "bin/etc/trawlvpd",
-        "bin/plugins",
-        "bin/customscanners",
-        "logs",
-    ):
-        machine.make_directory(f"{HOME}/{path}")
 
     outcome = remove(machine)
 

@@ -3,11 +3,17 @@
 import pytest
 
 from harness.checks import not_printed, printed, printed_lines, same_text, same_tree
+from harness.installations import DEPLOYMENT, HOMES, PACKAGE, SETTINGS
 from harness.machine import ANN, SPB
 from harness.rollback import FILE_INDEX, PROPERTIES_DIRECTORY, XSS_FILES, rolled_back
 
 HOME = "/opt/corvan/zor"
 CONTROL = HOME + "/bin/trawlcfg"
+
+CONTROL_IS_MISSING = """\
+INI file found, verifying...
+*** Error: cannot find /opt/corvan/zor/bin/trawlcfg in INI home dir.
+"""
 
 
 def break_installation(machine, version="9.2.30.0000", date="22/12/02"):
@@ -29,19 +35,12 @@ def test_a_repair_prints_its_progress(machine):
 
     printed(
         repair(machine),
-        """\
-SPB file: /media/toolkit.spb
-ZOR version: 22/12/02zor_9.2.30.0000
-Install type: global
-Register exploiter: yes
-Default dest: /opt/corvan/zor
-INI location: /etc/zor/zor.ini
-Looking for INI file: /etc/zor/zor.ini
-INI file found, verifying...
-*** Error: cannot find /opt/corvan/zor/bin/trawlcfg in INI home dir.
-ZOR broken in existing location, forcing update.
-Log file is: /opt/corvan/zor/ZOR_files
-currentZorHome = '/opt/corvan/zor' currentCfgHome = '/opt/corvan/zor'
+        PACKAGE
+        + SETTINGS
+        + CONTROL_IS_MISSING
+        + "ZOR broken in existing location, forcing update.\n"
+        + HOMES
+        + """\
 Installed ZOR is older (or the same version), performing upgrade (deploying files)
 Exec '/usr/sbin/selinuxenabled >/dev/null 2>&1' returned 32512
 SELinux not enabled or not supported
@@ -52,18 +51,9 @@ Exec '/opt/corvan/zor/bin/trawlcfg -shutdown all -timeout 120 >/dev/null 2>&1' r
 DEL: /opt/corvan/zor/properties/scan.properties
 RMDIR: /opt/corvan/zor/properties
 Starting file extraction...
-Extracting configs to '/opt/corvan/zor/config'
-Exec '/usr/sbin/selinuxenabled >/dev/null 2>&1' returned 32512
-SELinux not enabled or not supported
-Customizing properties file: /opt/corvan/zor/config/Zor.properties
-Looking for Trace Dir
-Customizing property file: /opt/corvan/zor/config/ZorTrace.properties
-File saved successfully
-Updating file with variables /opt/corvan/zor/install/trawlcfg.sh
-Updating: /opt/corvan/zor/install/trawlcfg.sh
-Updating file with variables /opt/corvan/zor/install/rmdirs.sh
-Updating: /opt/corvan/zor/install/rmdirs.sh
-Created Corvan Common Dir='/usr/kel/corvan/common' result=0
+"""
+        + DEPLOYMENT
+        + """\
 Saving INI file to /etc/zor/zor.ini
 Exec '/opt/corvan/zor/bin/trawlcfg -enable all >/dev/null 2>&1' returned 0
 Installation successful, committing changes
@@ -199,17 +189,10 @@ def test_a_broken_installation_is_not_removed(machine):
 
     printed(
         outcome,
-        """\
-ZOR version: 22/12/02zor_9.2.30.0000
-Install type: global
-Register exploiter: yes
-Default dest: /opt/corvan/zor
-INI location: /etc/zor/zor.ini
-Looking for INI file: /etc/zor/zor.ini
-INI file found, verifying...
-*** Error: cannot find /opt/corvan/zor/bin/trawlcfg in INI home dir.
-Log file is: /opt/corvan/zor/ZOR_files
-currentZorHome = '/opt/corvan/zor' currentCfgHome = '/opt/corvan/zor'
+        SETTINGS
+        + CONTROL_IS_MISSING
+        + HOMES
+        + """\
 *** Error: INI file not found: nothing to remove.
 Done.
 """,

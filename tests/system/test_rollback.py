@@ -3,7 +3,7 @@
 import pytest
 
 from harness.checks import not_printed, printed, printed_lines, same_lines, same_text, same_tree
-from harness.installations import SHARED_TREE, tree_with
+from harness.installations import FRESH_START, NO_SELINUX, SHARED_TREE, tree_with
 from harness.machine import ANN, SPB
 from harness.rollback import (
     COMMON_SETTING,
@@ -15,33 +15,12 @@ from harness.rollback import (
     rolled_back,
 )
 
-PREFIX = """\
-SPB file: /media/toolkit.spb
-ZOR version: 22/12/02zor_9.2.30.0000
-Install type: global
-Register exploiter: yes
-Default dest: /opt/corvan/zor
-INI location: /etc/zor/zor.ini
-Looking for INI file: /etc/zor/zor.ini
-INI file not found or outdated (code=1)
-Log file is: /opt/corvan/zor/ZOR_files
-currentZorHome = '/opt/corvan/zor' currentCfgHome = '/opt/corvan/zor'
-Loading file /opt/corvan/zor/install/zor_install.properties error: 2 (No such file or directory)
-Performing fresh install on /opt/corvan/zor (config=/opt/corvan/zor/config)
-Starting file extraction...
-"""
-
-NO_SELINUX = """\
-Exec '/usr/sbin/selinuxenabled >/dev/null 2>&1' returned 32512
-SELinux not enabled or not supported
-"""
-
 FAILED = """\
 Installation failed, rolling back
 Done.
 """
 
-UP_TO_LABELS = PREFIX + "Extracting configs to '/opt/corvan/zor/config'\n" + NO_SELINUX
+UP_TO_LABELS = FRESH_START + "Extracting configs to '/opt/corvan/zor/config'\n" + NO_SELINUX
 
 
 def fail(machine, *options, **how):
@@ -71,7 +50,7 @@ def test_a_missing_package_changes_nothing(machine):
 
     printed(
         outcome,
-        PREFIX.replace("/media/toolkit.spb", "/no/such.spb")
+        FRESH_START.replace("/media/toolkit.spb", "/no/such.spb")
         + "*** Error: package not found or not valid.\n"
         + NO_SELINUX
         + FAILED,
@@ -108,7 +87,7 @@ def test_an_empty_file_of_the_package_cannot_be_extracted(machine, empty, messag
 
     printed(
         outcome,
-        PREFIX
+        FRESH_START
         + message
         + "File extraction failed, error = 1 (Cannot open file for reading)\n"
         + NO_SELINUX
@@ -664,7 +643,7 @@ def test_the_single_user_flag_keeps_the_configuration_directory_of_a_failed_extr
 
     printed(
         outcome,
-        PREFIX + "Extracting configs to '/opt/corvan/zor/config'\n"
+        FRESH_START + "Extracting configs to '/opt/corvan/zor/config'\n"
         "File extraction failed, error = 1 (Cannot open file for reading)\n"
         + NO_SELINUX
         + "Creating single user mode flag file: /opt/corvan/zor/config/SingleUserMode\n"
@@ -684,7 +663,7 @@ def test_without_a_configuration_directory_the_single_user_flag_cannot_be_made(m
 
     printed(
         outcome,
-        PREFIX
+        FRESH_START
         + "*** Error: package not found or not valid.\n"
         + NO_SELINUX
         + "Creating single user mode flag file: /opt/corvan/zor/config/SingleUserMode\n"

@@ -3,26 +3,12 @@
 import pytest
 
 from harness.checks import not_printed, printed, printed_lines, same_lines, same_text, same_tree
-from harness.installations import SHARED_TREE, tree_with
+from harness.installations import DEPLOYMENT, FOUND, PACKAGE, SHARED_TREE, UPGRADE_START, tree_with
 from harness.machine import ANN, SPB
 
 HOME = "/opt/corvan/zor"
 MAIN = HOME + "/config/Zor.properties"
 TRACE = HOME + "/config/ZorTrace.properties"
-
-FOUND = """\
-SPB file: /media/toolkit.spb
-ZOR version: 22/12/02zor_9.2.30.0000
-Install type: global
-Register exploiter: yes
-Default dest: /opt/corvan/zor
-INI location: /etc/zor/zor.ini
-Looking for INI file: /etc/zor/zor.ini
-INI file found, verifying...
-ZOR directory verified ok
-Log file is: /opt/corvan/zor/ZOR_files
-currentZorHome = '/opt/corvan/zor' currentCfgHome = '/opt/corvan/zor'
-"""
 
 DEFAULTS = """\
 vpdscanner.default_config_file=config.xml
@@ -65,30 +51,9 @@ def test_an_upgrade_prints_its_progress(machine):
 
     printed(
         upgrade(machine),
-        FOUND
+        UPGRADE_START
+        + DEPLOYMENT
         + """\
-Installed ZOR is older (or the same version), performing upgrade (deploying files)
-Exec '/usr/sbin/selinuxenabled >/dev/null 2>&1' returned 32512
-SELinux not enabled or not supported
-Exec '/opt/corvan/zor/bin/trawlfs -shutdown >/dev/null 2>&1' returned 0
-Exec '/opt/corvan/zor/bin/trawlcfg -disable all >/dev/null 2>&1' returned 0
-Exec '/opt/corvan/zor/bin/trawlcfg -shutdown all -timeout 60 -force >/dev/null 2>&1' returned 0
-Exec '/opt/corvan/zor/bin/trawlcfg -shutdown all -timeout 120 >/dev/null 2>&1' returned 0
-DEL: /opt/corvan/zor/properties/scan.properties
-RMDIR: /opt/corvan/zor/properties
-Starting file extraction...
-Extracting configs to '/opt/corvan/zor/config'
-Exec '/usr/sbin/selinuxenabled >/dev/null 2>&1' returned 32512
-SELinux not enabled or not supported
-Customizing properties file: /opt/corvan/zor/config/Zor.properties
-Looking for Trace Dir
-Customizing property file: /opt/corvan/zor/config/ZorTrace.properties
-File saved successfully
-Updating file with variables /opt/corvan/zor/install/trawlcfg.sh
-Updating: /opt/corvan/zor/install/trawlcfg.sh
-Updating file with variables /opt/corvan/zor/install/rmdirs.sh
-Updating: /opt/corvan/zor/install/rmdirs.sh
-Created Corvan Common Dir='/usr/kel/corvan/common' result=0
 Adding exploiter ABC to INI file
 Updating BuildDate informations to: 22/12/02
 Saving INI file to /etc/zor/zor.ini
@@ -398,7 +363,8 @@ def test_an_installation_newer_than_the_package_keeps_all_its_files(machine):
 
     printed(
         outcome,
-        FOUND
+        PACKAGE
+        + FOUND
         + """\
 Installed ZOR is not older than this version, updating exploiters only
 Created Corvan Common Dir='/usr/kel/corvan/common' result=0
@@ -432,7 +398,8 @@ def test_a_registered_exploiter_changes_nothing_on_a_newer_installation(machine)
 
     printed(
         outcome,
-        FOUND
+        PACKAGE
+        + FOUND
         + """\
 Installed ZOR is not older than this version, updating exploiters only
 Created Corvan Common Dir='/usr/kel/corvan/common' result=0

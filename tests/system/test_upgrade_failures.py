@@ -3,6 +3,7 @@
 import pytest
 
 from harness.checks import not_printed, printed, printed_lines, same_lines, same_text, same_tree
+from harness.installations import NO_SELINUX, UPGRADE_START
 from harness.machine import ANN, SPB
 from harness.rollback import (
     FILE_INDEX,
@@ -20,38 +21,15 @@ HOME = "/opt/corvan/zor"
 MAIN = HOME + "/config/Zor.properties"
 TRACE = HOME + "/config/ZorTrace.properties"
 
-UP_TO_EXTRACTION = """\
-SPB file: /media/toolkit.spb
-ZOR version: 22/12/02zor_9.2.30.0000
-Install type: global
-Register exploiter: yes
-Default dest: /opt/corvan/zor
-INI location: /etc/zor/zor.ini
-Looking for INI file: /etc/zor/zor.ini
-INI file found, verifying...
-ZOR directory verified ok
-Log file is: /opt/corvan/zor/ZOR_files
-currentZorHome = '/opt/corvan/zor' currentCfgHome = '/opt/corvan/zor'
-Installed ZOR is older (or the same version), performing upgrade (deploying files)
-Exec '/usr/sbin/selinuxenabled >/dev/null 2>&1' returned 32512
-SELinux not enabled or not supported
-Exec '/opt/corvan/zor/bin/trawlfs -shutdown >/dev/null 2>&1' returned 0
-Exec '/opt/corvan/zor/bin/trawlcfg -disable all >/dev/null 2>&1' returned 0
-Exec '/opt/corvan/zor/bin/trawlcfg -shutdown all -timeout 60 -force >/dev/null 2>&1' returned 0
-Exec '/opt/corvan/zor/bin/trawlcfg -shutdown all -timeout 120 >/dev/null 2>&1' returned 0
-DEL: /opt/corvan/zor/properties/scan.properties
-RMDIR: /opt/corvan/zor/properties
-Starting file extraction...
-"""
+UP_TO_EXTRACTION = UPGRADE_START
 
 UP_TO_PROPERTIES = (
     UP_TO_EXTRACTION
     + """\
 Extracting configs to '/opt/corvan/zor/config'
-Exec '/usr/sbin/selinuxenabled >/dev/null 2>&1' returned 32512
-SELinux not enabled or not supported
-Customizing properties file: /opt/corvan/zor/config/Zor.properties
 """
+    + NO_SELINUX
+    + "Customizing properties file: /opt/corvan/zor/config/Zor.properties\n"
 )
 
 RESTARTED_AND_FAILED = """\

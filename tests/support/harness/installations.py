@@ -1,25 +1,85 @@
 """What `wzorinst i ABC -s /media/toolkit.spb` prints and leaves on an empty machine.
 
 The names with SHARED are for root's installation, those with ANNS for the one of the user ann.
+Pieces of transcripts are those of root's runs on the shared installation, in any test.
 """
 
-SHARED_TRANSCRIPT = """\
-SPB file: /media/toolkit.spb
+PACKAGE = "SPB file: /media/toolkit.spb\n"
+
+SETTINGS = """\
 ZOR version: 22/12/02zor_9.2.30.0000
 Install type: global
 Register exploiter: yes
 Default dest: /opt/corvan/zor
 INI location: /etc/zor/zor.ini
 Looking for INI file: /etc/zor/zor.ini
-INI file not found or outdated (code=1)
+"""
+
+HOMES = """\
 Log file is: /opt/corvan/zor/ZOR_files
 currentZorHome = '/opt/corvan/zor' currentCfgHome = '/opt/corvan/zor'
+"""
+
+FOUND = SETTINGS + "INI file found, verifying...\nZOR directory verified ok\n" + HOMES
+
+NOT_FOUND = SETTINGS + "INI file not found or outdated (code=1)\n" + HOMES
+
+FRESH_START = (
+    PACKAGE
+    + NOT_FOUND
+    + """\
 Loading file /opt/corvan/zor/install/zor_install.properties error: 2 (No such file or directory)
 Performing fresh install on /opt/corvan/zor (config=/opt/corvan/zor/config)
 Starting file extraction...
-Extracting configs to '/opt/corvan/zor/config'
+"""
+)
+
+NO_SELINUX = """\
 Exec '/usr/sbin/selinuxenabled >/dev/null 2>&1' returned 32512
 SELinux not enabled or not supported
+"""
+
+STOPPED = """\
+Exec '/opt/corvan/zor/bin/trawlfs -shutdown >/dev/null 2>&1' returned 0
+Exec '/opt/corvan/zor/bin/trawlcfg -disable all >/dev/null 2>&1' returned 0
+Exec '/opt/corvan/zor/bin/trawlcfg -shutdown all -timeout 60 -force >/dev/null 2>&1' returned 0
+Exec '/opt/corvan/zor/bin/trawlcfg -shutdown all -timeout 120 >/dev/null 2>&1' returned 0
+"""
+
+UPGRADE_START = (
+    PACKAGE
+    + FOUND
+    + "Installed ZOR is older (or the same version), performing upgrade (deploying files)\n"
+    + NO_SELINUX
+    + STOPPED
+    + """\
+DEL: /opt/corvan/zor/properties/scan.properties
+RMDIR: /opt/corvan/zor/properties
+Starting file extraction...
+"""
+)
+
+DEPLOYMENT = (
+    "Extracting configs to '/opt/corvan/zor/config'\n"
+    + NO_SELINUX
+    + """\
+Customizing properties file: /opt/corvan/zor/config/Zor.properties
+Looking for Trace Dir
+Customizing property file: /opt/corvan/zor/config/ZorTrace.properties
+File saved successfully
+Updating file with variables /opt/corvan/zor/install/trawlcfg.sh
+Updating: /opt/corvan/zor/install/trawlcfg.sh
+Updating file with variables /opt/corvan/zor/install/rmdirs.sh
+Updating: /opt/corvan/zor/install/rmdirs.sh
+Created Corvan Common Dir='/usr/kel/corvan/common' result=0
+"""
+)
+
+SHARED_TRANSCRIPT = (
+    FRESH_START
+    + "Extracting configs to '/opt/corvan/zor/config'\n"
+    + NO_SELINUX
+    + """\
 Customizing property file: /opt/corvan/zor/config/Zor.properties
 Customizing property file: /opt/corvan/zor/config/ZorTrace.properties
 Updating file with variables /opt/corvan/zor/install/trawlcfg.sh
@@ -36,6 +96,7 @@ Setting common trace path='/usr/kel/corvan/common/ZOR/logs' result=0
 Installation successful, committing changes
 Done.
 """
+)
 
 SHARED_TREE = """\
 d 0755 /etc
