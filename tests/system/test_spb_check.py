@@ -518,7 +518,7 @@ def test_damage_is_reported_with_exit_status_2(spb, case):
 
 
 @pytest.mark.parametrize("case", NOTHING)
-def test_a_package_with_nothing_to_tell_gives_exit_status_0(spb, case):
+def test_a_package_without_findings_gives_exit_status_0(spb, case):
     spb.write_bytes(NOTHING[case])
 
     assert spb_tool.check(spb) == (0, [])
@@ -569,7 +569,7 @@ def test_check_and_installer_agree_on_a_damaged_package(empty_machine, seed):
         assert fails == (outcome.status != 0), (status, findings, outcome.stdout)
 
 
-def test_the_packed_example_toolkit_has_nothing_to_tell_and_installs(empty_machine, tmp_path):
+def test_the_packed_example_toolkit_has_no_findings_and_installs(empty_machine, tmp_path):
     subprocess.run([spb_tool.SCRIPTS / "build_toolkit.sh", tmp_path / "toolkit"], check=True)
     content = tmp_path / "toolkit.spb"
     assert spb_tool.run("pack", tmp_path / "toolkit", "-o", content).returncode == 0

@@ -76,7 +76,7 @@ def test_slashes_in_a_row_become_one_where_an_entry_lands(spb):
     assert line == f"0755           4  bin/a/b   {IMAGE_ROOT}bin///a//b"
 
 
-def test_entries_stand_in_the_order_of_the_central_directory(spb):
+def test_entries_are_in_the_order_of_the_central_directory(spb):
     archive = small()
     local, offsets = archive.local_part()
     central = b"".join(
@@ -130,7 +130,7 @@ def test_a_file_that_does_not_exist_is_an_error(spb):
     assert done.stderr == f"spb: {spb}: No such file or directory\n"
 
 
-def test_a_reader_that_has_seen_enough_ends_the_list_in_silence(spb):
+def test_a_reader_that_stops_ends_the_list_silently(spb):
     spb.write_bytes(spb_tool.archive({f"bin/{n}": b"1" for n in range(5000)}).content())
 
     done = subprocess.run(

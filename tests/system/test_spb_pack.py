@@ -80,7 +80,7 @@ def refusal(tree, spb, *options):
     return run.stderr
 
 
-def test_every_directory_comes_before_what_lies_in_it(tree, spb):
+def test_every_directory_comes_before_its_content(tree, spb):
     assert pack(tree, spb).returncode == 0
 
     assert zipfile.ZipFile(spb).namelist() == [
@@ -363,7 +363,7 @@ def test_a_tree_that_does_not_exist_is_an_error(tmp_path, spb):
     assert refusal(tmp_path / "tree", spb) == f"spb: {tmp_path}/tree: No such file or directory\n"
 
 
-def test_a_package_that_would_lie_in_what_is_packed_is_refused(tree):
+def test_a_package_inside_the_packed_tree_is_refused(tree):
     output = tree / "bin" / "toolkit.spb"
 
     assert refusal(tree, output) == f"spb: {output}: is inside a directory that is packed\n"
@@ -394,7 +394,7 @@ def test_a_large_tree_shows_its_progress_on_a_terminal(tree, spb):
     assert shown.endswith(b" %\x1b[K\r\x1b[K")
 
 
-def test_a_small_tree_is_packed_in_silence_on_a_terminal(tree, spb):
+def test_a_small_tree_is_packed_silently_on_a_terminal(tree, spb):
     assert spb_tool.shown_on_a_terminal("pack", tree, "-o", spb, *ACCEPTED) == b""
 
 

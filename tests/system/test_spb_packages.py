@@ -420,7 +420,7 @@ def test_a_file_that_is_no_package_is_trouble(tmp_path, spb, command):
     assert not (tmp_path / "target").exists()
 
 
-def test_a_fifo_is_not_waited_for(tmp_path):
+def test_a_fifo_does_not_block(tmp_path):
     os.mkfifo(tmp_path / "fifo")
 
     done = spb_tool.run("check", tmp_path / "fifo", timeout=60)

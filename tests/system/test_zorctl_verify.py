@@ -121,7 +121,7 @@ def test_a_changed_script_is_a_difference(installed):
     check(installed, "..5......    /opt/corvan/zor/install/trawlcfg.sh\n")
 
 
-def test_foreign_files_are_no_difference_unless_asked_for(installed):
+def test_foreign_files_are_not_a_difference_unless_asked_for(installed):
     installed.plant(HOME + "/bin/deep/mine", b"mine")
     installed.plant(HOME + "/mine", b"mine")
 
@@ -141,7 +141,7 @@ def test_a_file_that_became_a_link_is_a_difference(installed):
     check(installed, ".M.......    /opt/corvan/zor/bin/trawlhw\n")
 
 
-def test_a_fifo_is_not_waited_for(installed):
+def test_a_fifo_does_not_block(installed):
     installed.remove(HOME + "/bin/trawlhw")
     os.mkfifo(installed.at(HOME + "/bin/trawlhw"), 0o755)
     try:

@@ -1,12 +1,14 @@
 #include "durability.h"
 #include "installer_fixtures.h"
 #include "process_limits.h"
+#include "scoped.h"
 #include "transaction.h"
 
 #include <gtest/gtest.h>
 
 #include <cerrno>
 
+#include <fcntl.h>
 #include <sys/syscall.h>
 
 namespace {
@@ -18,6 +20,16 @@ TEST_F(DurabilityTest, FileSystemsOfMissingDirectoriesAreThoseOfTheirParents)
     const FileSystemSync fileSystems({dir / "not/yet/there", dir.path(), "/"});
 
     EXPECT_EQ(0, fileSystems.sync());
+}
+
+TEST_F(DurabilityTest, EachFileSystemIsHeldByOneDescriptor)
+{
+    makeDirectories(dir / "a");
+    const ScopedFd free(open("/dev/null", O_RDONLY));
+    const FileSystemSync fileSystems({dir.path(), dir / "a", dir / "missing"});
+    const ScopedFd next(open("/dev/null", O_RDONLY));
+
+    EXPECT_EQ(free.get() + 2, next.get());
 }
 
 TEST_F(DurabilityTest, AFileSystemThatCannotWriteIsCode5)

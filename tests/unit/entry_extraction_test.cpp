@@ -16,6 +16,12 @@
 
 namespace {
 
+#ifdef SYS_fcntl64
+constexpr long FcntlCall = SYS_fcntl64;
+#else
+constexpr long FcntlCall = SYS_fcntl;
+#endif
+
 class ExtractFileTest : public InstallerTest {
 protected:
     /// Extracts the one entry of an archive that holds `item`.
@@ -92,6 +98,54 @@ TEST_F(ExtractFileTest, AnArchiveThatAnEntryReplacesIsReadAgain)
     EXPECT_EQ(1, extract(0, dir / "e"));
 
     EXPECT_EQ("", readFile(dir / "c")) << "what replaced the archive is too short for it";
+}
+
+TEST_F(ExtractFileTest, AnArchiveThatAnEntryOverwritesInPlaceIsReadAgain)
+{
+    transaction.backup = false;
+    const std::string path = dir / "package.spb";
+    writeFile(path, zipBytes({{deflatedItem("a", textBytes(500, 1)), storedItem("b", "new"),
+                               deflatedItem("c", textBytes(500, 2))}}));
+    const ZipFile archive(path.c_str());
+    OpenPackage package(archive);
+
+    EXPECT_EQ(0, extractOpenFile(transaction, package, &archive.entries().at(0), dir / "a", 0644));
+    EXPECT_EQ(0, extractOpenFile(transaction, package, &archive.entries().at(1), path, 0644));
+    EXPECT_EQ(0, extractOpenFile(transaction, package, &archive.entries().at(2), dir / "c", 0644));
+
+    EXPECT_EQ(textBytes(500, 1), readFile(dir / "a"));
+    EXPECT_EQ("", readFile(dir / "c")) << "what overwrote the archive is too short for it";
+}
+
+TEST_F(ExtractFileTest, AnArchiveThatIsGoneWhenAFileIsOverwrittenIsCode1)
+{
+    transaction.backup = false;
+    const std::string path = dir / "package.spb";
+    writeFile(path, zipBytes({{storedItem("a", "first"), storedItem("b", "second")}}));
+    writeFile(dir / "a", "old");
+    const ZipFile archive(path.c_str());
+    OpenPackage package(archive);
+    ASSERT_NE(nullptr, package.open(&archive.entries().at(0)));
+    ASSERT_EQ(0, unlink(path.c_str()));
+
+    EXPECT_EQ(0, extractOpenFile(transaction, package, &archive.entries().at(0), dir / "a", 0644));
+    EXPECT_EQ(1, extractOpenFile(transaction, package, &archive.entries().at(1), dir / "b", 0644));
+
+    EXPECT_EQ("first", readFile(dir / "a"));
+}
+
+TEST_F(ExtractFileTest, ADamagedEntryWithoutADescriptorForItsStreamIsCode1)
+{
+    EXPECT_TRUE(passesInChild([&] {
+        const std::string path = dir / "package.spb";
+        ZipItem damaged = deflatedItem("a", textBytes(500, 1));
+        damaged.data[0] = '\xFF';
+        writeFile(path, zipBytes({{damaged}}));
+        const ZipFile archive(path.c_str());
+        failSystemCall(FcntlCall, EMFILE);
+
+        EXPECT_EQ(1, extractFile(transaction, archive, &archive.entries().at(0), dir / "a", 0));
+    }));
 }
 
 TEST_F(ExtractFileTest, SetsExactlyTheModeWhateverTheUmask)

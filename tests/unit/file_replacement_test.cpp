@@ -134,6 +134,17 @@ TEST_F(FileReplacementTest, AFileThatSomethingIsMountedOnIsWrittenInPlace)
     EXPECT_EQ((std::vector<std::string>{"f 0644 file", "f 0644 mounted"}), treeOf(dir.path()));
 }
 
+TEST_F(FileReplacementTest, AFileThatIsWrittenInPlaceCanBecomeEmpty)
+{
+    writeFile(dir / "file", "below");
+    writeFile(dir / "mounted", "old");
+    const FileInPlace mount(dir / "mounted", dir / "file");
+
+    EXPECT_EQ(0, replace(dir / "file", ""));
+
+    EXPECT_EQ("", readFile(dir / "mounted"));
+}
+
 TEST_F(FileReplacementTest, AFileInADirectoryWithoutRightsIsWrittenInPlace)
 {
     makeDirectories(dir / "closed");

@@ -35,13 +35,10 @@ Lines sortedLines(const std::string& text)
     return lines;
 }
 
-/// A log that calls a function when a given line was printed.
+/// A log that calls a function for every line, as soon as it is printed.
 class WatchedLog : public std::streambuf {
 public:
-    WatchedLog(std::string line, std::function<void()> act)
-        : awaited_(std::move(line)), act_(std::move(act))
-    {
-    }
+    explicit WatchedLog(std::function<void(const std::string&)> act) : act_(std::move(act)) {}
 
 protected:
     int_type overflow(int_type character) override
@@ -50,15 +47,13 @@ protected:
             line_ += static_cast<char>(character);
             return character;
         }
-        if (line_ == awaited_)
-            act_();
+        act_(line_);
         line_.clear();
         return character;
     }
 
 private:
-    std::string awaited_;
-    std::function<void()> act_;
+    std::function<void(const std::string&)> act_;
     std::string line_;
 };
 
@@ -256,21 +251,33 @@ TEST_F(RemoveTreeTest, ASubdirectoryThatIsNotEmptyStaysWithoutAMessage)
 TEST_F(RemoveTreeTest, ADirectoryThatIsMovedAwayMeanwhileStays)
 {
     makeDirectories(dir / "away");
-    WatchedLog watched("DEL: " + dir / "tree/sub/deep/file",
-                       [&] { fs::rename(dir / "tree/sub/deep", dir / "away/deep"); });
+    makeDirectories(dir / "moving/one");
+    makeDirectories(dir / "moving/two");
+    writeFile(dir / "moving/one/file", "");
+    writeFile(dir / "moving/two/file", "");
+    WatchedLog watched([&](const std::string& line) { // the first of the two, whichever it is
+        const bool isFirst = fs::is_empty(dir / "away");
+        if (isFirst && line == "DEL: " + dir / "moving/one/file")
+            fs::rename(dir / "moving/one", dir / "away/directory");
+        if (isFirst && line == "DEL: " + dir / "moving/two/file")
+            fs::rename(dir / "moving/two", dir / "away/directory");
+    });
     std::ostream stream(&watched);
     logstream = &stream;
 
-    EXPECT_TRUE(removeTree(dir / "tree", true, false));
+    EXPECT_TRUE(removeTree(dir / "moving", true, false));
 
-    EXPECT_EQ(Lines({"d 0755 away", "d 0755 away/deep"}), treeOf(dir.path()));
+    EXPECT_FALSE(pathExists(dir / "moving"));
+    EXPECT_TRUE(pathExists(dir / "away/directory"));
 }
 
 TEST_F(RemoveTreeTest, ADirectoryWhoseParentIsMovedElsewhereTooStays)
 {
     makeDirectories(dir / "away");
     ASSERT_TRUE(fs::remove(dir / "tree/sub/file"));
-    WatchedLog watched("DEL: " + dir / "tree/sub/deep/file", [&] {
+    WatchedLog watched([&](const std::string& line) {
+        if (line != "DEL: " + dir / "tree/sub/deep/file")
+            return;
         fs::rename(dir / "tree/sub/deep", dir / "away/deep");
         fs::rename(dir / "tree/sub", dir / "away/sub");
     });

@@ -56,7 +56,7 @@ struct Sample {
     std::string content;
     std::string archive;
     ZipEntry entry;
-    std::string wounds; ///< in words
+    std::string damage; ///< in words
 };
 
 // Contents and their compression.
@@ -161,7 +161,7 @@ void flipBits(Dice& dice, std::string& data)
 }
 
 /// Damages the sample in one way; returns a description.
-const char* wound(Dice& dice, std::string& data, ZipEntry& entry, bool& cut)
+const char* damageOnce(Dice& dice, std::string& data, ZipEntry& entry, bool& cut)
 {
     switch (dice.below(8)) {
     case 0:
@@ -209,8 +209,8 @@ Sample makeSample(std::uint32_t seed)
     if (!dice.oneIn(8)) // else unknown, as some packers leave it
         sample.entry.crc32 = checksum(sample.content);
     bool cut = false;
-    for (std::uint32_t wounds = dice.below(10) * 3 / 10; wounds > 0; --wounds)
-        sample.wounds += wound(dice, data, sample.entry, cut);
+    for (std::uint32_t times = dice.below(10) * 3 / 10; times > 0; --times)
+        sample.damage += damageOnce(dice, data, sample.entry, cut);
 
     sample.entry.dataOffset = dice.below(100);
     sample.archive = noiseBytes(sample.entry.dataOffset, seed) + data;
@@ -362,8 +362,8 @@ TEST_F(StreamComparisonTest, TheStreamDoesWhatItsModelDoesOnRandomEntries)
 
         ASSERT_NE(Mismatch, ending)
             << "run again: WZOR_STREAM_ENTRIES=1 WZOR_STREAM_SEED=" << seed << " ("
-            << sample.content.size() << " bytes;" << sample.wounds << ")";
-        ASSERT_TRUE(ending != Part || !sample.wounds.empty())
+            << sample.content.size() << " bytes;" << sample.damage << ")";
+        ASSERT_TRUE(ending != Part || !sample.damage.empty())
             << "a sound entry did not arrive whole: WZOR_STREAM_SEED=" << seed;
         ++endings[ending];
     }
@@ -456,7 +456,7 @@ TEST_F(ExtractionComparisonTest, TheFileHoldsWhatTheModelDelivers)
 
         const std::string again =
             "run again: WZOR_STREAM_ENTRIES=1 WZOR_STREAM_SEED=" + std::to_string(seed) + " (" +
-            sample.wounds + ")";
+            sample.damage + ")";
         ASSERT_TRUE(aborts ? WIFSIGNALED(status) && WTERMSIG(status) == SIGABRT : status == 0)
             << again;
         const std::string file = readFile(destination);

@@ -17,7 +17,7 @@ constexpr std::uint64_t TwoGiB = 0x80000000U;
 
 /// Three items that the directory lists backwards, so that the order of the entries shows
 /// whether the directory was read or the file scanned.
-ZipArchive twoRoads()
+ZipArchive reversedDirectory()
 {
     return {{storedItem("one", "1"), storedItem("two", "22"), storedItem("three", "333")},
             std::vector<std::size_t>{2, 1, 0}};
@@ -50,6 +50,24 @@ protected:
         return result;
     }
 
+    /// Expects "bin/a", stored, and "bin/b", deflated, whose data begins at `secondOffset`.
+    void expectBothEntries(std::uint32_t secondOffset)
+    {
+        ASSERT_EQ(2U, entries.size());
+        EXPECT_EQ("bin/a", entries[0].name);
+        EXPECT_EQ(0U, entries[0].method);
+        EXPECT_EQ(0x352441C2U, entries[0].crc32);
+        EXPECT_EQ(3U, entries[0].compressedSize);
+        EXPECT_EQ(3U, entries[0].uncompressedSize);
+        EXPECT_EQ(35U, entries[0].dataOffset);
+        EXPECT_EQ("bin/b", entries[1].name);
+        EXPECT_EQ(8U, entries[1].method);
+        EXPECT_EQ(0x89ABCDEFU, entries[1].crc32);
+        EXPECT_EQ(5U, entries[1].compressedSize);
+        EXPECT_EQ(0xFEDCBA98U, entries[1].uncompressedSize);
+        EXPECT_EQ(secondOffset, entries[1].dataOffset);
+    }
+
     TempDir dir;
     std::string path = dir / "package.spb";
     std::vector<ZipEntry> entries = {ZipEntry()}; // so that an empty list was emptied
@@ -59,7 +77,7 @@ protected:
 
 TEST_F(ZipDirectoryTest, EntriesComeInTheOrderOfTheCentralDirectory)
 {
-    EXPECT_EQ(FromDirectory, namesOf(twoRoads()));
+    EXPECT_EQ(FromDirectory, namesOf(reversedDirectory()));
 }
 
 TEST_F(ZipDirectoryTest, AnEntryHoldsWhatItsHeadersSay)
@@ -72,24 +90,12 @@ TEST_F(ZipDirectoryTest, AnEntryHoldsWhatItsHeadersSay)
 
     ASSERT_EQ(0, codeOf(zipBytes(archive)));
 
-    ASSERT_EQ(2U, entries.size());
-    EXPECT_EQ("bin/a", entries[0].name);
-    EXPECT_EQ(0U, entries[0].method);
-    EXPECT_EQ(0x352441C2U, entries[0].crc32);
-    EXPECT_EQ(3U, entries[0].compressedSize);
-    EXPECT_EQ(3U, entries[0].uncompressedSize);
-    EXPECT_EQ(35U, entries[0].dataOffset);
-    EXPECT_EQ("bin/b", entries[1].name);
-    EXPECT_EQ(8U, entries[1].method);
-    EXPECT_EQ(0x89ABCDEFU, entries[1].crc32);
-    EXPECT_EQ(5U, entries[1].compressedSize);
-    EXPECT_EQ(0xFEDCBA98U, entries[1].uncompressedSize);
-    EXPECT_EQ(73U, entries[1].dataOffset);
+    expectBothEntries(73U);
 }
 
 TEST_F(ZipDirectoryTest, TheNameIsThatOfTheLocalHeader)
 {
-    ZipArchive archive = twoRoads();
+    ZipArchive archive = reversedDirectory();
     archive.items[0].central.name = "another name";
 
     EXPECT_EQ(FromDirectory, namesOf(archive));
@@ -97,7 +103,7 @@ TEST_F(ZipDirectoryTest, TheNameIsThatOfTheLocalHeader)
 
 TEST_F(ZipDirectoryTest, SizesAndCrcOfTheLocalHeaderAreIgnored)
 {
-    ZipArchive archive = twoRoads();
+    ZipArchive archive = reversedDirectory();
     archive.items[0].local.crc = 1;
     archive.items[0].local.compressedSize = 2000;
     archive.items[0].local.uncompressedSize = 3000;
@@ -111,7 +117,7 @@ TEST_F(ZipDirectoryTest, SizesAndCrcOfTheLocalHeaderAreIgnored)
 
 TEST_F(ZipDirectoryTest, ExtraFieldsOfDifferentLengthsAreSkipped)
 {
-    ZipArchive archive = twoRoads();
+    ZipArchive archive = reversedDirectory();
     archive.items[0].local.extra = std::string(9, 'x');
     archive.items[0].central.extra = std::string(300, 'y');
     archive.items[1].central.extra = "z";
@@ -123,7 +129,7 @@ TEST_F(ZipDirectoryTest, ExtraFieldsOfDifferentLengthsAreSkipped)
 
 TEST_F(ZipDirectoryTest, ExtraFieldsOfTheGreatestLengthAreSkipped)
 {
-    ZipArchive archive = twoRoads();
+    ZipArchive archive = reversedDirectory();
     archive.items[0].local.extra = std::string(65535, 'x');
     archive.items[0].central.extra = std::string(65535, 'y');
 
@@ -134,7 +140,7 @@ TEST_F(ZipDirectoryTest, ExtraFieldsOfTheGreatestLengthAreSkipped)
 
 TEST_F(ZipDirectoryTest, ANameIsCutAtItsFirstNul)
 {
-    ZipArchive archive = twoRoads();
+    ZipArchive archive = reversedDirectory();
     archive.items[1].local.name = std::string("two\0tail\0end", 12);
 
     EXPECT_EQ(FromDirectory, namesOf(archive));
@@ -142,7 +148,7 @@ TEST_F(ZipDirectoryTest, ANameIsCutAtItsFirstNul)
 
 TEST_F(ZipDirectoryTest, AnEmptyNameIsAName)
 {
-    ZipArchive archive = twoRoads();
+    ZipArchive archive = reversedDirectory();
     archive.items[1].local.name = archive.items[1].central.name = "";
 
     EXPECT_EQ((Names{"three", "", "one"}), namesOf(archive));
@@ -160,7 +166,7 @@ TEST_F(ZipDirectoryTest, EntriesOfOneNameAreAllKept)
 
 TEST_F(ZipDirectoryTest, AnEntryOfAnUnknownMethodIsListed)
 {
-    ZipArchive archive = twoRoads();
+    ZipArchive archive = reversedDirectory();
     archive.items[1].local.method = archive.items[1].central.method = 12;
 
     ASSERT_EQ(FromDirectory, namesOf(archive));
@@ -179,7 +185,7 @@ TEST_F(ZipDirectoryTest, ANameOf2048BytesIsAccepted)
 
 TEST_F(ZipDirectoryTest, AFileCommentOnTheLastCentralHeaderDoesNoHarm)
 {
-    ZipArchive archive = twoRoads();
+    ZipArchive archive = reversedDirectory();
     archive.items[0].central.comment = "listed last"; // the directory is listed backwards
 
     EXPECT_EQ(FromDirectory, namesOf(archive));
@@ -187,7 +193,7 @@ TEST_F(ZipDirectoryTest, AFileCommentOnTheLastCentralHeaderDoesNoHarm)
 
 TEST_F(ZipDirectoryTest, TheLocalSignatureIsIgnored)
 {
-    ZipArchive archive = twoRoads();
+    ZipArchive archive = reversedDirectory();
     archive.items[1].local.signature = "ZZZZ";
 
     EXPECT_EQ(FromDirectory, namesOf(archive));
@@ -195,7 +201,7 @@ TEST_F(ZipDirectoryTest, TheLocalSignatureIsIgnored)
 
 TEST_F(ZipDirectoryTest, DiskNumbersAreIgnored)
 {
-    ZipArchive archive = twoRoads();
+    ZipArchive archive = reversedDirectory();
     archive.end.thisDisk = 3;
     archive.end.directoryDisk = 7;
 
@@ -204,7 +210,7 @@ TEST_F(ZipDirectoryTest, DiskNumbersAreIgnored)
 
 TEST_F(ZipDirectoryTest, OnlyAsManyHeadersAreReadAsTheEndRecordCounts)
 {
-    ZipArchive archive = twoRoads();
+    ZipArchive archive = reversedDirectory();
     archive.end.entriesOnDisk = archive.end.totalEntries = 2;
 
     EXPECT_EQ((Names{"three", "two"}), namesOf(archive));
@@ -212,7 +218,7 @@ TEST_F(ZipDirectoryTest, OnlyAsManyHeadersAreReadAsTheEndRecordCounts)
 
 TEST_F(ZipDirectoryTest, SizesThatFollowTheDataDoNotMatterToTheCentralDirectory)
 {
-    ZipArchive archive = twoRoads();
+    ZipArchive archive = reversedDirectory();
     archive.items[1].local.flags = 8;
     archive.items[1].local.crc = 0;
     archive.items[1].local.compressedSize = archive.items[1].local.uncompressedSize = 0;
@@ -260,7 +266,7 @@ TEST_F(ZipDirectoryTest, HeadersOfEveryLengthAtEveryPlaceAreRead)
 
 TEST_F(ZipDirectoryTest, AnArchiveCommentLeadsToTheScan)
 {
-    ZipArchive archive = twoRoads();
+    ZipArchive archive = reversedDirectory();
     for (const std::size_t length : {1U, 22U, 65535U}) {
         archive.end.comment = std::string(length, 'c');
 
@@ -270,7 +276,7 @@ TEST_F(ZipDirectoryTest, AnArchiveCommentLeadsToTheScan)
 
 TEST_F(ZipDirectoryTest, AWrongEndSignatureLeadsToTheScan)
 {
-    ZipArchive archive = twoRoads();
+    ZipArchive archive = reversedDirectory();
     archive.end.signature = "PK\x05\x07";
 
     EXPECT_EQ(FromScan, namesOf(archive));
@@ -278,7 +284,7 @@ TEST_F(ZipDirectoryTest, AWrongEndSignatureLeadsToTheScan)
 
 TEST_F(ZipDirectoryTest, CountsThatDifferLeadToTheScan)
 {
-    ZipArchive archive = twoRoads();
+    ZipArchive archive = reversedDirectory();
     archive.end.entriesOnDisk = 2;
 
     EXPECT_EQ(FromScan, namesOf(archive));
@@ -286,7 +292,7 @@ TEST_F(ZipDirectoryTest, CountsThatDifferLeadToTheScan)
 
 TEST_F(ZipDirectoryTest, ACountThatIsTooGreatLeadsToTheScan)
 {
-    ZipArchive archive = twoRoads();
+    ZipArchive archive = reversedDirectory();
     archive.end.entriesOnDisk = archive.end.totalEntries = 4;
 
     EXPECT_EQ(FromScan, namesOf(archive));
@@ -294,7 +300,7 @@ TEST_F(ZipDirectoryTest, ACountThatIsTooGreatLeadsToTheScan)
 
 TEST_F(ZipDirectoryTest, ACountOfZeroLeadsToTheScan)
 {
-    ZipArchive archive = twoRoads();
+    ZipArchive archive = reversedDirectory();
     archive.end.entriesOnDisk = archive.end.totalEntries = 0;
 
     EXPECT_EQ(FromScan, namesOf(archive));
@@ -302,7 +308,7 @@ TEST_F(ZipDirectoryTest, ACountOfZeroLeadsToTheScan)
 
 TEST_F(ZipDirectoryTest, AWrongDirectoryOffsetLeadsToTheScan)
 {
-    ZipArchive archive = twoRoads();
+    ZipArchive archive = reversedDirectory();
     for (const std::uint32_t offset : {0U, 1U, 150000U, 0x7FFFFFFFU, 0x80000000U, 0xFFFFFFFFU}) {
         archive.end.directoryOffset = offset;
 
@@ -312,7 +318,7 @@ TEST_F(ZipDirectoryTest, AWrongDirectoryOffsetLeadsToTheScan)
 
 TEST_F(ZipDirectoryTest, AWrongCentralSignatureLeadsToTheScan)
 {
-    ZipArchive archive = twoRoads();
+    ZipArchive archive = reversedDirectory();
     archive.items[0].central.signature = "PK\x01\x03";
 
     EXPECT_EQ(FromScan, namesOf(archive));
@@ -320,7 +326,7 @@ TEST_F(ZipDirectoryTest, AWrongCentralSignatureLeadsToTheScan)
 
 TEST_F(ZipDirectoryTest, AFileCommentBeforeTheLastCentralHeaderLeadsToTheScan)
 {
-    ZipArchive archive = twoRoads();
+    ZipArchive archive = reversedDirectory();
     archive.items[1].central.comment = "c";
 
     EXPECT_EQ(FromScan, namesOf(archive));
@@ -328,7 +334,7 @@ TEST_F(ZipDirectoryTest, AFileCommentBeforeTheLastCentralHeaderLeadsToTheScan)
 
 TEST_F(ZipDirectoryTest, ACentralNameOfMoreThan2048BytesLeadsToTheScan)
 {
-    ZipArchive archive = twoRoads();
+    ZipArchive archive = reversedDirectory();
     archive.items[1].central.name = std::string(2049, 'n');
 
     EXPECT_EQ(FromScan, namesOf(archive));
@@ -336,7 +342,7 @@ TEST_F(ZipDirectoryTest, ACentralNameOfMoreThan2048BytesLeadsToTheScan)
 
 TEST_F(ZipDirectoryTest, ALocalNameOfMoreThan2048BytesLeadsToTheScanWhichEndsThere)
 {
-    ZipArchive archive = twoRoads();
+    ZipArchive archive = reversedDirectory();
     archive.items[1].local.name = std::string(2049, 'n');
 
     EXPECT_EQ(4, codeOf(zipBytes(archive)));
@@ -345,7 +351,7 @@ TEST_F(ZipDirectoryTest, ALocalNameOfMoreThan2048BytesLeadsToTheScanWhichEndsThe
 
 TEST_F(ZipDirectoryTest, AMethodThatDiffersLeadsToTheScan)
 {
-    ZipArchive archive = twoRoads();
+    ZipArchive archive = reversedDirectory();
     archive.items[1].local.method = 8;
 
     ASSERT_EQ(FromScan, namesOf(archive));
@@ -355,7 +361,7 @@ TEST_F(ZipDirectoryTest, AMethodThatDiffersLeadsToTheScan)
 
 TEST_F(ZipDirectoryTest, AWrongLocalOffsetLeadsToTheScan)
 {
-    ZipArchive archive = twoRoads();
+    ZipArchive archive = reversedDirectory();
     for (const std::uint32_t offset : {150000U, 0x7FFFFFFFU, 0x80000000U, 0xFFFFFFFFU}) {
         archive.items[1].central.localOffset = offset;
 
@@ -365,7 +371,7 @@ TEST_F(ZipDirectoryTest, AWrongLocalOffsetLeadsToTheScan)
 
 TEST_F(ZipDirectoryTest, ALocalHeaderCutShortLeadsToTheScan)
 {
-    ZipArchive archive = twoRoads();
+    ZipArchive archive = reversedDirectory();
     const auto size = static_cast<std::uint32_t>(zipBytes(archive).size());
     archive.items[1].central.localOffset = size - 29;
 
@@ -387,7 +393,7 @@ TEST_F(ZipDirectoryTest, ALocalNameCutShortLeadsToTheScan)
 
 TEST_F(ZipDirectoryTest, BytesBeforeTheArchiveBreakDirectoryAndScan)
 {
-    EXPECT_EQ(3, codeOf(std::string("#!") + zipBytes(twoRoads())));
+    EXPECT_EQ(3, codeOf(std::string("#!") + zipBytes(reversedDirectory())));
     EXPECT_TRUE(entries.empty());
 }
 
@@ -406,24 +412,12 @@ TEST_F(ZipDirectoryTest, TheScanTakesEverythingFromTheLocalHeader)
 
     ASSERT_EQ(0, codeOf(zipBytes(archive)));
 
-    ASSERT_EQ(2U, entries.size());
-    EXPECT_EQ("bin/a", entries[0].name);
-    EXPECT_EQ(0U, entries[0].method);
-    EXPECT_EQ(0x352441C2U, entries[0].crc32);
-    EXPECT_EQ(3U, entries[0].compressedSize);
-    EXPECT_EQ(3U, entries[0].uncompressedSize);
-    EXPECT_EQ(35U, entries[0].dataOffset);
-    EXPECT_EQ("bin/b", entries[1].name);
-    EXPECT_EQ(8U, entries[1].method);
-    EXPECT_EQ(0x89ABCDEFU, entries[1].crc32);
-    EXPECT_EQ(5U, entries[1].compressedSize);
-    EXPECT_EQ(0xFEDCBA98U, entries[1].uncompressedSize);
-    EXPECT_EQ(78U, entries[1].dataOffset);
+    expectBothEntries(78U);
 }
 
 TEST_F(ZipDirectoryTest, TheScanCutsANameAtItsFirstNul)
 {
-    ZipArchive archive = twoRoads();
+    ZipArchive archive = reversedDirectory();
     archive.items[1].local.name = std::string("two\0tail", 8);
     archive.end.comment = "c";
 
@@ -449,7 +443,7 @@ TEST_F(ZipDirectoryTest, TheScanKeepsEntriesOfOneName)
 
 TEST_F(ZipDirectoryTest, TheScanTrustsSizesThatTheHeaderCarriesDespiteItsFlag)
 {
-    ZipArchive archive = twoRoads();
+    ZipArchive archive = reversedDirectory();
     archive.items[1].local.flags = 8;
     archive.end.comment = "c";
 
@@ -458,7 +452,7 @@ TEST_F(ZipDirectoryTest, TheScanTrustsSizesThatTheHeaderCarriesDespiteItsFlag)
 
 TEST_F(ZipDirectoryTest, TheScanGoesOnWhenOnlyOneOfCrcAndSizesIsKnown)
 {
-    ZipArchive archive = twoRoads();
+    ZipArchive archive = reversedDirectory();
     LocalHeader& header = archive.items[1].local;
     archive.items[1].data.clear();
     archive.end.comment = "c";
@@ -545,13 +539,13 @@ TEST_F(ZipDirectoryTest, ADirectoryInsteadOfAFileGives2)
 
 TEST_F(ZipDirectoryTest, LocalHeadersWithoutADirectoryGive2)
 {
-    EXPECT_EQ(2, codeOf(localBytes(twoRoads())));
+    EXPECT_EQ(2, codeOf(localBytes(reversedDirectory())));
     EXPECT_TRUE(entries.empty());
 }
 
 TEST_F(ZipDirectoryTest, AnArchiveThatEndsInsideAnEntryGives2)
 {
-    EXPECT_EQ(2, codeOf(zipBytes(twoRoads()).substr(0, 60)));
+    EXPECT_EQ(2, codeOf(zipBytes(reversedDirectory()).substr(0, 60)));
     EXPECT_TRUE(entries.empty());
 }
 
@@ -562,7 +556,7 @@ TEST_F(ZipDirectoryTest, ACentralHeaderCutShorterThanALocalOneGives2)
 
 TEST_F(ZipDirectoryTest, AnUnknownRecordGives3)
 {
-    ZipArchive archive = twoRoads();
+    ZipArchive archive = reversedDirectory();
     archive.end.comment = "c";
     for (const std::string signature : {"PK\x03\x03", "PK\x04\x04", "PK\x05\x06", "PK\x01\x04",
                                         "PK\x03\x02", "KP\x03\x04", "PP\x03\x04"}) {
@@ -592,7 +586,7 @@ TEST_F(ZipDirectoryTest, ANameOf2049BytesGives4)
 
 TEST_F(ZipDirectoryTest, ANameThatTheFileCutsShortGives5)
 {
-    ZipArchive archive = twoRoads();
+    ZipArchive archive = reversedDirectory();
     archive.items.back() = storedItem("whole", "");
     archive.items.back().local.nameLength = 6;
 
@@ -602,7 +596,7 @@ TEST_F(ZipDirectoryTest, ANameThatTheFileCutsShortGives5)
 
 TEST_F(ZipDirectoryTest, SizesThatFollowTheDataGive8)
 {
-    ZipArchive archive = twoRoads();
+    ZipArchive archive = reversedDirectory();
     archive.items[2].local.flags = 8;
     archive.items[2].local.crc = 0;
     archive.items[2].local.compressedSize = archive.items[2].local.uncompressedSize = 0;
@@ -625,7 +619,7 @@ TEST_F(ZipDirectoryTest, TheNameIsReadBeforeTheSizesAreChecked)
 
 TEST_F(ZipDirectoryTest, SizesOf2ToThe31AndMoreAreKept)
 {
-    ZipArchive archive = twoRoads();
+    ZipArchive archive = reversedDirectory();
     archive.items[0].central.compressedSize = 0x80000000U;
     archive.items[0].central.uncompressedSize = 0xFFFFFFFFU;
 
@@ -637,7 +631,7 @@ TEST_F(ZipDirectoryTest, SizesOf2ToThe31AndMoreAreKept)
 
 TEST_F(ZipDirectoryTest, TheScanCannotSkipDataOf2ToThe31OrMore)
 {
-    ZipArchive archive = twoRoads();
+    ZipArchive archive = reversedDirectory();
     archive.end.comment = "c";
     for (const std::uint32_t size : {0x80000000U, 0xFFFFFF00U, 0xFFFFFFFFU}) {
         archive.items[0].local.compressedSize = size;
@@ -732,7 +726,7 @@ TEST_F(ZipDirectoryTest, ALocalHeaderJustBelow2ToThe31IsFoundThroughTheDirectory
 
 TEST_F(ZipDirectoryTest, AnEndRecordBeyond2ToThe31LeadsToTheScan)
 {
-    ZipArchive archive = twoRoads();
+    ZipArchive archive = reversedDirectory();
     const std::string head = localBytes(archive);
     EndRecord end;
     end.entriesOnDisk = end.totalEntries = 1;
@@ -749,7 +743,7 @@ TEST_F(ZipDirectoryTest, AnEndRecordBeyond2ToThe31LeadsToTheScan)
 
 TEST_F(ZipDirectoryTest, AZipFileHoldsTheEntriesOfItsArchive)
 {
-    writeFile(path, zipBytes(twoRoads()));
+    writeFile(path, zipBytes(reversedDirectory()));
 
     const ZipFile archive(path.c_str());
 
@@ -766,14 +760,14 @@ TEST_F(ZipDirectoryTest, AZipFileOfAMissingArchiveIsEmpty)
 
 TEST_F(ZipDirectoryTest, AZipFileOfADamagedArchiveIsEmpty)
 {
-    writeFile(path, localBytes(twoRoads()));
+    writeFile(path, localBytes(reversedDirectory()));
 
     EXPECT_TRUE(ZipFile(path.c_str()).entries().empty());
 }
 
 TEST_F(ZipDirectoryTest, AZipFileKeepsNoFileOpen)
 {
-    writeFile(path, zipBytes(twoRoads()));
+    writeFile(path, zipBytes(reversedDirectory()));
     const int before = dup(0);
     close(before);
 
@@ -812,10 +806,10 @@ TEST_F(ZipDirectoryTest, FindEntryComparesEveryByte)
 
 TEST_F(ZipDirectoryTest, ValidateGivesTheCodeOfTheDirectory)
 {
-    writeFile(path, zipBytes(twoRoads()));
+    writeFile(path, zipBytes(reversedDirectory()));
     EXPECT_EQ(0, ZipFile::validate(path.c_str()));
 
-    writeFile(path, localBytes(twoRoads()));
+    writeFile(path, localBytes(reversedDirectory()));
     EXPECT_EQ(2, ZipFile::validate(path.c_str()));
 
     EXPECT_EQ(1, ZipFile::validate((dir / "missing").c_str()));

@@ -242,7 +242,7 @@ def with_walks(points):
 
 
 def with_entries(points):
-    """Tells the points between an entry's opening and its closing which file it becomes."""
+    """Notes in the points between an entry's opening and its closing which file it becomes."""
     entry, result = "", []
     for number, point in enumerate(points):
         if point.path in PACKAGES and point.kind == "open":
