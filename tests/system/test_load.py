@@ -1,5 +1,7 @@
 """Packages of many files or of much content: all of it arrives, and memory follows the entries."""
 
+import os
+
 import pytest
 
 from harness import load
@@ -28,3 +30,19 @@ def test_a_large_package_is_installed_and_removed_within_its_memory(machine, eac
     allowed = KIB_OTHERWISE + KIB_AN_ENTRY * entries
     for before, after in zip(small, large):
         assert after.peak - before.peak <= allowed
+
+
+def test_a_removal_deletes_a_directory_of_more_names_than_it_holds(machine):
+    assert machine.run("i", "ABC", "-s", SPB).status == 0
+    cache = machine.at("/opt/corvan/zor/cache_data")
+    names = 140_000  # of 240 bytes: more than the 32 MiB that a removal holds at once
+    for number in range(names):
+        if number % 10_000 == 0:  # a file has only some ten thousand links, depending on its system
+            first = f"{cache}/{number:0240}"
+            with open(first, "wb"):
+                continue
+        os.link(first, f"{cache}/{number:0240}")
+
+    assert machine.run("r", "ABC", "-o", "/dev/null").status == 0
+
+    assert not machine.exists("/opt/corvan/zor")

@@ -250,6 +250,18 @@ TEST_F(DiscoveryTest, ABrokenInstallationIsRepairedAsAnOlderOne)
                               "dir.\nZOR broken in existing location, forcing update.\n"));
 }
 
+TEST_F(DiscoveryTest, ALevelOf1IsLoweredForARepair)
+{
+    commandLine.request.version = {9, 2, 30, 1, 0};
+    plantRegistry("9.9.9.9999", "22/12/03");
+    makeDirectories(Home);
+
+    const Discovery found = discoverInstallation(commandLine);
+
+    EXPECT_EQ("9.2.30.0000", formatVersion(found.registry.version));
+    EXPECT_TRUE(found.upgradeNeeded);
+}
+
 TEST_F(DiscoveryTest, ALevelOf0IsNotLoweredForARepair)
 {
     commandLine.request.version = {9, 2, 30, 0, 0};
