@@ -84,7 +84,7 @@ def test_an_ordinary_user_has_a_lock_and_a_log_of_its_own(ready):
     outcome = zorctl(ready, "run", "--", "i", "SHOP", "-s", SPB, user=ANN)
 
     assert (outcome.status, outcome.stderr) == (0, "")
-    assert ready.exists("/home/ann/.wzorinst.lock")
+    assert ready.mode("/home/ann/.wzorinst.lock") == 0o600
     assert len(os.listdir(ready.at("/home/ann/.local/state/zorctl"))) == 1
 
 
@@ -126,6 +126,15 @@ def test_another_run_that_holds_the_lock_ends_with_75(ready):
 
     printed(outcome, "", status=75, stderr="zorctl: another run holds /run/wzorinst.lock\n")
     assert nothing_was_done(ready)
+
+
+def test_a_lock_that_flock_made_is_closed_to_other_users(ready):
+    ready.plant("/run/wzorinst.lock", b"", 0o644)
+
+    outcome = zorctl(ready, "run", "--", "i", "SHOP", "-s", SPB)
+
+    assert outcome.status == 0
+    assert ready.mode("/run/wzorinst.lock") == 0o600
 
 
 def test_a_link_in_place_of_the_lock_is_not_followed(ready):

@@ -17,7 +17,7 @@ namespace {
 
 constexpr const char* SharedLock = "/run/wzorinst.lock";
 constexpr const char* LocalLockName = ".wzorinst.lock";
-constexpr mode_t LockMode = 0644;
+constexpr mode_t LockMode = 0600; // whoever can open the file can hold the lock for ever
 
 time_t now()
 {
@@ -30,6 +30,13 @@ void pauseShortly()
 {
     const timespec moment = {0, 100'000'000};
     (void)nanosleep(&moment, nullptr); // a signal only shortens it
+}
+
+/// Closes an existing lock of our own, such as flock(1) makes, to other users.
+void closeToOthers(const ScopedFd& file, const struct stat& status)
+{
+    if (status.st_uid == geteuid() && (status.st_mode & (S_IRWXG | S_IRWXO)) != 0)
+        (void)fchmod(file.get(), LockMode); // the lock works all the same
 }
 
 } // namespace
@@ -53,6 +60,8 @@ LockState takeLock(const std::string& path, bool exclusive, long waitSeconds, Sc
     struct stat status = {};
     if (!file.isOpen() || fstat(file.get(), &status) != 0 || !S_ISREG(status.st_mode))
         return LockState::CannotLock;
+    if (exclusive)
+        closeToOthers(file, status);
 
     const time_t deadline = now() + waitSeconds;
     while (flock(file.get(), (exclusive ? LOCK_EX : LOCK_SH) | LOCK_NB) != 0) {
