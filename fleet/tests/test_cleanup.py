@@ -16,7 +16,7 @@ import pytest
 
 from harness import REPOSITORY
 
-MOMENTS = int(os.environ.get("WZOR_MOMENTS", "2"))
+MOMENTS = int(os.environ.get("WZOR_MOMENTS", "1"))
 LONGEST = 8.0  # seconds, about what the command below takes
 SEED = 20221202
 

@@ -167,6 +167,22 @@ def die_with_parent():
     ctypes.CDLL(None).prctl(prctl_set_pdeathsig, signal.SIGKILL)
 
 
+def adopt_orphans():
+    """Makes this process the parent of all its descendants that lose theirs."""
+    prctl_set_child_subreaper = 36
+    ctypes.CDLL(None).prctl(prctl_set_child_subreaper, 1)
+
+
+def end_children():
+    """Kills the hosts, and with them what a command left: the connections of ssh, for example."""
+    children = Path(f"/proc/self/task/{os.getpid()}/children")
+    while found := children.read_text(encoding="ascii").split():
+        for number in found:
+            os.kill(int(number), signal.SIGKILL)
+        for number in found:
+            os.waitpid(int(number), 0)
+
+
 def start_host(directory, name):
     """Starts one host; returns the process that is the parent of its first process."""
     line = ["unshare", "--mount", "--pid", "--ipc", "--uts", "--fork", "--kill-child=KILL"]
@@ -206,8 +222,9 @@ def run_fleet(directory, count, ready, wait):
     Calls `ready` with the hosts once all listen. Afterwards the hosts are gone and so is
     `directory`.
     """
-    parents = {}
+    adopt_orphans()
     try:
+        parents = {}
         named = prepare(directory, count)
         for name in named:
             parents[name] = start_host(directory, name)
@@ -221,10 +238,7 @@ def run_fleet(directory, count, ready, wait):
     finally:
         for number in (signal.SIGINT, signal.SIGTERM, signal.SIGHUP):
             signal.signal(number, signal.SIG_IGN)
-        for parent in parents.values():
-            parent.kill()
-        for parent in parents.values():
-            parent.wait()
+        end_children()
         shutil.rmtree(directory, ignore_errors=True)
 
 
