@@ -43,6 +43,21 @@ def test_a_batch_closes_the_gate_above_the_limit(healthy, failed, is_canary, lim
 
 
 @pytest.mark.parametrize(
+    "installed, rollback, state",
+    [
+        ({**GOOD, "reason": "newer-installed"}, False, "healthy"),
+        ({**GOOD, "reason": "newer-installed"}, True, "failed"),
+        ({**GOOD, "operation": "registration"}, True, "failed"),
+        ({**GOOD, "operation": "upgrade"}, True, "healthy"),
+    ],
+)
+def test_a_rollback_fails_where_a_newer_version_stays(installed, rollback, state):
+    variables = {"zor_rollout_installed": installed, "zor_rollout_health": {"rc": 0}}
+
+    assert GATE.outcome_of(variables, rollback)["state"] == state
+
+
+@pytest.mark.parametrize(
     "installed, health, state, message",
     [
         (GOOD, {"rc": 0}, "healthy", None),

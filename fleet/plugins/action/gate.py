@@ -5,6 +5,7 @@ import datetime
 import os
 
 from ansible.errors import AnsibleError
+from ansible.module_utils.parsing.convert_bool import boolean
 from ansible.plugins.action import ActionBase
 from ansible_collections.corvan.zor.plugins.plugin_utils import controller_files, gate, report
 
@@ -32,7 +33,9 @@ class ActionModule(ActionBase):
     def _judge(self, arguments, variables):
         """Judges the batch that just ended, and writes the report."""
         batch, everyone = variables["ansible_play_batch"], variables["ansible_play_hosts_all"]
-        outcomes = {name: gate.outcome_of(variables["hostvars"][name]) for name in batch}
+        rollback = boolean(arguments.get("rollback", False))
+        known = variables["hostvars"]
+        outcomes = {name: gate.outcome_of(known[name], rollback) for name in batch}
         closed = gate.closes(outcomes, everyone[0] in batch, float(arguments["max_failures"]))
         failed = sorted(name for name in batch if outcomes[name]["state"] == gate.FAILED)
         reason = f"{len(failed)} of {len(batch)} hosts of a batch failed" if closed else None

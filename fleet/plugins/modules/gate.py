@@ -30,6 +30,10 @@ options:
       - How many percent of a batch may fail. Of the first batch, the canary, none may.
     type: float
     required: true
+  rollback:
+    description: Whether a host that keeps a newer version failed.
+    type: bool
+    default: false
 attributes:
   check_mode:
     description: Judges as it would, and writes no report.

@@ -7,10 +7,11 @@ failed task, no connection, or no answer at all. Ansible's own limits leave unre
 HEALTHY, FAILED, WAITING = "healthy", "failed", "waiting"
 
 
-def outcome_of(variables):
+def outcome_of(variables, rollback=False):
     """What became of one host of the batch that just ended: its state, and details.
 
     `variables` are the host's own: the results of the installation and of the check of its health.
+    In a rollback, a host that keeps a newer version failed.
     """
     installed = variables.get("zor_rollout_installed") or {}
     health = variables.get("zor_rollout_health") or {}
@@ -24,7 +25,7 @@ def outcome_of(variables):
         "message": None,
     }
     message = message_of(installed)
-    if not message and variables.get("zor_rollout_rollback") and was_refused(installed):
+    if not message and rollback and was_refused(installed):
         message = "a newer version is installed, and an older one cannot replace it"
     if not message and not health.get("skipped"):
         message = message_of(health)
