@@ -68,6 +68,7 @@ test='
 bench='
     7zip
     g++-multilib
+    iproute2
     lib32z1-dev
     libarchive-tools
     libdeflate-dev:i386
@@ -89,7 +90,7 @@ case ${1-} in
 demo) packages=$demo ;;
 fleet) packages="$demo $fleet" ;;
 test) packages="$demo $fleet $test" ;;
-bench) packages="$demo $bench" ;;
+bench) packages="$demo $fleet $bench" ;;
 all) packages="$demo $fleet $test $bench $more" ;;
 *) echo "Usage: $0 demo|fleet|test|bench|all" >&2; exit 2 ;;
 esac
