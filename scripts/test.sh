@@ -24,6 +24,7 @@ for preset in "$@"; do
     cmake --preset "$preset" >/dev/null
     # The 64-bit release is not built with unit tests: those of dev and test-i686 are the same.
     case $preset in
+    fuzz) targets=fuzz_targets ;;
     test) targets='wzorinst zorctl spb manual_pages unwind_test' ;;
     *) targets=all ;;
     esac
