@@ -14,7 +14,9 @@ import tarfile
 from ansible import constants
 from ansible.errors import AnsibleError
 
-NAMES = ("wzorinst", "zorctl", "spb")
+# pylint: disable-next=import-error # the path that Ansible gives the collection
+from ansible_collections.corvan.zor.plugins.module_utils.host_files import NAMES, digest_of
+
 WIDTHS = ("i686", "x86_64")
 
 
@@ -29,18 +31,8 @@ def notes_of_run():
         yield directory
 
 
-def digest_of(paths):
-    """One SHA-256 of the content of all `paths`."""
-    total = hashlib.sha256()
-    for path in paths:
-        with open(path, "rb") as file:
-            while block := file.read(1 << 20):
-                total.update(block)
-    return total.hexdigest()
-
-
 def noted_digest(paths):
-    """The same, worked out once a run for each state of the files."""
+    """One SHA-256 of the content of all `paths`, worked out once a run for each state of them."""
     states = []
     for path in paths:
         found = os.stat(path)
