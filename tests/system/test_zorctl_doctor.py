@@ -95,8 +95,10 @@ def test_an_interrupted_commit_goes_forward(installed):
         "delete-backup",
         "delete-backup",
         "set-modes",
+        "delete-cache",
         "enable-scanners",
     ]
+    assert not installed.exists(HOME + "/cache_data")
     assert not installed.exists(HOME + "/bin/trawlhw.bak")
     assert installed.read_bytes(HOME + "/bin/trawlhw") != b"old"
 

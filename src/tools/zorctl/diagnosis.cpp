@@ -15,6 +15,7 @@
 #include "settings.h"
 #include "settings_upgrade.h"
 #include "transaction.h"
+#include "tree_removal.h"
 #include "trusted_path.h"
 
 #include <utility>
@@ -160,6 +161,7 @@ void Diagnosis::goForward()
         deleteLater("delete-backup", backup);
     recordType();
     setModes();
+    deleteCache();
     enableScanners();
 }
 
@@ -336,6 +338,17 @@ void Diagnosis::setModes()
         place.currentZorHome = place.currentCfgHome = home_;
         applyPermissions(place);
         return true;
+    });
+}
+
+/// As at the end of an upgrade: the scanners start with an empty cache.
+void Diagnosis::deleteCache()
+{
+    const std::string cache = joinPath(home_, cacheDir);
+    add("delete-cache", cache, [this, cache] {
+        FileTransaction transaction;
+        (void)removeDir(transaction, home_, cacheDir, true); // always 0
+        return !pathExists(cache);
     });
 }
 

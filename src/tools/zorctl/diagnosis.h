@@ -56,6 +56,7 @@ private:
     void diagnoseRest();
     void recordType();
     void setModes();
+    void deleteCache();
     void enableScanners();
     void deleteLater(const char* code, const std::string& path);
     void add(const char* code, const std::string& path, std::function<bool()> carryOut);
