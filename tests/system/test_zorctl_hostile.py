@@ -246,3 +246,16 @@ def test_doctor_does_not_look_for_backups_through_a_link_of_another_user(install
     assert restored == []
     assert installed.read("/opt/bin/trawlhw") == "half of"
     assert "reinstall" in advice
+
+
+def test_a_planted_backup_is_no_sign_of_an_upgrade(machine):
+    """Else root would repeat the end of one, with the administrator's settings."""
+    scanner = HOME + "/bin/customscanners/site.sh"
+    machine.pack({"bin/customscanners/": b"", "bin/customscanners/site.sh": b"echo site\n"})
+    assert machine.run("i", "SHOP", "-s", SPB).status == 0
+    machine.as_user(GUEST, lambda: os.mknod(machine.at(scanner + ".bak")))
+
+    found = report(machine, "doctor", "--apply", status=1)
+
+    assert (found["interrupted"], found["actions"]) == (None, [])
+    assert [one["code"] for one in found["advice"]] == ["untrusted-backup"]

@@ -52,6 +52,9 @@ Diagnosis::Diagnosis(Installation& found, std::string home) : found_(found), hom
     else if (home_.empty())
         home_ = defaultInstallDir(localInstall);
     readIndexOf(home_);
+    for (const std::string& backup : packageBackups(false))
+        advise("untrusted-backup",
+               backup + " may be somebody else's: look at it, and rename it or delete it");
     if (found_.registryState != "complete")
         diagnoseUnregistered();
     else if (!packageBackups().empty() || found_.indexState == "interrupted")
@@ -117,15 +120,16 @@ void Diagnosis::readIndexOf(const std::string& home)
     listed_ = std::move(index.files);
 }
 
-/// The backups of files that an installation replaced.
-std::vector<std::string> Diagnosis::packageBackups() const
+/// The backups of files that an installation replaced. One that somebody else may have made is no
+/// evidence of anything.
+std::vector<std::string> Diagnosis::packageBackups(bool areTrusted) const
 {
     bool complete = true;
     std::vector<std::string> backups;
     for (const std::string& path : findBackups(home_, complete)) {
         const std::string original = originalOf(path);
         const bool known = found_.indexState != "complete" || listed_.contains(original);
-        if (known && !listed_.contains(path))
+        if (known && !listed_.contains(path) && isTrustedFile(path) == areTrusted)
             backups.push_back(path);
     }
     return backups;
@@ -171,11 +175,6 @@ void Diagnosis::goBack()
     std::set<std::string> restored;
     for (const std::string& backup : packageBackups()) {
         const std::string path = originalOf(backup);
-        if (!isTrustedFile(backup)) {
-            advise("untrusted-backup",
-                   backup + " may be somebody else's: look at it, and rename it or delete it");
-            continue;
-        }
         restored.insert(path);
         add("restore", path, [backup] { return restoreTrusted(backup); });
     }
@@ -229,9 +228,7 @@ void Diagnosis::diagnoseUnregistered()
         return;
     interrupted_ = "installation";
     for (const std::string& backup : backups) {
-        const std::string path = originalOf(backup);
-        if (isTrustedFile(backup))
-            add("restore", path, [backup] { return restoreTrusted(backup); });
+        add("restore", originalOf(backup), [backup] { return restoreTrusted(backup); });
     }
     advise("unregistered-files", home_ + " holds files, but nothing is registered: install "
                                          "again, or delete them");

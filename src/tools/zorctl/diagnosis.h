@@ -43,7 +43,7 @@ public:
 private:
     void restoreRegistry();
     void readIndexOf(const std::string& home);
-    std::vector<std::string> packageBackups() const;
+    std::vector<std::string> packageBackups(bool areTrusted = true) const;
     bool wasRegistered() const;
     void diagnoseDeployment();
     void goForward();
