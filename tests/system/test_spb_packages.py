@@ -209,6 +209,19 @@ def exchanging(here, there):
         attacker.kill()
 
 
+@pytest.mark.skipif(os.geteuid() != 0, reason="needs root, to give away a link")
+def test_extract_goes_through_no_link_of_another_user(tmp_path, spb):
+    planted(spb, ("bin/", b""), ("bin/abc", b"abc"))
+    (tmp_path / "elsewhere").mkdir()
+    (tmp_path / "target").symlink_to("elsewhere")
+    os.chown(tmp_path / "target", 4242, 4242, follow_symlinks=False)
+
+    done = spb_tool.run("extract", spb, "-d", tmp_path / "target")
+
+    assert (done.returncode, os.listdir(tmp_path / "elsewhere")) == (2, [])
+    assert done.stderr == f"spb: {tmp_path}/target: No such file or directory\n"
+
+
 def test_extract_writes_nothing_outside_while_directories_become_links(tmp_path, spb):
     """Writing by paths would reach the link's target within the first dozen files."""
     names = [f"bin/deep/{number:03}" for number in range(400)]

@@ -7,6 +7,7 @@
 #include "landed_files.h"
 #include "package_layout.h"
 #include "progress.h"
+#include "safe_path.h"
 #include "shown_text.h"
 #include "subcommands.h"
 #include "tool_output.h"
@@ -131,11 +132,11 @@ int extractCommand(const ExtractOptions& options)
     const auto package = openPackage(options.file);
     if (!package)
         return ToolTrouble;
-    if (mkdir(options.directory.c_str(), 0777) != 0 && errno != EEXIST) {
+    if (createDirectoryPath(options.directory, 0777) != 0 && errno != EEXIST) {
         complainOf(options.directory, errno);
         return ToolTrouble;
     }
-    const ScopedFd root(open(options.directory.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
+    const ScopedFd root = openPath(options.directory, O_RDONLY | O_DIRECTORY);
     if (!root.isOpen()) {
         complainOf(options.directory, errno);
         return ToolTrouble;
