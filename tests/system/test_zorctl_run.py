@@ -146,6 +146,31 @@ def test_a_link_in_place_of_the_lock_is_not_followed(ready):
     assert not ready.exists("/etc/planted")
 
 
+IGNORING_CHILDREN = """
+import os, signal, sys
+signal.signal(signal.SIGCHLD, signal.SIG_IGN)
+os.execv(sys.argv[1], sys.argv[1:])
+"""
+
+
+@pytest.mark.parametrize(
+    "caller",
+    [
+        ("/usr/bin/python3", "-I", "-c", IGNORING_CHILDREN),
+        ("/bin/sh", "-c", 'exec "$0" "$@" <&-'),
+        ("/bin/sh", "-c", 'exec "$0" "$@" >&-'),
+    ],
+    ids=["SIGCHLD ignored", "standard input closed", "standard output closed"],
+)
+def test_it_works_whatever_its_caller_leaves_it(ready, caller):
+    installed = zorctl(ready, "run", "--", "i", "SHOP", "-s", SPB, tool=caller)
+    removed = zorctl(ready, "run", "--", "r", "SHOP", tool=caller)
+
+    assert (installed.status, removed.status) == (0, 0)
+    assert "returned -1" not in logs(ready)[0]
+    assert not ready.exists("/etc/zor/zor.ini")
+
+
 def test_a_signed_package_is_installed(signed):
     outcome = zorctl(signed, "run", "--signers", "/media/signers", "--", "i", "SHOP", "-s", SPB)
 

@@ -29,13 +29,18 @@ void closeOnExecOneByOne()
 
 } // namespace
 
-void secureDescriptors()
+void openStandardDescriptors()
 {
     for (int fd = 0; fd < FirstPrivate; ++fd) {
         // Takes the lowest free number, which is `fd`.
         if (fcntl(fd, F_GETFD) < 0)
             (void)open("/dev/null", O_RDWR); // if this fails, writes fail as before
     }
+}
+
+void secureDescriptors()
+{
+    openStandardDescriptors();
     if (close_range(FirstPrivate, ~0U, CLOSE_RANGE_CLOEXEC) != 0)
         closeOnExecOneByOne();
 }

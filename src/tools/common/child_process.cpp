@@ -181,7 +181,9 @@ int runProgramTwofold(const std::vector<std::string>& arguments, ChildSetup setu
     siginfo_t ended = {};
     while (ended.si_pid == 0) {
         forward(readEnd.get(), first, second);
-        (void)waitid(P_PID, static_cast<id_t>(child), &ended, WEXITED | WNOHANG | WNOWAIT);
+        if (waitid(P_PID, static_cast<id_t>(child), &ended, WEXITED | WNOHANG | WNOWAIT) != 0 &&
+            errno != EINTR)
+            break;
     }
     while (forward(readEnd.get(), first, second, 0)) {
     }

@@ -1,5 +1,6 @@
 // spb: makes, lists, checks, compares, unpacks and signs SPBs, the packages that wzorinst installs.
 #include "command_line_tool.h"
+#include "descriptors.h"
 #include "exit_status.h"
 #include "findings.h"
 #include "settings.h"
@@ -161,6 +162,8 @@ ToolCommand addVerify(CLI::App& app, SignatureOptions& options)
 
 int main(int argc, char** argv)
 {
+    openStandardDescriptors();
+    (void)std::signal(SIGCHLD, SIG_DFL); // if ignored, no child can be waited for
     (void)std::signal(SIGPIPE, SIG_IGN); // a reader that went away is an error of writing
     static std::ostream silence(nullptr);
     logstream = &silence; // the installer's library reports here

@@ -1,6 +1,7 @@
 // zorctl: looks at, checks, plans and repairs installations of the ZOR toolkit.
 
 #include "command_line_tool.h"
+#include "descriptors.h"
 #include "doctor.h"
 #include "exit_status.h"
 #include "plan.h"
@@ -173,6 +174,8 @@ int main(int argc, char** argv)
     (void)std::setlocale(LC_ALL, "C"); // the start-up locale; cannot fail
     logstream = &silence;
     completeLayoutNames();
+    openStandardDescriptors();
+    (void)std::signal(SIGCHLD, SIG_DFL); // if ignored, no child can be waited for
     (void)std::signal(SIGPIPE, SIG_IGN); // writes fail instead; programs we start get theirs back
 
     const auto app = makeCommandLine(
