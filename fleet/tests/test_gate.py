@@ -1,22 +1,15 @@
 """The gate's judgement of a batch, and its count of hosts that gave no answer."""
 
-import importlib.util
-
 import pytest
 
-from harness import REPOSITORY
+from harness import fleet_plugins
 
-
-def load(name):
-    path = REPOSITORY / f"fleet/plugins/plugin_utils/{name}.py"
-    spec = importlib.util.spec_from_file_location(name, path)
-    module = importlib.util.module_from_spec(spec)
-    spec.loader.exec_module(module)
-    return module
-
-
-GATE = load("gate")
 GOOD = {"changed": True, "after": {"version": "9.2.30.0000", "build_date": "22/12/02"}}
+
+
+@pytest.fixture(name="gate")
+def fixture_gate():
+    return fleet_plugins.load("plugin_utils/gate.py")
 
 
 def outcomes(healthy, failed):
@@ -38,8 +31,8 @@ def outcomes(healthy, failed):
         (199, 1, False, 0.5, False),
     ],
 )
-def test_a_batch_closes_the_gate_above_the_limit(healthy, failed, is_canary, limit, closes):
-    assert GATE.closes(outcomes(healthy, failed), is_canary, limit) is closes
+def test_a_batch_closes_the_gate_above_the_limit(gate, healthy, failed, is_canary, limit, closes):
+    assert gate.closes(outcomes(healthy, failed), is_canary, limit) is closes
 
 
 @pytest.mark.parametrize(
@@ -51,10 +44,10 @@ def test_a_batch_closes_the_gate_above_the_limit(healthy, failed, is_canary, lim
         ({**GOOD, "operation": "upgrade"}, True, "healthy"),
     ],
 )
-def test_a_rollback_fails_where_a_newer_version_stays(installed, rollback, state):
+def test_a_rollback_fails_where_a_newer_version_stays(gate, installed, rollback, state):
     variables = {"zor_rollout_installed": installed, "zor_rollout_health": {"rc": 0}}
 
-    assert GATE.outcome_of(variables, rollback)["state"] == state
+    assert gate.outcome_of(variables, rollback)["state"] == state
 
 
 @pytest.mark.parametrize(
@@ -76,9 +69,9 @@ def test_a_rollback_fails_where_a_newer_version_stays(installed, rollback, state
         (GOOD, {"unreachable": True, "msg": "gone"}, "failed", "unreachable: gone"),
     ],
 )
-def test_a_host_is_healthy_only_if_it_proved_it(installed, health, state, message):
+def test_a_host_is_healthy_only_if_it_proved_it(gate, installed, health, state, message):
     variables = {"zor_rollout_installed": installed, "zor_rollout_health": health}
 
-    outcome = GATE.outcome_of(variables)
+    outcome = gate.outcome_of(variables)
 
     assert (outcome["state"], outcome["message"]) == (state, message)

@@ -1,21 +1,15 @@
 """What the collection keeps on a host: which programs, how many packages, and for whom."""
 
-import importlib.util
 import os
 
 import pytest
 
-from harness import REPOSITORY
-
-PATH = REPOSITORY / "fleet/plugins/module_utils/host_files.py"
+from harness import fleet_plugins
 
 
 @pytest.fixture
 def files():
-    spec = importlib.util.spec_from_file_location("host_files", PATH)
-    module = importlib.util.module_from_spec(spec)
-    spec.loader.exec_module(module)
-    return module
+    return fleet_plugins.load("module_utils/host_files.py")
 
 
 def test_the_two_newest_packages_are_kept(files, tmp_path):

@@ -1,31 +1,20 @@
 """The report of a roll-out: its page, and how a roll-out continues the report that it finds."""
 
 import html.parser
-import importlib.util
 import json
-import sys
 
 import pytest
 
-from harness import REPOSITORY
+from harness import fleet_plugins
 
-PLUGINS = REPOSITORY / "fleet/plugins/plugin_utils"
 PACKAGE = {"name": "toolkit.spb", "sha256": "ab" * 32}
 OTHER = {"name": "toolkit.spb", "sha256": "cd" * 32}
 
 
-def load(name):
-    spec = importlib.util.spec_from_file_location("plugin_utils." + name, PLUGINS / f"{name}.py")
-    module = importlib.util.module_from_spec(spec)
-    sys.modules[spec.name] = module
-    spec.loader.exec_module(module)
-    return module
-
-
 @pytest.fixture(scope="module")
 def report():
-    load("gate")
-    return load("report")
+    fleet_plugins.load("plugin_utils/gate.py")
+    return fleet_plugins.load("plugin_utils/report.py")
 
 
 def host(state, version=None, message=None, operation=None, reason=None):
