@@ -40,6 +40,7 @@ test='
     e2fsprogs
     g++-multilib
     gcovr
+    git
     googletest
     groff-base
     isort
@@ -78,11 +79,10 @@ bench='
     strace
     unzip
 '
-# File systems to test on, other releases of Debian to build on, changes to plant faults in, and a JSON schema.
+# File systems to test on, other releases of Debian to build on, and a JSON schema.
 more='
     btrfs-progs
     debootstrap
-    git
     npm
 '
 
