@@ -8,13 +8,13 @@
 #include <cerrno>
 #include <csignal>
 #include <cstdlib>
+#include <ctime>
 #include <string_view>
 
 #include <fcntl.h>
 #include <linux/limits.h>
 #include <poll.h>
 #include <sys/wait.h>
-#include <time.h>
 #include <unistd.h>
 
 namespace {
@@ -79,6 +79,7 @@ void useAs(int descriptor, int target)
         (void)fcntl(setup.kept, F_SETFD, 0);
     (void)std::signal(SIGPIPE, SIG_DFL);
     std::vector<char*> pointers;
+    pointers.reserve(arguments.size() + 1);
     for (const std::string& argument : arguments)
         pointers.push_back(const_cast<char*>(argument.c_str())); // execv() does not write there
     pointers.push_back(nullptr);
@@ -147,7 +148,7 @@ std::string findProgram(const std::string& name)
     std::string_view rest = list != nullptr ? list : "/usr/sbin:/usr/bin:/sbin:/bin";
     while (!rest.empty()) {
         const std::size_t colon = rest.find(':');
-        const std::string path = joinPath(std::string(rest.substr(0, colon)), name);
+        std::string path = joinPath(std::string(rest.substr(0, colon)), name);
         if (path.front() == '/' && isExecutable(path))
             return path;
         rest = colon == std::string_view::npos ? std::string_view() : rest.substr(colon + 1);

@@ -69,6 +69,7 @@ PlannedRun parseRun(const std::vector<std::string>& arguments)
     std::vector<std::string> texts = withoutLogFile(arguments);
     texts.insert(texts.begin(), "wzorinst");
     std::vector<char*> pointers;
+    pointers.reserve(texts.size() + 1);
     for (std::string& text : texts)
         pointers.push_back(text.data());
     pointers.push_back(nullptr);
