@@ -114,11 +114,11 @@ int createTemporary(const Place& place, ScopedFd& file)
     for (int tries = 0; tries < MaxTries; ++tries) {
         file = ScopedFd(openat(place.fd(), name.c_str(),
                                O_RDWR | O_CREAT | O_EXCL | O_NOFOLLOW | O_CLOEXEC, UnfinishedMode));
-        if (file.isOpen() && flock(file.get(), LOCK_EX | LOCK_NB) == 0 && isTemporary(place, file))
+        int error = file.isOpen() ? 0 : errno;
+        if (error == 0 && flock(file.get(), LOCK_EX | LOCK_NB) == 0 && isTemporary(place, file))
             return 0;
-        if (!file.isOpen() && errno != EEXIST)
-            return errno;
-        const int error = file.isOpen() ? 0 : waitForOtherRun(place);
+        if (error == EEXIST)
+            error = waitForOtherRun(place);
         if (error != 0)
             return error;
     }
@@ -149,10 +149,14 @@ int fill(int file, const ContentWriter& write)
 
     errno = 0;
     write(stream.get());
+    int error = errno;
     const bool flushed = std::fflush(stream.get()) == 0;
-    const int error = errno != 0 ? errno : EIO;
+    if (!flushed)
+        error = errno;
     const bool written = flushed && std::ferror(stream.get()) == 0;
-    return std::fclose(stream.release()) == 0 && written ? 0 : error;
+    if (std::fclose(stream.release()) == 0 && written)
+        return 0;
+    return error != 0 ? error : EIO;
 }
 
 /// Reads which file is open. Returns 0 or an `errno`.
