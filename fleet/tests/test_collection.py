@@ -100,14 +100,19 @@ def test_everything_is_documented(built, kind, name):
     status, text = run(built, "ansible-doc", "-t", kind, name)
 
     assert status == 0, text
-    assert name.upper() in text
+    assert name.upper() in text.upper()
     assert "WARNING" not in text
 
 
 def test_ansible_lint_finds_nothing(built):
     need("ansible-lint")
-    status, text = run(built, "ansible-lint", "--offline", "--profile", "production", "-q")
-    assert (status, "Passed" in text or text.strip() == "") == (0, True), text
+    status, text = run(
+        built,
+        *("ansible-lint", "--offline", "--profile", "production", "-q"),
+        # Newer versions want variables named without the collection, and no support of ansible 2.14.
+        *("-x", "var-naming[no-role-prefix],meta-runtime[unsupported-version]"),
+    )
+    assert status == 0, text
 
 
 def test_yamllint_finds_nothing(built):

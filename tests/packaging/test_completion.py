@@ -9,6 +9,7 @@ import pty
 import re
 import select
 import subprocess
+from pathlib import Path
 
 import pytest
 from parser_options import parser_options
@@ -87,6 +88,9 @@ def bash(binary, tree):
         "/media/bash-completion/completions/wzorinst",
         (tree / "packaging/bash-completion/wzorinst").read_bytes(),
     )
+    # Helpers of newer versions.
+    for part in Path("/etc/bash_completion.d").glob("*bash_completion*"):
+        machine.plant(str(part), part.read_bytes())
     machine.plant("/etc/zor/zor.ini", REGISTRY)
     for name in ("toolkit.spb", "TOOLS.SPB", "notes.txt", "two words.spb"):
         machine.plant(f"/home/work/{name}", "x")

@@ -7,6 +7,7 @@ nothing else than the C library, which alone is borrowed.
 
 import gzip
 import os
+import re
 import subprocess
 import tarfile
 from pathlib import Path
@@ -407,9 +408,10 @@ def test_rpmlint_finds_no_errors(packages, tree):
         check=False,
     )
 
-    assert "4 packages and 0 specfiles checked; 0 errors, " in checked.stdout, (
-        checked.stdout + checked.stderr
-    )
+    # Not every version finds what another one has to be told not to report.
+    errors = set(re.findall(r" E: (\S+)", checked.stdout)) - {"unused-rpmlintrc-filter"}
+    assert errors == set(), checked.stdout + checked.stderr
+    assert "4 packages and 0 specfiles checked; " in checked.stdout, checked.stderr
 
 
 def test_the_debug_symbols_are_where_a_debugger_looks_for_them(packages, names, root):

@@ -74,7 +74,8 @@ void appendBlock(BitWriter& bits, bool last, std::uint32_t literals, std::uint32
     bits.number(distances - 1, 5);
     bits.number(18 - 4, 4);
     // Codes of the code lengths: 18 (a run of zeros) is 0, 0 is 10, 1 is 11.
-    for (const std::uint32_t length : {0, 0, 1, 2, 0, 0, 0, 0, 0, 0, 0, 0, 0, 0, 0, 0, 0, 2})
+    for (const std::uint32_t length :
+         {0U, 0U, 1U, 2U, 0U, 0U, 0U, 0U, 0U, 0U, 0U, 0U, 0U, 0U, 0U, 0U, 0U, 2U})
         bits.number(length, 3);
     const auto zeros = [&](std::uint32_t count) {
         for (; count >= 11; count -= std::min(count, 138U)) {

@@ -10,7 +10,7 @@ do without the mapping.
 
 import os
 import shutil
-import stat
+import subprocess
 import tempfile
 
 # Children of /usr that are not borrowed: the toolkit's common directory is in /usr/kel, and
@@ -81,16 +81,11 @@ def write_users(root, users):
 
 def delete_root(root):
     """Deletes the root directory, whatever modes the tests gave to its directories."""
-
-    def make_writable_and_retry(function, path, _):
-        os.chmod(os.path.dirname(path), stat.S_IRWXU)
-        if os.path.isdir(path) and not os.path.islink(path):
-            os.chmod(path, stat.S_IRWXU)
-            shutil.rmtree(path, onerror=make_writable_and_retry)
-        else:
-            function(path)
-
-    shutil.rmtree(root, onerror=make_writable_and_retry)
+    try:
+        shutil.rmtree(root)
+    except PermissionError:
+        subprocess.run(["chmod", "-R", "u+rwx", root], check=True)
+        shutil.rmtree(root)
 
 
 def borrowed_paths():

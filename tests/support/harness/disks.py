@@ -17,6 +17,7 @@ import signal
 import subprocess
 import sys
 import tempfile
+import time
 from dataclasses import dataclass
 
 ENTERED = "WZOR_DISKS_ENTERED"
@@ -89,6 +90,19 @@ def run(*command):
         raise OSError(f"{' '.join(command)}: {done.stderr.strip()}")
 
 
+def unmount(directory):
+    """Unmounts a file system.
+
+    A program that another thread is starting holds our open files, of this file system too, until it
+    has replaced its parent's image; so it may be in use for a moment.
+    """
+    for _ in range(50):
+        with contextlib.suppress(OSError):
+            return run("umount", directory)
+        time.sleep(0.1)
+    return run("umount", directory)
+
+
 class Disks:
     """Images and where they are mounted; use it by `with`. One thread at a time may use it."""
 
@@ -144,7 +158,7 @@ class Disks:
             try:
                 yield directory
             finally:
-                run("umount", directory)
+                unmount(directory)
         finally:
             os.rmdir(directory)
 

@@ -26,7 +26,8 @@ STAMP = re.compile(rb"(zor_.{0,12}?)9\.2\.", re.DOTALL)
 # Ansible's visit alone.
 WATCHED = ("etc", "home", "opt", "root", "tmp", ".usr", "var")
 VISITS = re.compile(
-    r"(root|home/ann|tmp|var/tmp|var/log/(sshd|host)\.log|home/ann/\.wzorinst\.lock)$"
+    r"(root|home/ann|tmp|var/tmp|var/log|var/log/(sshd\.log|host\.log|wtmp\.db)"
+    r"|home/ann/\.wzorinst\.lock)$"
     r"|(root|home/ann)/\.ansible(/|$)"
 )
 

@@ -361,23 +361,25 @@ class Course:
     def round(self, before):
         """Runs one round; returns what the attacker has achieved, or an empty text."""
         machine = copy.copy(self.prepared)
-        machine.root = os.path.join(tempfile.mkdtemp(prefix="wzorinst-race-"), "root")
+        place = tempfile.mkdtemp(prefix="wzorinst-race-")
+        machine.root = os.path.join(place, "root")
         try:
-            os.chmod(os.path.dirname(machine.root), 0o755)
+            os.chmod(place, 0o755)
             subprocess.run(["cp", "-a", self.prepared.root, machine.root], check=True)
-            hangs = self.contend(machine)
+            hangs = self.contend(machine, shutil.copy(self.attacker, place))
             return hangs or self.damage(before, machine)
         finally:
-            shutil.rmtree(os.path.dirname(machine.root))
+            shutil.rmtree(place)
 
-    def contend(self, machine):
+    def contend(self, machine, attacker):
+        """Runs the installer against `attacker`, a copy that its user can reach."""
         mode, *paths = self.race.attack
         # The target of a link is a path of the machine, all others are used on the host.
         keeps = {"plant": 0, "move": 2}.get(mode)
         paths = [path if i == keeps else machine.at(path) for i, path in enumerate(paths)]
         with contextlib.ExitStack() as attackers:
             for _ in range(self.race.attackers):
-                attackers.enter_context(attack([self.attacker, mode, *paths]))
+                attackers.enter_context(attack([attacker, mode, *paths]))
             try:
                 machine.execute(self.race.program, ROOT, 0o022, None, (), False)
             except AssertionError as failure:
