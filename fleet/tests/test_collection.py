@@ -109,7 +109,7 @@ def test_ansible_lint_finds_nothing(built):
     status, text = run(
         built,
         *("ansible-lint", "--offline", "--profile", "production", "-q"),
-        # Newer versions want variables named without the collection, and no support of ansible 2.14.
+        # Newer versions want variables without the collection's name, and no ansible-core 2.14.
         *("-x", "var-naming[no-role-prefix],meta-runtime[unsupported-version]"),
     )
     assert status == 0, text

@@ -7,7 +7,6 @@ import zlib
 
 import pytest
 
-
 # What ships is built on Debian 12. With the C library of a newer one, the C++ library inside the
 # program needs that version too.
 BUILT_WITH = tuple(map(int, os.confstr("CS_GNU_LIBC_VERSION").split()[1].split(".")))

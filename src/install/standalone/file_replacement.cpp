@@ -115,7 +115,7 @@ int createTemporary(const Place& place, ScopedFd& file)
         file = ScopedFd(openat(place.fd(), name.c_str(),
                                O_RDWR | O_CREAT | O_EXCL | O_NOFOLLOW | O_CLOEXEC, UnfinishedMode));
         int error = file.isOpen() ? 0 : errno;
-        if (error == 0 && flock(file.get(), LOCK_EX | LOCK_NB) == 0 && isTemporary(place, file))
+        if (file.isOpen() && flock(file.get(), LOCK_EX | LOCK_NB) == 0 && isTemporary(place, file))
             return 0;
         if (error == EEXIST)
             error = waitForOtherRun(place);

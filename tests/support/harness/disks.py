@@ -93,8 +93,8 @@ def run(*command):
 def unmount(directory):
     """Unmounts a file system.
 
-    A program that another thread is starting holds our open files, of this file system too, until it
-    has replaced its parent's image; so it may be in use for a moment.
+    A program that another thread is starting holds our open files, of this file system too, until
+    it has replaced its parent's image; so it may be in use for a moment.
     """
     for _ in range(50):
         with contextlib.suppress(OSError):
