@@ -109,6 +109,7 @@ class Machine:
         """Makes a directory with exactly `mode`, and its missing parents with 0755."""
         missing = []
         while not os.path.lexists(self.at(path)):
+            assert path != "/", f"{self.root} is not there, or out of reach"
             missing.append(path)
             path = os.path.dirname(path)
         for directory in reversed(missing):
