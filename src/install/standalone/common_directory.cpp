@@ -36,9 +36,9 @@ std::string commonDirectoryOf(std::FILE* file)
 
 void writeDefaultSetting(const std::string& path)
 {
-    // Neither committed nor rolled back: other products use the setting, too.
-    FileTransaction scratch;
     {
+        FileTransaction
+            scratch; // not committed or rolled back: other products use the setting, too
         const ScopedUmask mask(globalFilesUmask);
         (void)createPath(scratch, path, SettingDirectoryMode); // if it fails, so does the next step
     }

@@ -25,7 +25,7 @@ namespace {
 struct DirectoryRow {
     std::string path;
     std::optional<RemovalKind> afterIndex; ///< once the files of an index are deleted; may be left
-    RemovalKind withoutIndex;
+    RemovalKind withoutIndex = IfEmpty;
 };
 
 std::vector<DirectoryRow> directoryTable()

@@ -24,7 +24,7 @@ enum RemovalKind : int {
 };
 
 struct RemovalStep {
-    RemovalKind kind;
+    RemovalKind kind = IfEmpty;
     std::string path; ///< relative to the home directory; empty for the home directory itself
 };
 

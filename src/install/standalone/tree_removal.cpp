@@ -86,13 +86,13 @@ private:
     /// One directory on the way down.
     struct Level {
         std::string name; ///< in the level above
-        dev_t device;
-        ino_t inode;
-        std::size_t pathSize;    ///< of the directory's own path
-        std::string names;       ///< what it holds; see listNames()
-        std::size_t next = 0;    ///< where the next name begins
-        bool hasMore = false;    ///< it holds more than `names`
-        bool hasDeleted = false; ///< something in it was deleted since it was listed
+        dev_t device = 0;
+        ino_t inode = 0;
+        std::size_t pathSize = 0; ///< of the directory's own path
+        std::string names;        ///< what it holds; see listNames()
+        std::size_t next = 0;     ///< where the next name begins
+        bool hasMore = false;     ///< it holds more than `names`
+        bool hasDeleted = false;  ///< something in it was deleted since it was listed
         bool result = true;
     };
 
