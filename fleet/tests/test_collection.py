@@ -101,7 +101,8 @@ def test_everything_is_documented(built, kind, name):
 
     assert status == 0, text
     assert name.upper() in text.upper()
-    assert "WARNING" not in text
+    # Ansible's own parts may give warnings.
+    assert [line for line in text.splitlines() if "WARNING" in line and "corvan" in line] == []
 
 
 def test_ansible_lint_finds_nothing(built):

@@ -33,7 +33,8 @@ def usage(machine):
 
 def entries(section):
     """What a section explains, and the first paragraph on each."""
-    return dict(re.findall(r"^ {7}(\S.*)\n {11}(\S.*)$", section, re.MULTILINE))
+    found = re.findall(r"^( +)(\S.*)\n\1 +(\S.*)$", section, re.MULTILINE)
+    return {heading: paragraph for _, heading, paragraph in found}
 
 
 def documented_options(sections):
