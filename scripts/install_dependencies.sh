@@ -25,6 +25,7 @@ fleet='
     nlohmann-json3-dev
     openssh-client
     openssh-server
+    util-linux-extra
 '
 test='
     ansible-lint
