@@ -24,6 +24,8 @@ SEED = 20221202
 MB = 1_000_000
 LARGE_FILE = 2_500_000
 
+HOSTILE_COPIES = 16
+
 LEVEL = 6  # what zip programs take by default
 
 # The smallest package that installs: six files, and scanner programs that do nothing.
@@ -101,12 +103,17 @@ def large(size, file_size=LARGE_FILE):
 
 
 def hostile(stream):
-    """Four files whose data is what `stream` makes of a program or text."""
+    """Four files whose data is what `stream` makes of a program or text, each many times over.
+
+    So what a run takes besides is little, as the floor does nothing but inflate.
+    """
 
     def make():
         rng = random.Random(SEED)
         for part in range(4):
-            yield f"bin/hostile{part}", stream(rng)
+            made = stream(rng)
+            for copy in range(HOSTILE_COPIES):
+                yield f"bin/hostile{part}-{copy}", made
 
     return make
 
