@@ -172,9 +172,9 @@ TEST_F(SoundEntryTest, ADeflatedEntryOfManyPiecesArrivesWhole)
 
 TEST_F(SoundEntryTest, AConfirmedEntryOfAnySizeArrivesWhole)
 {
-    constexpr std::size_t Largest = 16 * 1024 * 1024; // inflated in one call
+    constexpr std::size_t largest = std::size_t{16} * 1024 * 1024; // inflated in one call
     for (const std::size_t size : {std::size_t{40}, std::size_t{8192}, std::size_t{1000000},
-                                   Largest - 1, Largest, Largest + 1, std::size_t{50}}) {
+                                   largest - 1, largest, largest + 1, std::size_t{50}}) {
         const std::string content = textBytes(40, 6) + std::string(size - 40, 'x');
         const std::string data = rawDeflate(content);
 

@@ -54,7 +54,7 @@ TEST_F(PackageWindowTest, AnyBytesAreThoseOfTheFile)
     std::int64_t at = 0;
     for (int i = 0; i < 3000; ++i) {
         if (random() % 20 == 0)
-            at = random() % FileSize;
+            at = static_cast<std::int64_t>(random() % FileSize);
         const std::size_t size = random() % (random() % 10 == 0 ? 600000 : 3000);
         if (at + static_cast<std::int64_t>(size) > static_cast<std::int64_t>(FileSize))
             at = 0;
