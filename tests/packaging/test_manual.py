@@ -172,14 +172,13 @@ def test_the_messages_are_in_the_sources(sections, tree):
             assert part.strip() in sources, message
 
 
-def test_the_footer_names_the_version_and_the_date_of_the_release(page):
-    source = subprocess.run(["zcat", page], capture_output=True, text=True, check=True).stdout
-
-    assert '.TH "wzorinst" "8" "2022-12-02" "wzorinst 9.2.30" "System administration"\n' in source
+def test_the_footer_names_the_version_and_the_date_of_the_release(sections):
+    footer = r"^wzorinst 9\.2\.30 +2022-12-02 +wzorinst\(8\)$"
+    assert re.search(footer, sections["SEE ALSO"], re.MULTILINE)
 
 
 def test_the_examples_are_command_lines_that_the_program_takes(sections, machine):
-    examples = re.findall(r"^ {11}(?:flock .* )?wzorinst (.*)$", sections["EXAMPLES"], re.MULTILINE)
+    examples = re.findall(r"^ {8,}(?:flock .* )?wzorinst (.*)$", sections["EXAMPLES"], re.MULTILINE)
     machine.make_directory("/var/log")
 
     assert len(examples) == 4
