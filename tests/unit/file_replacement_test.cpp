@@ -5,6 +5,7 @@
 #include <gtest/gtest.h>
 
 #include <cerrno>
+#include <utility>
 
 #include <sys/stat.h>
 #include <sys/syscall.h>
@@ -85,6 +86,21 @@ TEST_F(FileReplacementTest, AFullDiskKeepsTheOldContent)
 
     EXPECT_EQ("old", readFile(dir / "disk/file"));
     EXPECT_EQ((std::vector<std::string>{"f 0644 file"}), treeOf(dir / "disk"));
+}
+
+TEST_F(FileReplacementTest, AFailedWriteOfAShortContentIsReportedAsWhatItIs)
+{
+    writeFile(dir / "file", "old");
+
+    for (const auto& [error, code] : {std::pair{ENOSPC, 6}, {EACCES, 7}, {EIO, 5}}) {
+        EXPECT_TRUE(passesInChild([&, failure = error, expected = code] {
+            failSystemCall(SYS_write, failure);
+            ASSERT_EQ(expected, replace(dir / "file", "new"));
+        })) << error;
+    }
+
+    EXPECT_EQ("old", readFile(dir / "file"));
+    EXPECT_EQ((std::vector<std::string>{"f 0644 file"}), treeOf(dir.path()));
 }
 
 TEST_F(FileReplacementTest, AFailedSyncKeepsTheOldContent)
