@@ -119,7 +119,7 @@ protected:
     std::string makeDirectoryThatListsItsFileFirst()
     {
         for (int i = 0; i < 64; ++i) {
-            const std::string name = "mixed" + std::to_string(i);
+            std::string name = "mixed" + std::to_string(i);
             makeDirectories(dir / name);
             const std::string sub = dir / name + "/sub" + std::to_string(i);
             if (i % 2 == 0)
@@ -385,10 +385,10 @@ TEST_F(RemoveTreeTest, RemovingFilesNeverFails)
 
 TEST_F(RemoveTreeTest, ADeepTreeTakesFewDescriptorsAndLittleStack)
 {
-    constexpr int Levels = 500; // about 260 bytes of stack each
+    constexpr int levels = 500; // about 260 bytes of stack each
     const int top = open(dir.path().c_str(), O_RDONLY | O_DIRECTORY);
     int level = top;
-    for (int depth = 0; depth < Levels; ++depth) {
+    for (int depth = 0; depth < levels; ++depth) {
         ASSERT_EQ(0, mkdirat(level, "d", 0755));
         const int below = openat(level, "d", O_RDONLY | O_DIRECTORY);
         ASSERT_GE(below, 0);
@@ -400,7 +400,8 @@ TEST_F(RemoveTreeTest, ADeepTreeTakesFewDescriptorsAndLittleStack)
     EXPECT_TRUE(passesInChild([&] {
         const rlimit descriptors = {64, 64};
         ASSERT_EQ(0, setrlimit(RLIMIT_NOFILE, &descriptors));
-        const rlimit stack = {128 * 1024, 128 * 1024};
+        constexpr rlim_t size = rlim_t{128} * 1024;
+        const rlimit stack = {size, size};
         ASSERT_EQ(0, setrlimit(RLIMIT_STACK, &stack));
         ASSERT_TRUE(removeTree(dir / "d", true, false));
     }));
