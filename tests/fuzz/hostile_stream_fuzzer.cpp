@@ -91,16 +91,16 @@ struct BlockCode {
 void writeHeader(BitWriter& writer, const BlockCode& code)
 {
     // The code of the code lengths: four bits for each length, so that a length is its own code.
-    constexpr unsigned LengthCodes = 19;
-    constexpr unsigned EndOfBlock = 256;
+    constexpr unsigned lengthCodes = 19;
+    constexpr unsigned endOfBlock = 256;
     writer.number(2, 2); // dynamic codes
     writer.number(0, 5); // 257 literals and lengths
     writer.number(0, 5); // one distance
-    writer.number(LengthCodes - 4, 4);
+    writer.number(lengthCodes - 4, 4);
     constexpr unsigned order[] = {16, 17, 18, 0, 8, 7, 9, 6, 10, 5, 11, 4, 12, 3, 13, 2, 14, 1, 15};
     for (const unsigned length : order)
         writer.number(length < 16 ? 4 : 0, 3);
-    for (unsigned symbol = 0; symbol < EndOfBlock; ++symbol)
+    for (unsigned symbol = 0; symbol < endOfBlock; ++symbol)
         writer.code(symbol < code.letters ? code.lengthOf(symbol) : 0, 4);
     writer.code(code.lengthOf(code.letters), 4);
     writer.code(1, 4); // the distance, which is not used
@@ -145,10 +145,10 @@ std::string inStoredBlocks(const std::string& content, std::size_t blockSize)
 /// Inflates `packed` into the file, in the pieces that the extraction takes.
 void inflateByZlib(const MemoryFile& package, std::size_t size, const MemoryFile& file)
 {
-    constexpr std::size_t InputSize = 64 * KiB;
-    constexpr std::size_t PieceSize = 128 * KiB;
-    static unsigned char input[InputSize];
-    static unsigned char piece[PieceSize];
+    constexpr std::size_t inputSize = 64 * KiB;
+    constexpr std::size_t pieceSize = 128 * KiB;
+    static unsigned char input[inputSize];
+    static unsigned char piece[pieceSize];
     const int from = open(package.path().c_str(), O_RDONLY | O_CLOEXEC);
     const int to = open(file.path().c_str(), O_WRONLY | O_TRUNC | O_CLOEXEC);
     require(from >= 0 && to >= 0, "the files of the comparison can be opened");
@@ -157,16 +157,16 @@ void inflateByZlib(const MemoryFile& package, std::size_t size, const MemoryFile
     int status = Z_OK;
     while (status == Z_OK) {
         state.next_out = piece;
-        state.avail_out = PieceSize;
+        state.avail_out = pieceSize;
         while (status == Z_OK && state.avail_out != 0) {
             if (state.avail_in == 0) {
                 state.next_in = input;
                 state.avail_in = static_cast<uInt>(std::max<ssize_t>(
-                    0, read(from, input, std::min(InputSize, size - state.total_in))));
+                    0, read(from, input, std::min(inputSize, size - state.total_in))));
             }
             status = inflate(&state, Z_NO_FLUSH);
         }
-        const std::size_t count = PieceSize - state.avail_out;
+        const std::size_t count = pieceSize - state.avail_out;
         require(write(to, piece, count) == static_cast<ssize_t>(count), "the piece is written");
     }
     require(status == Z_STREAM_END, "zlib accepts what the target made");

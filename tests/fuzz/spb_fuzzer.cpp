@@ -10,10 +10,9 @@
 #include "settings.h"
 #include "subcommands.h"
 
+#include <cstdlib>
 #include <filesystem>
 #include <iostream>
-
-#include <stdlib.h>
 
 namespace fs = std::filesystem;
 
