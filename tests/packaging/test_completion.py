@@ -88,7 +88,7 @@ def bash(binary, tree):
         "/media/bash-completion/completions/wzorinst",
         (tree / "packaging/bash-completion/wzorinst").read_bytes(),
     )
-    # Helpers of newer versions.
+    # Newer versions of bash-completion keep helpers of completions there.
     for part in Path("/etc/bash_completion.d").glob("*bash_completion*"):
         machine.plant(str(part), part.read_bytes())
     machine.plant("/etc/zor/zor.ini", REGISTRY)

@@ -37,8 +37,8 @@ std::string commonDirectoryOf(std::FILE* file)
 void writeDefaultSetting(const std::string& path)
 {
     {
-        FileTransaction
-            scratch; // not committed or rolled back: other products use the setting, too
+        // Neither committed nor rolled back: other products use the setting, too.
+        FileTransaction scratch;
         const ScopedUmask mask(globalFilesUmask);
         (void)createPath(scratch, path, SettingDirectoryMode); // if it fails, so does the next step
     }

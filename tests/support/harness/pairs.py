@@ -107,7 +107,7 @@ def name_of(process):
 for delay, command in plan["runs"]:
     time.sleep(delay)
     if plan["interrupt"] is not None and started:
-        # First it bears our name, even for a moment after Popen() returns, then that of flock.
+        # Just after Popen() it may still have our name, and then has that of flock.
         while name_of(started[0]) != "wzorinst" and started[0].poll() is None:
             time.sleep(0.001)
     started.append(subprocess.Popen(command, start_new_session=True, stdin=subprocess.DEVNULL,
