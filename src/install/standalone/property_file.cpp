@@ -45,11 +45,12 @@ int readLines(const std::string& path, std::vector<std::string>& lines)
 int PropertyFile::load(const std::string& path)
 {
     lines.clear();
-    const int error = readLines(path, lines);
-    if (error != 0) {
-        lines.clear();
+    std::vector<std::string> loaded;
+    const int error = readLines(path, loaded);
+    if (error == 0)
+        lines = std::move(loaded);
+    else
         logFailure("Loading file ", path, error);
-    }
     return error;
 }
 

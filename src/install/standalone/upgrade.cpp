@@ -50,12 +50,9 @@ int finishUpgrade(FileTransaction& transaction, InstallRegistry& registry,
                   const InstallRegistry& request, bool deployed, bool useCustomPath,
                   const std::string& customPath)
 {
-    if (!localInstall && !useCustomPath) {
-        const int code =
-            setupCommonLogDir(transaction, registry.homeDirectory, useCustomPath, customPath);
-        if (code != 0)
-            return code;
-    }
+    if (!localInstall && !useCustomPath)
+        (void)setupCommonLogDir(transaction, registry.homeDirectory, useCustomPath,
+                                customPath); // never fails
     if (deployed)
         registry.version = request.version;
     const bool changed = updateRegistration(registry, request);
@@ -119,9 +116,7 @@ int upgradeInstall(FileTransaction& transaction, InstallRegistry& registry,
         stopped = code == 0;
         if (!stopped)
             *logstream << "Cannot stop ZOR for update\n";
-        else if (isInterrupted())
-            code = RunInterrupted;
-        else
+        else if (!isInterrupted())
             code = deployFiles(transaction, registry, request, indexPath, useCustomPath);
     } else {
         *logstream << "Installed ZOR is not older than this version, updating exploiters only\n";
