@@ -186,6 +186,24 @@ TEST_F(DiscoveryTest, AReadOnlyHomeIsStatus5)
     EXPECT_EQ(5, discoverInstallation(commandLine).status);
 }
 
+TEST_F(DiscoveryTest, ADiscoveryThatOnlyReadsFindsAnIntactInstallation)
+{
+    plantRegistry();
+    plantScannerControl();
+
+    EXPECT_EQ(0, discoverInstallation(commandLine, true).status);
+}
+
+TEST_F(DiscoveryTest, AReadOnlyHomeIsStatus5AlsoForADiscoveryThatOnlyReads)
+{
+    plantRegistry();
+    plantScannerControl();
+    ASSERT_EQ(0, chmod(Home.c_str(), 0555));
+    const OrdinaryRights rights;
+
+    EXPECT_EQ(5, discoverInstallation(commandLine, true).status);
+}
+
 TEST_F(DiscoveryTest, AMissingScannerControlIsStatus6)
 {
     commandLine.action = 'r';

@@ -1,6 +1,7 @@
 #include "extraction.h"
 #include "installer_fixtures.h"
 #include "paths.h"
+#include "process_limits.h"
 #include "registry.h"
 #include "safe_path.h"
 #include "settings.h"
@@ -272,6 +273,29 @@ TEST_F(ExtractEntriesTest, DebugTracesASkippedDestination)
               testing::internal::GetCapturedStdout());
 }
 
+TEST_F(ExtractEntriesTest, ADestinationOfTwoCharactersIsNotSkipped)
+{
+    const ZipFile& archive = archiveOf({storedItem("pkg/", "")});
+    testing::internal::CaptureStdout();
+
+    EXPECT_EQ(0, extractEntries(transaction, archive, "pkg/", ".", 0700, nullptr, nullptr, true));
+
+    EXPECT_EQ("Src path: pkg/\nDst path: .\nMode: 448\nLooking at file pkg/ inside spb\n"
+              "dstName: ./\ncreatePath: ./\n",
+              testing::internal::GetCapturedStdout());
+}
+
+TEST_F(ExtractEntriesTest, ASignalStopsItBeforeTheNextEntry)
+{
+    EXPECT_TRUE(passesInChild([&] {
+        const InterruptionAt start("");
+
+        EXPECT_EQ(14, extract({storedItem("pkg/a", "1")}));
+    }));
+
+    EXPECT_FALSE(pathExists(dir / "to"));
+}
+
 class ExtractPackageTest : public InstallerTest {
 protected:
     ExtractPackageTest() { installation.homeDirectory = home; }
@@ -505,6 +529,15 @@ TEST_F(ExtractPackageTest, WithoutAnIndexPathNoIndexIsWritten)
 
     EXPECT_FALSE(pathExists(dir / "index"));
     EXPECT_TRUE(pathExists(home + "/bin/trawlcfg"));
+}
+
+TEST_F(ExtractPackageTest, AFailureWithoutAnIndexPathHasItsCode)
+{
+    usePackage(dir / "package.spb", {{"bin/", ""}, {"bin/empty", ""}});
+
+    EXPECT_EQ(1, extractPackage(spbPackage, transaction, installation, true, nullptr));
+
+    EXPECT_EQ(Lines{"d 0755 bin"}, treeOf(home));
 }
 
 TEST_F(ExtractPackageTest, AnIndexThatCannotBeOpenedOnlyCausesAWarning)

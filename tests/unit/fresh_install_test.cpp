@@ -432,6 +432,7 @@ TEST_F(FreshInstallTest, ACacheDirectoryThatCannotBeMadeIsCode11)
 {
     useEmptyPackage();
     plantConfiguration();
+    makeDirectories(Home + "/bin");
     writeFile(Index, "");
     ASSERT_EQ(0, chmod(Home.c_str(), 0555));
     {
@@ -442,6 +443,7 @@ TEST_F(FreshInstallTest, ACacheDirectoryThatCannotBeMadeIsCode11)
     EXPECT_TRUE(logHolds("Error creating dir cache_data in /opt/corvan/zor result=11 "
                          "(Cannot create directory)\nCannot create subdir: cache_data\n"));
     EXPECT_FALSE(logHolds("Customizing"));
+    EXPECT_FALSE(pathExists(Home + "/bin/etc"));
 }
 
 TEST_F(FreshInstallTest, AnEtcDirectoryThatCannotBeMadeIsCode11)
@@ -559,6 +561,42 @@ TEST_F(FreshInstallTest, ARollbackLeavesOnlyWhatIsNotJournalled)
         treeOf("/opt"));
     EXPECT_FALSE(pathExists("/etc/zor"));
     EXPECT_FALSE(pathExists("/usr/kel"));
+}
+
+// Signals.
+
+TEST_F(FreshInstallTest, ASignalAfterTheCustomizationLeavesTheRegistryUnwritten)
+{
+    EXPECT_TRUE(passesInChild([&] {
+        const InterruptionAt customization(
+            "Customizing property file: /opt/corvan/zor/config/ZorTrace.properties");
+
+        EXPECT_EQ(14, install());
+
+        EXPECT_EQ(std::string::npos, customization.log().find("Saving INI file"));
+    }));
+}
+
+TEST_F(FreshInstallTest, ASignalAfterTheRegistrationLeavesTheTracePathUnchanged)
+{
+    EXPECT_TRUE(passesInChild([&] {
+        const InterruptionAt registration("Saving INI file");
+
+        EXPECT_EQ(14, install());
+
+        EXPECT_EQ(std::string::npos, registration.log().find("common trace path"));
+    }));
+}
+
+TEST_F(FreshInstallTest, ASignalAfterTheRegistrationStopsAPerUserInstallationToo)
+{
+    localInstall = true;
+
+    EXPECT_TRUE(passesInChild([&] {
+        const InterruptionAt registration("Saving INI file");
+
+        EXPECT_EQ(14, install());
+    }));
 }
 
 } // namespace

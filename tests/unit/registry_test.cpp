@@ -84,6 +84,17 @@ TEST_F(RegistryTest, LinesWithoutAnEqualsSignAndUnknownKeysAreSkipped)
     EXPECT_EQ("/opt/zor", registry.homeDirectory);
 }
 
+TEST_F(RegistryTest, LinesWithoutAnEqualsSignAndUnknownKeysChangeNothing)
+{
+    EXPECT_EQ(0,
+              codeOf(SampleText + "ZOR_Version\nZOR_HomeDirectory\nZOR_Exploiters\nOther = 1\n"));
+
+    EXPECT_EQ("9.2.30.0004", formatVersion(registry.version));
+    EXPECT_EQ("/opt/zor", registry.homeDirectory);
+    EXPECT_EQ("ABC:XYZ:", registry.exploiters);
+    EXPECT_EQ("/opt/cfg", registry.configRootDirectory);
+}
+
 TEST_F(RegistryTest, TheLaterLineOfAKeyWins)
 {
     EXPECT_EQ(0, codeOf(SampleText + "ZOR_HomeDirectory = /later\nZOR_Version = 1.1\n"));
@@ -411,6 +422,31 @@ TEST_F(RegistryTest, ARollbackDeletesTheFileThatWasNew)
     rollback(transaction);
 
     EXPECT_EQ(std::vector<std::string>(), treeOf(dir.path()));
+}
+
+TEST_F(RegistryTest, ARollbackLeavesTheFileThatAnotherRunPutThereMeanwhile)
+{
+    ASSERT_EQ(0, writeRegistry(transaction, path, Sample));
+    writeFile(dir / "of another run", "theirs");
+    ASSERT_EQ(0, rename((dir / "of another run").c_str(), path.c_str()));
+
+    rollback(transaction);
+
+    EXPECT_EQ("theirs", readFile(path));
+}
+
+TEST_F(RegistryTest, ARollbackAfterAFailedSaveRestoresTheFileAndLeavesNoBackup)
+{
+    makeDirectories(dir / "disk");
+    const SmallDisk disk(dir / "disk", 64);
+    writeFile(dir / "disk/zor.ini", "old");
+    registry.exploiters = std::string(100000, 'x');
+    ASSERT_EQ(5, writeRegistry(transaction, dir / "disk/zor.ini", registry));
+
+    rollback(transaction);
+
+    EXPECT_EQ("old", readFile(dir / "disk/zor.ini"));
+    EXPECT_EQ((std::vector<std::string>{"f 0644 zor.ini"}), treeOf(dir / "disk"));
 }
 
 TEST_F(RegistryTest, WritingPrintsNothing)

@@ -558,6 +558,18 @@ TEST_F(RemovalTest, TheCommonLogDirectoryIsWhereTheSettingSays)
     EXPECT_TRUE(treeOf(dir / "common").empty());
 }
 
+TEST_F(RemovalTest, TheTemporaryFilesOfKilledRunsAreDeleted)
+{
+    makeDirectories("/etc/kel/corvan/common/cfg");
+    writeFile("/etc/kel/corvan/common/cfg/log.properties.wzorinst-new", "");
+    writeFile("/etc/zor/zor.ini.wzorinst-new", "");
+
+    EXPECT_EQ(0, remove());
+
+    EXPECT_TRUE(treeOf("/etc/kel/corvan/common/cfg").empty());
+    EXPECT_FALSE(pathExists("/etc/zor"));
+}
+
 TEST_F(RemovalTest, WhatOthersKeepInTheCommonLogDirectoryStays)
 {
     makeDirectories("/usr/kel/corvan/common/ZOR/logs/others");

@@ -56,6 +56,15 @@ TEST_F(TransactionTest, AFileThatFollowsItsBackupReplacedAnother)
     EXPECT_FALSE(lastFileReplacedAnother(transaction));
 }
 
+TEST_F(TransactionTest, TheFirstFileCanReplaceAnother)
+{
+    record(transaction, BackedUp, "/a");
+    EXPECT_FALSE(lastFileReplacedAnother(transaction));
+
+    record(transaction, Created, "/a");
+    EXPECT_TRUE(lastFileReplacedAnother(transaction));
+}
+
 TEST_F(TransactionTest, ChangedDirectoriesComeInTheOrderOfTheChanges)
 {
     record(transaction, DirectoryCreated, "/a/b");
@@ -662,6 +671,20 @@ TEST_F(BackupFileTest, ADanglingLinkCountsAsMissing)
 
     EXPECT_TRUE(std::filesystem::is_symlink(dir / "link"));
     EXPECT_TRUE(transaction.journal.empty());
+}
+
+TEST_F(ClaimTest, AClaimEndsWithTheTransaction)
+{
+    for (int (*const end)(FileTransaction&) : {commit, rollback}) {
+        writeFile(dir / "zor.ini", "ours");
+        claim(transaction, dir / "zor.ini", FileIdentity{});
+        EXPECT_EQ(0, end(transaction));
+        record(transaction, Created, dir / "zor.ini");
+
+        EXPECT_EQ(0, rollback(transaction));
+
+        EXPECT_FALSE(pathExists(dir / "zor.ini"));
+    }
 }
 
 } // namespace

@@ -286,6 +286,17 @@ TEST_F(RegistrationOnlyTest, CreatesTheSingleUserFlagWhenAsked)
     EXPECT_EQ("/opt/corvan/zor/config/SingleUserMode\n", readFile(Index));
 }
 
+TEST_F(RegistrationOnlyTest, ASignalLeavesTheRegistryUnwritten)
+{
+    EXPECT_TRUE(passesInChild([&] {
+        const InterruptionAt decision(NotDeploying);
+
+        EXPECT_EQ(14, upgrade());
+    }));
+
+    EXPECT_FALSE(pathExists("/etc/zor/zor.ini"));
+}
+
 // Deployment.
 
 using DeploymentTest = UpgradeTest;
@@ -516,6 +527,31 @@ TEST_F(DeploymentTest, LabelsTheFilesBeforeAndAfterTheExtraction)
               "selinuxenabled\n"
               "trawlcfg [-enable] [all]\n",
               scannerCalls());
+}
+
+TEST_F(DeploymentTest, ASignalDuringTheLabellingLeavesTheSettingsUnchanged)
+{
+    EXPECT_TRUE(passesInChild([&] {
+        const InterruptionAt labelling("Extracting configs to '/opt/corvan/zor/config'\n"
+                                       "Exec '/usr/sbin/selinuxenabled");
+
+        EXPECT_EQ(14, upgrade());
+
+        EXPECT_EQ(std::string::npos, labelling.log().find("Customizing"));
+    }));
+
+    EXPECT_EQ("version=9.2.29.0007\n", readFile(Properties));
+}
+
+TEST_F(DeploymentTest, ASignalDuringTheCustomizationLeavesTheRegistryUnwritten)
+{
+    EXPECT_TRUE(passesInChild([&] {
+        const InterruptionAt customization("Customizing property file: ");
+
+        EXPECT_EQ(14, upgrade());
+    }));
+
+    EXPECT_FALSE(pathExists("/etc/zor/zor.ini"));
 }
 
 // Obsolete files.

@@ -1,5 +1,8 @@
 #include "installer_fixtures.h"
 
+#include "settings.h"
+
+#include <csignal>
 #include <cstdlib>
 #include <filesystem>
 
@@ -49,6 +52,36 @@ void MachineTest::TearDown()
 {
     if (onMachineOfItsOwn())
         clearFixedPlaces();
+}
+
+InterruptionAt::InterruptionAt(const std::string& text) : previous_(logstream)
+{
+    watchForSignals();
+    buffer_.awaited = text;
+    logstream = &stream_;
+    if (text.empty())
+        (void)std::raise(SIGTERM);
+}
+
+InterruptionAt::~InterruptionAt()
+{
+    logstream = previous_;
+}
+
+std::streamsize InterruptionAt::Buffer::xsputn(const char* text, std::streamsize size)
+{
+    log.append(text, static_cast<std::size_t>(size));
+    if (!awaited.empty() && log.find(awaited) != std::string::npos) {
+        awaited.clear();
+        (void)std::raise(SIGTERM);
+    }
+    return size;
+}
+
+InterruptionAt::Buffer::int_type InterruptionAt::Buffer::overflow(int_type character)
+{
+    const char text = traits_type::to_char_type(character);
+    return xsputn(&text, 1) == 1 ? character : traits_type::eof();
 }
 
 std::string journalText(const FileTransaction& transaction)

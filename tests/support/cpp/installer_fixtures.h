@@ -1,6 +1,7 @@
 // Fixtures of the tests that let the installer work on real files.
 #pragma once
 
+#include "interruption.h"
 #include "scoped.h"
 #include "settings_guard.h"
 #include "test_files.h"
@@ -9,6 +10,8 @@
 #include <gtest/gtest.h>
 
 #include <optional>
+#include <ostream>
+#include <streambuf>
 #include <string>
 
 /// Restores a variable of the environment at its end.
@@ -45,6 +48,32 @@ class MachineTest : public InstallerTest {
 protected:
     void SetUp() override;
     void TearDown() override;
+};
+
+/// Sends the running installation SIGTERM as soon as the log holds `text`, at once if that is
+/// empty. For a child (passesInChild()) only: the signal stays recorded.
+class InterruptionAt {
+public:
+    explicit InterruptionAt(const std::string& text);
+    InterruptionAt(const InterruptionAt&) = delete;
+    InterruptionAt& operator=(const InterruptionAt&) = delete;
+    ~InterruptionAt();
+
+    [[nodiscard]] const std::string& log() const { return buffer_.log; }
+
+private:
+    struct Buffer : std::streambuf {
+        std::streamsize xsputn(const char* text, std::streamsize size) override;
+        int_type overflow(int_type character) override;
+
+        std::string awaited;
+        std::string log;
+    };
+
+    ScopedInterruptible interruptible_;
+    Buffer buffer_;
+    std::ostream stream_{&buffer_};
+    std::ostream* previous_;
 };
 
 /// The journal as lines of kind and path, "4 /opt/corvan\n".
