@@ -139,11 +139,14 @@ int removeDirectory(const std::string& path)
 int createPath(FileTransaction& transaction, const std::string& path, mode_t mode)
 {
     const ScopedDirectoryReuse reuse;
-    if (isPlainDirectory(path.substr(0, path.rfind('/')))) // so everything above it exists too
-        return FileOk;
+    // Mostly, all but the last few directories exist: from the deepest upwards, the first that is
+    // there proves all above it in one system call.
+    std::size_t slash = path.rfind('/');
+    while (slash != std::string::npos && !isPlainDirectory(path.substr(0, slash)))
+        slash = slash != 0 ? path.rfind('/', slash - 1) : std::string::npos;
 
     // Shallowest first, so that a rollback removes the deepest first.
-    for (std::size_t slash = path.find('/'); slash != std::string::npos;
+    for (slash = path.find('/', slash + 1); slash != std::string::npos;
          slash = path.find('/', slash + 1)) {
         const int code = createIfMissing(transaction, path.substr(0, slash), mode);
         if (code != FileOk)
