@@ -50,12 +50,24 @@ bool isWorthInflatingWhole(const ZipEntry& entry)
 
 /// Entries with less data are not probed: the probe would cost more than it can save.
 constexpr std::uint32_t MinProbedSize = std::uint32_t{16} * 1024;
-constexpr std::size_t ProbeSize = 256;
 constexpr std::size_t ProbeContentSize = std::size_t{16} * 1024;
-constexpr std::size_t TinyBlock = 64;
-constexpr std::size_t FewBlocks = 4;
+constexpr uInt TinyBlock = 64;
+constexpr int FewBlocks = 4;
 
-/// Whether the first bytes of deflated data are blocks of fewer than TinyBlock bytes each.
+/// Inflates the next block of `stream` and moves past it; false if it does not end within its next
+/// TinyBlock bytes.
+bool passTinyBlock(z_stream& stream)
+{
+    constexpr int atBlockEnd = 128; // of data_type, see inflate()
+    stream.avail_in = TinyBlock;
+    do {
+        if (inflate(&stream, Z_BLOCK) != Z_OK)
+            return false;
+    } while ((stream.data_type & atBlockEnd) == 0 && stream.avail_in != 0);
+    return (stream.data_type & atBlockEnd) != 0;
+}
+
+/// Whether deflated data begins with blocks of at most TinyBlock bytes each.
 ///
 /// No compressor writes an entry of such blocks. They would take libdeflate a third longer than
 /// zlib, because it builds larger tables for each. Data that becomes like that later on is not
@@ -67,21 +79,13 @@ bool beginsWithTinyBlocks(const unsigned char* packed)
     if (inflateInit2(&stream, -15) != Z_OK)
         return false;
     stream.next_in = const_cast<unsigned char*>(packed); // only read
-    stream.avail_in = ProbeSize;
     stream.next_out = content;
     stream.avail_out = ProbeContentSize;
-
-    constexpr int atBlockEnd = 128; // of data_type, see inflate()
-    std::size_t blocks = 0;
-    std::size_t used = 0;
-    while (inflate(&stream, Z_BLOCK) == Z_OK && stream.avail_out != 0) {
-        if ((stream.data_type & atBlockEnd) != 0) {
-            ++blocks;
-            used = ProbeSize - stream.avail_in;
-        }
-    }
+    int blocks = 0;
+    while (blocks < FewBlocks && passTinyBlock(stream))
+        ++blocks;
     (void)inflateEnd(&stream);
-    return blocks >= FewBlocks && used < blocks * TinyBlock;
+    return blocks == FewBlocks;
 }
 
 } // namespace
