@@ -15,6 +15,7 @@
 #include <iostream>
 #include <memory>
 #include <set>
+#include <string_view>
 #include <vector>
 
 namespace {
@@ -63,7 +64,7 @@ int extractMatching(FileTransaction& transaction, OpenPackage& package,
             continue;
 
         const std::string destination =
-            destinationName(dstDir, entry.name.substr(srcPrefix.size()));
+            destinationName(dstDir, std::string_view(entry.name).substr(srcPrefix.size()));
         trace(debug, "dstName: ", destination);
         if (destination.size() <= 1) {
             trace(debug, "Skipping dstName: ", destination);
@@ -112,9 +113,11 @@ std::string sourcePrefix(const std::string& subdir)
     return spbFileRoot + subdir + "/";
 }
 
-std::string destinationName(const std::string& dstDir, const std::string& rest)
+std::string destinationName(const std::string& dstDir, std::string_view rest)
 {
-    std::string name = dstDir + "/" + rest;
+    std::string name;
+    name.reserve(dstDir.size() + 1 + rest.size());
+    name.append(dstDir).append("/").append(rest);
     for (std::size_t at = name.find("//"); at != std::string::npos; at = name.find("//", at))
         name.erase(at, 1);
     return name;

@@ -8,6 +8,7 @@
 
 #include <cstdio>
 #include <string>
+#include <string_view>
 #include <vector>
 
 #include <sys/types.h>
@@ -31,7 +32,7 @@ struct ExtractionStep {
 
 /// The destination of an entry whose name is the source prefix followed by `rest`: `dstDir`, a
 /// slash and `rest`, without double slashes. An entry is skipped if this has fewer than two bytes.
-[[nodiscard]] std::string destinationName(const std::string& dstDir, const std::string& rest);
+[[nodiscard]] std::string destinationName(const std::string& dstDir, std::string_view rest);
 
 /// Extracts the whole package at `spbPath` into the home of `installation`, journalled, and writes
 /// the file index at `indexPath` (null: none).

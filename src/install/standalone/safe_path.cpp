@@ -7,6 +7,7 @@
 #include <cstdlib>
 #include <cstring>
 #include <optional>
+#include <string_view>
 #include <utility>
 
 #include <linux/magic.h>
@@ -76,13 +77,13 @@ std::shared_ptr<const ScopedFd> shared(ScopedFd fd)
 }
 
 /// The directory `path` if no link leads to it; null, with `errno`, otherwise.
-std::shared_ptr<const ScopedFd> directoryWithoutLinks(const std::string& path)
+std::shared_ptr<const ScopedFd> directoryWithoutLinks(std::string_view path)
 {
     Reuse& last = reuse();
     if (last.directory && last.path == path)
         return last.directory;
 
-    ScopedFd fd = openWithoutLinks(path, DirectoryFlags);
+    ScopedFd fd = openWithoutLinks(std::string(path), DirectoryFlags);
     if (!fd.isOpen())
         return nullptr;
     auto directory = shared(std::move(fd));
@@ -112,7 +113,7 @@ bool isOnProc(int fd)
 /// One walk along a path. `rest_` is what is not resolved yet, relative to `directory_`.
 class Walk {
 public:
-    Walk(const std::string& path, LastLink lastLink) : rest_(path), lastLink_(lastLink) {}
+    Walk(std::string_view path, LastLink lastLink) : rest_(path), lastLink_(lastLink) {}
 
     /// See findPlace().
     int run(Place& place)
@@ -221,18 +222,18 @@ bool isLink(const Place& place)
 
 /// findPlace() for a path without any link, in one or two system calls. Returns ELOOP or another
 /// code for which takesWalk() is true if the path must be walked.
-int findPlaceWithoutLinks(const std::string& path, LastLink lastLink, Place& place)
+int findPlaceWithoutLinks(std::string_view path, LastLink lastLink, Place& place)
 {
     const std::size_t slash = path.rfind('/');
-    if (slash == std::string::npos || slash == 0)
+    if (slash == std::string_view::npos || slash == 0)
         return ELOOP;
-    const std::string name = path.substr(slash + 1);
+    const std::string_view name = path.substr(slash + 1);
     if (name.empty() || name == "." || name == "..")
         return ELOOP;
     auto directory = directoryWithoutLinks(path.substr(0, slash));
     if (!directory)
         return errno;
-    place = {std::move(directory), name};
+    place = {std::move(directory), std::string(name)};
     return lastLink == LastLink::Follow && isLink(place) ? ELOOP : 0;
 }
 
@@ -357,7 +358,7 @@ bool othersCanPlant(const struct stat& status)
 
 int findPlace(const std::string& path, LastLink lastLink, Place& place)
 {
-    const std::string text = path.substr(0, path.find('\0')); // the system reads no further
+    const std::string_view text = path.c_str(); // to the first NUL, as the system reads it
     if (text.size() >= PATH_MAX)
         return ENAMETOOLONG;
     const int code = findPlaceWithoutLinks(text, lastLink, place);
