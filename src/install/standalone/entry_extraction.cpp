@@ -138,13 +138,14 @@ int openDestination(FileTransaction& transaction, OpenPackage& package,
         openForWriting(destination, Existing::Refuse, UnfinishedMode, file) == 0)
         return FileOk;
 
-    const int backedUp = backupFile(transaction, destination);
+    struct stat moved = {};
+    const int backedUp = backupFile(transaction, destination, moved);
     if (backedUp != FileOk)
         return backedUp;
     // After a backup the name is free. Whatever is there now was planted.
     const Existing existing = transaction.backup ? Existing::Refuse : Existing::Truncate;
     const int error = openForWriting(destination, existing, UnfinishedMode, file);
-    package.fileWasReplaced();
+    package.fileWasReplaced(moved);
     if (existing == Existing::Truncate)
         package.fileWasTruncated();
     return error == 0 ? FileOk : CannotOpenForWriting;
@@ -191,18 +192,22 @@ std::shared_ptr<PackageWindow> OpenPackage::open(const ZipEntry* entry)
         return nullptr;
     if (!file_) {
         ScopedFd file = archive_.openArchive();
-        if (file.isOpen())
+        struct stat status = {};
+        if (file.isOpen() && fstat(file.get(), &status) == 0) {
+            identity_ = identityOf(status);
             file_ = std::make_shared<PackageWindow>(std::move(file));
+        }
     }
     return file_;
 }
 
-void OpenPackage::fileWasReplaced()
+void OpenPackage::fileWasReplaced(const struct stat& moved)
 {
-    struct stat held = {};
+    // No path leads through a plain file, and this is asked for each file of an upgrade.
+    if (S_ISREG(moved.st_mode) && identityOf(moved) != identity_)
+        return;
     struct stat named = {};
-    if (!file_ || fstat(file_->fd(), &held) != 0 || stat(archive_.path().c_str(), &named) != 0 ||
-        held.st_ino != named.st_ino || held.st_dev != named.st_dev)
+    if (stat(archive_.path().c_str(), &named) != 0 || identityOf(named) != identity_)
         file_.reset();
 }
 

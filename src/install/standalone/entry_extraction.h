@@ -31,9 +31,10 @@ public:
     /// callers share; null where ZipFile::getInputStream() returns null.
     [[nodiscard]] std::shared_ptr<PackageWindow> open(const ZipEntry* entry);
 
-    /// Call this after a file was replaced, which may be the package: the next open() uses what is
-    /// at the package's path then.
-    void fileWasReplaced();
+    /// Call this after a file was replaced, with the status of what was `moved` away, all 0 if
+    /// nothing was. If that was the package or on its path, the next open() uses what is at the
+    /// path then.
+    void fileWasReplaced(const struct stat& moved);
 
     /// Call this after a file was truncated, which may be the package.
     void fileWasTruncated();
@@ -41,6 +42,7 @@ public:
 private:
     const ZipFile& archive_;
     std::shared_ptr<PackageWindow> file_;
+    FileIdentity identity_; ///< of the open file
 };
 
 /// Writes `entry` of `package` to `destination`, whose old content is backed up, and gives it

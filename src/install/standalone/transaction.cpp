@@ -44,11 +44,10 @@ int kindOf(char letter)
     }
 }
 
-/// True if what is at `place` must be moved: anything but a dangling link of root or the running
-/// user. Such a link remains, and its target is created.
-bool isInTheWay(const Place& place, const std::string& path)
+/// True if what is at `place`, with its `status`, must be moved: anything but a dangling link of
+/// root or the running user. Such a link remains, and its target is created.
+bool isInTheWay(const Place& place, const std::string& path, struct stat& status)
 {
-    struct stat status = {};
     if (fstatat(place.fd(), place.name.c_str(), &status, AT_SYMLINK_NOFOLLOW) == 0 &&
         (!S_ISLNK(status.st_mode) || !isTrustedOwner(status.st_uid)))
         return true;
@@ -118,12 +117,19 @@ void claim(FileTransaction& transaction, const std::string& path, const FileIden
 
 int backupFile(FileTransaction& transaction, const std::string& path)
 {
+    struct stat moved = {};
+    return backupFile(transaction, path, moved);
+}
+
+int backupFile(FileTransaction& transaction, const std::string& path, struct stat& moved)
+{
     if (!transaction.backup)
         return FileOk;
     Place place;
     if (findPlace(path, LastLink::Keep, place) != 0)
         return pathIsMissing(path) ? FileOk : CannotRename;
-    if (!isInTheWay(place, path))
+    struct stat status = {};
+    if (!isInTheWay(place, path, status))
         return FileOk;
 
     const char* const name = place.name.c_str();
@@ -137,6 +143,7 @@ int backupFile(FileTransaction& transaction, const std::string& path)
 
     // Recorded only now: an entry without a backup would have nothing to restore.
     record(transaction, BackedUp, path);
+    moved = status;
     return FileOk;
 }
 

@@ -54,6 +54,11 @@ void claim(FileTransaction& transaction, const std::string& path, const FileIden
 /// is free, or a dangling link of root or the running user. Returns 0 or CannotRename (9).
 [[nodiscard]] int backupFile(FileTransaction& transaction, const std::string& path);
 
+/// backupFile() that sets `moved` to the status of what it moved, and leaves it as it is if it
+/// moved nothing.
+[[nodiscard]] int backupFile(FileTransaction& transaction, const std::string& path,
+                             struct stat& moved);
+
 /// The number of changes in the journal.
 [[nodiscard]] std::size_t changeCount(const FileTransaction& transaction);
 
