@@ -12,6 +12,7 @@
 #include "time_stamps.h"
 
 #include <cstdio>
+#include <iterator>
 #include <ostream>
 
 namespace {
@@ -31,9 +32,10 @@ void readFileIndex(const std::string& path, std::set<std::string>& files)
     if (!file)
         return;
     std::string line;
+    auto next = files.begin(); // where a line goes that follows the one before it in order
     while (readLine(file.get(), line)) {
         if (!line.empty() && line[0] != '#')
-            files.insert(line);
+            next = std::next(files.insert(next, line));
     }
 }
 
