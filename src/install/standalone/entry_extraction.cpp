@@ -18,8 +18,8 @@
 
 namespace {
 
-constexpr std::size_t InputSize = std::size_t{64} * 1024;
-constexpr std::size_t PieceSize = std::size_t{128} * 1024;
+constexpr std::size_t InputSize = std::size_t{256} * 1024;
+constexpr std::size_t PieceSize = std::size_t{256} * 1024;
 
 /// Inflates the raw deflated data of one entry, piece by piece.
 class PieceReader {
