@@ -161,7 +161,7 @@ int createFullPath(FileTransaction& transaction, const std::string& path, mode_t
         *counter = 0;
     const ScopedDirectoryReuse reuse;
     const int code = createPath(transaction, path, mode);
-    if (code != FileOk || path.empty() || endsWithSlash(path))
+    if (code != FileOk || endsWithSlash(path))
         return code;
     return createIfMissing(transaction, path, mode);
 }

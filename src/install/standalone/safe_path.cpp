@@ -289,23 +289,20 @@ int openExisting(const Place& place, Existing existing, int access, ScopedFd& fi
     return 0;
 }
 
-/// chmod() of what `fd`, opened with O_PATH at `place`, refers to.
-int changeModeOf(const ScopedFd& fd, const Place& place, const struct stat& status, mode_t mode)
+/// Sets the mode of what `fd`, opened with O_PATH at `place`, refers to; false if that fails.
+bool setModeOf(const ScopedFd& fd, const Place& place, const struct stat& status, mode_t mode)
 {
     const std::string path = "/proc/self/fd/" + std::to_string(fd.get());
     if (chmod(path.c_str(), mode) == 0)
-        return 0;
+        return true;
     if (errno != ENOENT && errno != ENOTDIR)
-        return -1;
+        return false;
 
     // There is no /proc.
     const ScopedFd opened(openat(place.fd(), place.name.c_str(), O_RDONLY | CautiousFlags));
     struct stat again = {};
-    if (!opened.isOpen() || fstat(opened.get(), &again) != 0)
-        return -1;
-    if (again.st_dev != status.st_dev || again.st_ino != status.st_ino)
-        return failed(ENOENT);
-    return fchmod(opened.get(), mode);
+    return fstat(opened.get(), &again) == 0 && identityOf(again) == identityOf(status) &&
+           fchmod(opened.get(), mode) == 0;
 }
 
 /// A stream that owns `fd`; null, with `errno`, if `fd` is not open or there is no memory.
@@ -504,7 +501,7 @@ ModeChange changeMode(const std::string& path, mode_t mode)
         return errno == ENOENT ? ModeChange::NothingThere : ModeChange::Failed;
     if (S_ISLNK(status.st_mode) || isPlantedHardLink(place, status))
         return ModeChange::Failed;
-    return changeModeOf(fd, place, status, mode) == 0 ? ModeChange::Changed : ModeChange::Failed;
+    return setModeOf(fd, place, status, mode) ? ModeChange::Changed : ModeChange::Failed;
 }
 
 int unlinkPath(const std::string& path)

@@ -147,23 +147,22 @@ bool resolveLocalHeader(HeaderReader& reader, ZipEntry& entry)
     return true;
 }
 
-/// Reads the central directory; false if anything about it is wrong.
-bool readCentralDirectory(HeaderReader& reader, std::vector<ZipEntry>& entries)
+/// Reads the central directory; no entries if anything about it is wrong.
+void readCentralDirectory(HeaderReader& reader, std::vector<ZipEntry>& entries)
 {
     // The end record is expected in one place only, so an archive comment hides it.
     unsigned char end[EndRecordSize];
     if (!reader.seekBeforeEnd(EndRecordSize) || !reader.read(end, sizeof end) ||
         !hasSignature(end, 5, 6))
-        return false;
+        return;
 
     const std::uint32_t count = read16(end + 10);
     if (read16(end + 8) != count || !reader.seek(read32(end + 16)))
-        return false;
-    if (!readCentralHeaders(reader, count, entries))
-        return false;
-
-    return std::all_of(entries.begin(), entries.end(),
-                       [&](ZipEntry& entry) { return resolveLocalHeader(reader, entry); });
+        return;
+    if (!readCentralHeaders(reader, count, entries) ||
+        !std::all_of(entries.begin(), entries.end(),
+                     [&](ZipEntry& entry) { return resolveLocalHeader(reader, entry); }))
+        entries.clear();
 }
 
 /// Reads one local header, whose signature is checked already, and moves past its data.
@@ -381,10 +380,10 @@ int ZipFile::readDirectory(const char* path, std::vector<ZipEntry>& entries)
         return ZipCannotOpen;
 
     HeaderReader reader(std::move(file));
-    if (readCentralDirectory(reader, entries) && !entries.empty())
+    readCentralDirectory(reader, entries);
+    if (!entries.empty())
         return ZipOk;
 
-    entries.clear();
     const int code = scanLocalHeaders(reader, entries);
     if (code != ZipOk)
         entries.clear();
