@@ -32,6 +32,18 @@ TEST(DescriptorsTest, ClosedStandardDescriptorsAreOpenedOnDevNull)
     }));
 }
 
+TEST(DescriptorsTest, NothingElseIsOpened)
+{
+    EXPECT_TRUE(passesInChild([] {
+        const int free = dup(2);
+        (void)close(free);
+        (void)close(3);
+        openStandardDescriptors();
+        ASSERT_EQ(-1, fcntl(3, F_GETFD));
+        ASSERT_EQ(-1, fcntl(free, F_GETFD));
+    }));
+}
+
 TEST(DescriptorsTest, OthersAreNotPassedOn)
 {
     for (const bool isOld : {false, true}) {
@@ -44,6 +56,26 @@ TEST(DescriptorsTest, OthersAreNotPassedOn)
             ASSERT_EQ(0, fcntl(2, F_GETFD)) << isOld;
         }));
     }
+}
+
+TEST(DescriptorsTest, OnAnOldSystemDescriptorsOfAnyNumberAreNotPassedOn)
+{
+    EXPECT_TRUE(passesInChild([] {
+        const int fd = fcntl(2, F_DUPFD, 100);
+        failSystemCall(SYS_close_range, ENOSYS);
+        secureDescriptors();
+        ASSERT_EQ(FD_CLOEXEC, fcntl(fd, F_GETFD));
+    }));
+}
+
+TEST(DescriptorsTest, AnOldSystemWithoutProcIsNotAFailure)
+{
+    const SmallDisk noProc("/proc", 16);
+
+    EXPECT_TRUE(passesInChild([] {
+        failSystemCall(SYS_close_range, ENOSYS);
+        secureDescriptors();
+    }));
 }
 
 } // namespace

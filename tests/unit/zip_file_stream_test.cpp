@@ -1,3 +1,4 @@
+#include "process_limits.h"
 #include "sample_bytes.h"
 #include "test_files.h"
 #include "zip_builder.h"
@@ -12,6 +13,7 @@
 #include <vector>
 
 #include <fcntl.h>
+#include <sys/syscall.h>
 #include <unistd.h>
 
 namespace {
@@ -358,6 +360,23 @@ TEST_F(ZipStreamTest, AStoredStreamWithoutAFileGivesNothing)
     EXPECT_EQ(0, static_cast<InputStream&>(stream).read(buffer, 10));
     EXPECT_EQ(-1, stream.read());
     EXPECT_EQ(10, stream.available());
+}
+
+TEST_F(ZipStreamTest, AReadThatGoesOnAfterAShortOneStaysWithinItsBuffer)
+{
+    writeFile(path, "abcd");
+
+    EXPECT_TRUE(passesInChild([&] {
+        X__StoredInputStream stream(ScopedFd(open(path.c_str(), O_RDONLY)), 10);
+        std::string buffer(100, '#');
+        beforeSystemCall({SYS_read}, 2, [&] {
+            writeFile(path, "abcd" + std::string(90, 'e'));
+            return 0;
+        });
+
+        EXPECT_EQ(10, static_cast<InputStream&>(stream).read(buffer.data(), 10));
+        EXPECT_EQ("abcdeeeeee" + std::string(90, '#'), buffer);
+    }));
 }
 
 TEST_F(ZipStreamTest, ClosingAStoredStreamDoesNothing)

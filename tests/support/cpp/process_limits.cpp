@@ -6,12 +6,16 @@
 
 #include <cstddef>
 #include <cstdio>
+#include <future>
 #include <iostream>
 #include <iterator>
+#include <memory>
+#include <thread>
 
 #include <linux/filter.h>
 #include <linux/seccomp.h>
 #include <sched.h>
+#include <sys/ioctl.h>
 #include <sys/mount.h>
 #include <sys/prctl.h>
 #include <sys/syscall.h>
@@ -35,6 +39,19 @@ void useFilter(const sock_fprog& program)
 {
     ASSERT_EQ(0, prctl(PR_SET_NO_NEW_PRIVS, 1, 0, 0, 0));
     ASSERT_EQ(0, prctl(PR_SET_SECCOMP, SECCOMP_MODE_FILTER, &program));
+}
+
+/// Waits for a system call that the filter of `listener` holds up, calls `act` and answers: the
+/// call fails with the result of `act` or, if that is 0, is made.
+void answerSystemCall(int listener, const std::function<int()>& act)
+{
+    seccomp_notif request = {};
+    EXPECT_EQ(0, ioctl(listener, SECCOMP_IOCTL_NOTIF_RECV, &request));
+    seccomp_notif_resp response = {};
+    response.id = request.id;
+    response.error = -act();
+    response.flags = response.error == 0 ? SECCOMP_USER_NOTIF_FLAG_CONTINUE : 0;
+    EXPECT_EQ(0, ioctl(listener, SECCOMP_IOCTL_NOTIF_SEND, &response));
 }
 
 } // namespace
@@ -95,6 +112,45 @@ void becomeUser(uid_t uid)
     ASSERT_EQ(0, unshare(CLONE_NEWUSER));
     writeFile("/proc/self/uid_map", map);
     ASSERT_EQ(uid, getuid());
+}
+
+void beforeSystemCall(const std::vector<long>& numbers, int nth, const std::function<int()>& act)
+{
+    // Started before the filter exists, so that its own system calls are not held up.
+    const auto promise = std::make_shared<std::promise<int>>();
+    std::thread([promise, nth, act] {
+        const int listener = promise->get_future().get();
+        for (int call = 1;; ++call)
+            answerSystemCall(
+                listener, call == nth ? act : [] { return 0; });
+    }).detach();
+
+    std::vector<sock_filter> program = {
+        BPF_STMT(BPF_LD | BPF_W | BPF_ABS, static_cast<__u32>(offsetof(seccomp_data, nr)))};
+    for (const long number : numbers) {
+        program.push_back(BPF_JUMP(BPF_JMP | BPF_JEQ | BPF_K, static_cast<__u32>(number), 0, 1));
+        program.push_back(BPF_STMT(BPF_RET | BPF_K, SECCOMP_RET_USER_NOTIF));
+    }
+    program.push_back(BPF_STMT(BPF_RET | BPF_K, SECCOMP_RET_ALLOW));
+    const sock_fprog filter = {static_cast<unsigned short>(program.size()), program.data()};
+    ASSERT_EQ(0, prctl(PR_SET_NO_NEW_PRIVS, 1, 0, 0, 0));
+    const long listener =
+        syscall(SYS_seccomp, SECCOMP_SET_MODE_FILTER, SECCOMP_FILTER_FLAG_NEW_LISTENER, &filter);
+    ASSERT_LE(0, listener);
+    promise->set_value(static_cast<int>(listener));
+}
+
+std::vector<long> statusCalls()
+{
+    return {
+        SYS_fstat,      SYS_statx,
+#ifdef SYS_newfstatat
+        SYS_newfstatat,
+#endif
+#ifdef SYS_fstat64
+        SYS_fstat64,    SYS_fstatat64,
+#endif
+    };
 }
 
 void changeEffectiveUser()

@@ -3,6 +3,7 @@
 
 #include <functional>
 #include <string>
+#include <vector>
 
 #include <linux/capability.h>
 #include <sys/types.h>
@@ -56,6 +57,14 @@ void becomeUser(uid_t uid);
 /// Makes the system call `number` (SYS_...) fail with `error` from now on, unless its first
 /// argument is 0 to 2, a standard stream. For a child only.
 void failSystemCall(long number, int error);
+
+/// Calls `act` before the `nth` of this thread's system calls from now on whose number is one of
+/// `numbers`. That call then fails with the `errno` that `act` returned; 0: it is made as usual.
+/// For a child only, and once in it.
+void beforeSystemCall(const std::vector<long>& numbers, int nth, const std::function<int()>& act);
+
+/// The numbers of the system calls that return the status of a file.
+std::vector<long> statusCalls();
 
 /// Makes geteuid() return an id that is not root's from now on. For a child only.
 void changeEffectiveUser();
