@@ -14,6 +14,8 @@ from harness.rollback import (
     XSS_FILES,
     rolled_back,
 )
+from harness.shared_machine import ANN as ANN_HERSELF
+from harness.shared_machine import SharedMachine, why_not
 
 FAILED = """\
 Installation failed, rolling back
@@ -498,6 +500,23 @@ def test_an_invalid_registry_comes_back(machine):
 
     rolled_back(machine, before, FILE_INDEX, INSTALL_TYPE_FILE, COMMON_SETTING)
     assert machine.mode("/etc/zor/zor.ini") == 0o600
+
+
+@pytest.mark.skipif(why_not() is not None, reason=str(why_not()))
+def test_a_registry_whose_owner_cannot_be_kept_comes_back_with_its_mode(binary):
+    machine = SharedMachine(binary)
+    try:
+        machine.make_directory("/home/ann/.zor")
+        machine.give_to(ANN_HERSELF, "/home/ann/.zor")
+        machine.plant("/home/ann/.zor/zor.ini", "ZOR_Version = 2.x\n", 0o646)  # of root
+        machine.let_commands_fail(("common_trace_path", 1))
+
+        fail(machine, "-c", "/home/ann/traces", user=ANN_HERSELF)
+
+        assert machine.read("/home/ann/.zor/zor.ini") == "ZOR_Version = 2.x\n"
+        assert machine.mode("/home/ann/.zor/zor.ini") == 0o646
+    finally:
+        machine.delete()
 
 
 def test_an_older_backup_of_the_registry_does_not_come_back(machine):

@@ -39,8 +39,9 @@ TEST(BuildStampTest, TheVersionEndsWhereNoDotFollows)
 
 TEST(BuildStampTest, WithoutAUsableVersionItIs2100)
 {
-    for (const char* const stamp : {"", "22/12/02zor9.2.30", "_", "_x.1", "_9", "_9.", "_9.x",
-                                    "_0.5.1.1", "_-1.5", "_9.-1", "_9.2.-1", "_9.2.3.-4"})
+    for (const char* const stamp :
+         {"", "22/12/02zor9.2.30", "9.2.30.0000", "_", "_x.1", "_9", "_9.", "_9.x", "_0.5.1.1",
+          "_-1.5", "_9.-1", "_9.2.-1", "_9.2.3.-4"})
         EXPECT_EQ("2.1.0.0000/0", versionOf(stamp)) << stamp;
 }
 

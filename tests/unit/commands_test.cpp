@@ -1,5 +1,7 @@
 #include "commands.h"
 #include "installer_fixtures.h"
+#include "interruption.h"
+#include "process_limits.h"
 #include "settings.h"
 #include "toolkit_package.h"
 
@@ -86,6 +88,18 @@ TEST_F(RunCommandTest, ReturnsAndLogsTheRawStatus)
 TEST_F(RunCommandTest, AMissingProgramReturnsTheStatusOfTheShell)
 {
     EXPECT_EQ(127 << 8, runCommand(dir / "missing", "/usr/bin", ""));
+}
+
+TEST_F(RunCommandTest, ACommandThatTheKeyboardKillsIsASignalToTheRun)
+{
+    EXPECT_TRUE(passesInChild([] {
+        const ScopedInterruptible interruptible;
+        EXPECT_EQ(0, runCommand("true", "", ""));
+        EXPECT_FALSE(isInterrupted());
+
+        EXPECT_EQ(130 * 256, runCommand("exit", "", "130"));
+        EXPECT_TRUE(isInterrupted());
+    }));
 }
 
 TEST_F(RunCommandTest, TheDirectoryIsNotUsed)

@@ -40,6 +40,17 @@ TEST_F(CopyFileTest, NothingOfALongerDestinationStays)
     EXPECT_EQ("new", readFile(dir / "copy"));
 }
 
+TEST_F(CopyFileTest, AnExistingDestinationKeepsItsMode)
+{
+    writeFile(dir / "source", "new");
+    writeFile(dir / "copy", "old");
+    ASSERT_EQ(0, chmod((dir / "copy").c_str(), 0751));
+
+    EXPECT_EQ(0, copyFile(dir / "source", dir / "copy"));
+
+    EXPECT_EQ(0751U, modeOf(dir / "copy"));
+}
+
 TEST_F(CopyFileTest, AMissingSourceIsCode1AndCreatesNoDestination)
 {
     EXPECT_EQ(1, copyFile(dir / "missing", dir / "copy"));
@@ -149,6 +160,16 @@ TEST_F(BackupCopyTest, ReplacesAnOlderBackup)
     EXPECT_EQ(0, backupCopy(transaction, dir / "zor.ini"));
 
     EXPECT_EQ("old", readFile(dir / "zor.ini.bak"));
+}
+
+TEST_F(BackupCopyTest, TheBackupHasTheModeOfTheFile)
+{
+    writeFile(dir / "zor.ini", "old");
+    ASSERT_EQ(0, chmod((dir / "zor.ini").c_str(), 02751));
+
+    EXPECT_EQ(0, backupCopy(transaction, dir / "zor.ini"));
+
+    EXPECT_EQ(02751U, modeOf(dir / "zor.ini.bak"));
 }
 
 TEST_F(BackupCopyTest, AFailedCopyReturnsItsCodeAndLeavesNoBackupAndNoEntry)
@@ -491,6 +512,15 @@ TEST_F(CreateFullPathTest, AFinalSlashMakesNoDifference)
     EXPECT_EQ(0, createFullPath(transaction, "a/b/", 0755, nullptr));
 
     EXPECT_EQ("4 a\n4 a/b\n", journalText(transaction));
+}
+
+TEST_F(CreateFullPathTest, AFileInFrontOfAFinalSlashIsSkippedToo)
+{
+    writeFile(dir / "file", "");
+
+    EXPECT_EQ(0, createFullPath(transaction, "file/", 0755, nullptr));
+
+    EXPECT_TRUE(transaction.journal.empty());
 }
 
 TEST_F(CreateFullPathTest, CreatesNothingForAnEmptyPath)

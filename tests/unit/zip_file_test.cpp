@@ -340,6 +340,18 @@ TEST_F(ZipDirectoryTest, ACentralNameOfMoreThan2048BytesLeadsToTheScan)
     EXPECT_EQ(FromScan, namesOf(archive));
 }
 
+TEST_F(ZipDirectoryTest, ALocalNameBehindTheEndOfTheFileLeadsToTheScan)
+{
+    ZipArchive archive = {{storedItem("a", std::string(70000, 'x'))}};
+    const auto size = static_cast<std::uint32_t>(zipBytes(archive).size());
+    // The end record as a part of the local header: the number of its first bytes is the method,
+    // the upper half of the directory's offset the length of a name.
+    archive.items[0].central.localOffset = size - 30;
+    archive.items[0].central.method = 0x4b50;
+
+    EXPECT_EQ(Names{"a"}, namesOf(archive));
+}
+
 TEST_F(ZipDirectoryTest, ALocalNameOfMoreThan2048BytesLeadsToTheScanWhichEndsThere)
 {
     ZipArchive archive = reversedDirectory();
