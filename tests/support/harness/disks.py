@@ -56,16 +56,15 @@ def reenter():
         if not shutil.which(program):
             return f"there is no {program}"
     unshare = ("unshare", "--mount", "--propagation", "private", "--")
-    if reason := why_not(*unshare, sys.executable, "-B", "-c", TRIAL):
+    if reason := why_not(*unshare, sys.executable, "-B", "-c", TRIAL, directory=ABOVE):
         return reason
     os.environ[ENTERED] = "1"
     return os.execvp(unshare[0], [*unshare, sys.executable, "-B", *sys.argv])
 
 
-# Fails where loop devices, one of the file systems, or shared blocks are missing.
-TRIAL = f"""
-import sys
-sys.path.insert(0, {os.path.dirname(os.path.dirname(os.path.realpath(__file__)))!r})
+# Fails where loop devices, one of the file systems, or shared blocks are missing. Runs in ABOVE,
+# where it finds this package.
+TRIAL = """
 from harness import disks
 with disks.Disks() as room:
     for system in disks.FILE_SYSTEMS.values():
@@ -74,9 +73,12 @@ with disks.Disks() as room:
 """
 
 
-def why_not(*command):
-    """The last line of what a failing command says, or nothing."""
-    done = subprocess.run(command, check=False, capture_output=True, text=True)
+ABOVE = os.path.dirname(os.path.dirname(os.path.realpath(__file__)))
+
+
+def why_not(*command, directory=None):
+    """The last line of what a command says that fails in the directory, or nothing."""
+    done = subprocess.run(command, check=False, capture_output=True, text=True, cwd=directory)
     lines = done.stderr.strip().splitlines() or [f"status {done.returncode}"]
     return "" if done.returncode == 0 else lines[-1]
 
