@@ -44,8 +44,8 @@ int kindOf(char letter)
     }
 }
 
-/// True if what is at `place`, with its `status`, must be moved: anything but a dangling link of
-/// root or the running user. Such a link remains, and its target is created.
+/// True if what is at `place` must be moved: anything but a dangling link of root or the running
+/// user. Such a link remains, and its target is created. Sets `status` to that of what is there.
 bool isInTheWay(const Place& place, const std::string& path, struct stat& status)
 {
     if (fstatat(place.fd(), place.name.c_str(), &status, AT_SYMLINK_NOFOLLOW) == 0 &&
