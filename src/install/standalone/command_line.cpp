@@ -184,11 +184,9 @@ private:
             custom_log_path_available = true;
             *logstream << "ZOR custom trace path: " << value << '\n';
             return 0;
-        case 'o':
+        default: // 'o': takeOptionWithArgument() accepts no other
             redirectLog(value);
             return 0;
-        default: // rejected by takeOptionWithArgument()
-            return 1;
         }
     }
 

@@ -256,7 +256,6 @@ X__DeflatedInputStream::X__DeflatedInputStream(ScopedFd file, std::uint32_t comp
                                                std::uint32_t uncompressedSize)
     : file_(std::move(file)), compressedRemaining_(compressedSize), available_(uncompressedSize)
 {
-    inflate_.next_in = input_;
     (void)inflateInit2(&inflate_, -15); // raw data; if it fails, so does the first inflate
 }
 
@@ -273,22 +272,14 @@ int X__DeflatedInputStream::read()
     return static_cast<signed char>(c);
 }
 
-/// Reads ahead compressed bytes; false if none are left.
-bool X__DeflatedInputStream::refill()
+/// Reads compressed bytes ahead, if any are left.
+void X__DeflatedInputStream::refill()
 {
     const std::size_t wanted = std::min<std::size_t>(sizeof input_, compressedRemaining_);
     const std::size_t count = readUpTo(file_.get(), input_, wanted);
     compressedRemaining_ -= static_cast<std::uint32_t>(count);
     inflate_.next_in = input_;
     inflate_.avail_in = static_cast<uInt>(count);
-    return count != 0;
-}
-
-int X__DeflatedInputStream::markExhausted()
-{
-    status_ = Z_STREAM_ERROR;
-    available_ = 0;
-    return 0;
 }
 
 int X__DeflatedInputStream::read(char* buf, int len)
@@ -300,11 +291,11 @@ int X__DeflatedInputStream::read(char* buf, int len)
         inflate_.next_out = reinterpret_cast<Bytef*>(buf);
         inflate_.avail_out = static_cast<uInt>(len);
         while (status_ == Z_OK && inflate_.avail_out != 0) {
-            const bool dry = inflate_.avail_in == 0 && !refill();
-            // Also without input: inflate may hold output that did not fit the previous block.
+            if (inflate_.avail_in == 0)
+                refill();
+            // Also without input: inflate may hold output that did not fit the previous block. If
+            // it does not, it returns Z_BUF_ERROR, which ends the stream like any other error.
             status_ = inflate(&inflate_, Z_NO_FLUSH);
-            if (dry && status_ == Z_BUF_ERROR)
-                return markExhausted();
         }
     }
 

@@ -96,13 +96,12 @@ public:
     int available() override;
 
 private:
-    bool refill();
-    int markExhausted();
+    void refill();
 
     ScopedFd file_;
     std::uint32_t compressedRemaining_; ///< compressed bytes not read from the file yet
     std::uint32_t available_;
-    int status_ = 0; ///< last result of inflate; Z_STREAM_ERROR marks exhausted input
+    int status_ = 0; ///< last result of inflate
     z_stream inflate_ = {};
     unsigned char input_[4096];
 };
