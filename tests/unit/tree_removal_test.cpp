@@ -10,6 +10,7 @@
 #include <algorithm>
 #include <filesystem>
 #include <functional>
+#include <iterator>
 #include <ostream>
 #include <streambuf>
 
@@ -148,6 +149,13 @@ TEST_F(RemoveTreeTest, RemovesEverythingAndLogsIt)
               sortedLines(log.text()));
 }
 
+TEST_F(RemoveTreeTest, AFinalSlashIsNotRepeatedInTheLog)
+{
+    EXPECT_TRUE(removeTree(dir / "tree/sub/deep/", false, true));
+
+    EXPECT_EQ("DEL: " + dir / "tree/sub/deep/file" + "\n", log.text());
+}
+
 TEST_F(RemoveTreeTest, ADirectoryIsRemovedAfterWhatItHolds)
 {
     EXPECT_TRUE(removeTree(dir / "tree/sub/deep", true, false));
@@ -200,9 +208,33 @@ TEST_F(RemoveTreeTest, AMissingDirectoryIsFalseAndPrintsNothing)
     EXPECT_EQ("", log.text());
 }
 
+TEST_F(RemoveTreeTest, ADirectoryBelowAMissingOneIsFalse)
+{
+    EXPECT_FALSE(removeTree(dir / "missing/below", true, false));
+}
+
+TEST_F(RemoveTreeTest, SubdirectoriesThatCannotBeOpenedStayEvenIfTheyAreEmpty)
+{
+    Lines deleted;
+    for (int i = 0; i < 20; ++i) { // one after the other, in whatever order they are listed
+        const std::string name = dir / "mixed/" + std::to_string(10 + i);
+        makeDirectories(name + "closed");
+        ASSERT_EQ(0, chmod((name + "closed").c_str(), 0));
+        writeFile(name + "file", "");
+        deleted.push_back("DEL: " + name + "file");
+    }
+    protect("tree");
+
+    EXPECT_FALSE(removeTree(dir / "mixed", true, false));
+
+    EXPECT_EQ(deleted, sortedLines(log.text()));
+    EXPECT_EQ(20, std::distance(fs::directory_iterator(dir / "mixed"), {}));
+}
+
 TEST_F(RemoveTreeTest, AFileIsNotATree)
 {
     EXPECT_FALSE(removeTree(dir / "tree/file", true, false));
+    EXPECT_FALSE(removeTree(dir / "tree/file", true, true));
 
     EXPECT_TRUE(pathExists(dir / "tree/file"));
 }
@@ -269,6 +301,68 @@ TEST_F(RemoveTreeTest, ADirectoryThatIsMovedAwayMeanwhileStays)
 
     EXPECT_FALSE(pathExists(dir / "moving"));
     EXPECT_TRUE(pathExists(dir / "away/directory"));
+}
+
+TEST_F(RemoveTreeTest, NothingIsRemovedInADirectoryThatIsMovedAwayMeanwhile)
+{
+    makeDirectories(dir / "moving/one");
+    writeFile(dir / "moving/one/file", "");
+    WatchedLog watched([&](const std::string& line) {
+        if (line != "DEL: " + dir / "moving/one/file")
+            return;
+        fs::rename(dir / "moving/one", dir / "away");
+        fs::create_directory(dir / "away/one"); // the name of the directory itself
+    });
+    std::ostream stream(&watched);
+    logstream = &stream;
+
+    EXPECT_TRUE(removeTree(dir / "moving", true, false));
+
+    EXPECT_TRUE(pathExists(dir / "away/one"));
+}
+
+TEST_F(RemoveTreeTest, WhatTakesThePlaceOfADirectoryMeanwhileIsRemovedIfItIsEmpty)
+{
+    WatchedLog watched([&](const std::string& line) {
+        if (line != "DEL: " + dir / "tree/sub/deep/file")
+            return;
+        fs::rename(dir / "tree/sub/deep", dir / "away");
+        fs::create_directory(dir / "tree/sub/deep");
+    });
+    std::ostream stream(&watched);
+    logstream = &stream;
+
+    EXPECT_TRUE(removeTree(dir / "tree", true, false));
+
+    EXPECT_EQ(Lines{"d 0755 away"}, treeOf(dir.path()));
+}
+
+TEST_F(RemoveTreeTest, NothingIsDeletedThereInsteadOfInAParentThatIsMovedToo)
+{
+    Lines names;
+    for (int i = 0; i < 20; ++i) { // before and after "deep", in whatever order they are listed
+        names.push_back(std::to_string(10 + i));
+        if (i == 10)
+            makeDirectories(dir / "moving/sub/deep");
+        makeDirectories(dir / "moving/sub");
+        writeFile(dir / "moving/sub/" + names.back(), "");
+    }
+    writeFile(dir / "moving/sub/deep/file", "");
+    WatchedLog watched([&](const std::string& line) {
+        if (line != "DEL: " + dir / "moving/sub/deep/file")
+            return;
+        fs::rename(dir / "moving/sub/deep", dir / "away");
+        fs::rename(dir / "moving/sub", dir / "away too");
+        for (const std::string& name : names)
+            writeFile(dir / "away/" + name, "");
+        fs::create_directory(dir / "away/deep"); // the name of the directory itself
+    });
+    std::ostream stream(&watched);
+    logstream = &stream;
+
+    (void)removeTree(dir / "moving", true, false);
+
+    EXPECT_EQ(21, std::distance(fs::directory_iterator(dir / "away"), {}));
 }
 
 TEST_F(RemoveTreeTest, ADirectoryWhoseParentIsMovedElsewhereTooStays)
@@ -407,6 +501,29 @@ TEST_F(RemoveTreeTest, ADeepTreeTakesFewDescriptorsAndLittleStack)
     }));
 
     EXPECT_FALSE(pathExists(dir / "d"));
+}
+
+TEST_F(RemoveTreeTest, AFileWithAPathOf4096BytesStaysAndTheOthersGo)
+{
+    const std::string name(200, 'd');
+    std::string path = dir.path();
+    ScopedFd level(open(dir.path().c_str(), O_RDONLY | O_DIRECTORY));
+    for (; path.size() + 1 + name.size() < 4070; path += "/" + name) {
+        ASSERT_EQ(0, mkdirat(level.get(), name.c_str(), 0755));
+        level = ScopedFd(openat(level.get(), name.c_str(), O_RDONLY | O_DIRECTORY));
+    }
+    Lines deleted;
+    for (int i = 0; i < 40; ++i) { // the longest paths of 4095 and 4096 bytes, one after the other
+        std::string file = std::to_string(10 + i);
+        file.resize(4094 - path.size() + static_cast<std::size_t>(i % 2), 'f');
+        ScopedFd(openat(level.get(), file.c_str(), O_WRONLY | O_CREAT, 0644));
+        if (i % 2 == 0)
+            deleted.push_back("DEL: " + path + "/" + file);
+    }
+
+    EXPECT_FALSE(removeTree(dir / name, true, false));
+
+    EXPECT_EQ(deleted, sortedLines(log.text()));
 }
 
 } // namespace

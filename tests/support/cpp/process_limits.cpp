@@ -43,13 +43,13 @@ void useFilter(const sock_fprog& program)
 
 /// Waits for a system call that the filter of `listener` holds up, calls `act` and answers: the
 /// call fails with the result of `act` or, if that is 0, is made.
-void answerSystemCall(int listener, const std::function<int()>& act)
+void answerSystemCall(int listener, const std::function<int(long)>& act)
 {
     seccomp_notif request = {};
     EXPECT_EQ(0, ioctl(listener, SECCOMP_IOCTL_NOTIF_RECV, &request));
     seccomp_notif_resp response = {};
     response.id = request.id;
-    response.error = -act();
+    response.error = -act(request.data.nr);
     response.flags = response.error == 0 ? SECCOMP_USER_NOTIF_FLAG_CONTINUE : 0;
     EXPECT_EQ(0, ioctl(listener, SECCOMP_IOCTL_NOTIF_SEND, &response));
 }
@@ -114,15 +114,14 @@ void becomeUser(uid_t uid)
     ASSERT_EQ(uid, getuid());
 }
 
-void beforeSystemCall(const std::vector<long>& numbers, int nth, const std::function<int()>& act)
+void watchSystemCalls(const std::vector<long>& numbers, const std::function<int(long)>& act)
 {
     // Started before the filter exists, so that its own system calls are not held up.
     const auto promise = std::make_shared<std::promise<int>>();
-    std::thread([promise, nth, act] {
+    std::thread([promise, act] {
         const int listener = promise->get_future().get();
-        for (int call = 1;; ++call)
-            answerSystemCall(
-                listener, call == nth ? act : [] { return 0; });
+        for (;;)
+            answerSystemCall(listener, act);
     }).detach();
 
     std::vector<sock_filter> program = {
@@ -138,6 +137,13 @@ void beforeSystemCall(const std::vector<long>& numbers, int nth, const std::func
         syscall(SYS_seccomp, SECCOMP_SET_MODE_FILTER, SECCOMP_FILTER_FLAG_NEW_LISTENER, &filter);
     ASSERT_LE(0, listener);
     promise->set_value(static_cast<int>(listener));
+}
+
+void beforeSystemCall(const std::vector<long>& numbers, int nth, const std::function<int()>& act)
+{
+    watchSystemCalls(numbers, [call = 0, nth, act](long /*number*/) mutable {
+        return ++call == nth ? act() : 0;
+    });
 }
 
 std::vector<long> statusCalls()

@@ -58,9 +58,12 @@ void becomeUser(uid_t uid);
 /// argument is 0 to 2, a standard stream. For a child only.
 void failSystemCall(long number, int error);
 
-/// Calls `act` before the `nth` of this thread's system calls from now on whose number is one of
-/// `numbers`. That call then fails with the `errno` that `act` returned; 0: it is made as usual.
-/// For a child only, and once in it.
+/// Calls `act` with the number of the call before each of this thread's system calls from now on
+/// that is one of `numbers`. The call then fails with the `errno` that `act` returned; 0: it is
+/// made as usual. For a child only, and once in it.
+void watchSystemCalls(const std::vector<long>& numbers, const std::function<int(long)>& act);
+
+/// As watchSystemCalls(), for the `nth` of those calls alone.
 void beforeSystemCall(const std::vector<long>& numbers, int nth, const std::function<int()>& act);
 
 /// The numbers of the system calls that return the status of a file.
