@@ -26,8 +26,10 @@ from harness.attacks import (
     prepare,
     refused_modes,
 )
-from harness.checks import not_printed, printed_lines, same_lines
+from harness.checks import not_printed, printed_lines, same_lines, same_text
+from harness.installations import SHARED_TRANSCRIPT
 from harness.machine import SPB
+from harness.shared_machine import ANN as HER
 from harness.shared_machine import (
     GUEST,
     HER_OWN,
@@ -543,6 +545,72 @@ def test_a_link_whose_owner_the_user_namespace_does_not_map_is_refused(machine):
 
     same_lines(refused_modes(outcome), [no_permission(BIN_ETC + "/trawlfs")])
     ends(outcome, 0)
+
+
+# Owners of files that are replaced.
+
+
+@pytest.mark.parametrize("owner", [(2000, 2000), (0, 2000), (2000, 0)])
+def test_a_registry_is_replaced_and_keeps_its_owner_and_group(machine, owner):
+    prepare(machine, "registration")
+    os.chown(machine.at("/etc/zor/zor.ini"), *owner)
+    before = os.stat(machine.at("/etc/zor/zor.ini"))
+
+    outcome = machine.run("i", "XYZ", "-s", SPB)
+
+    ends(outcome, 0)
+    after = os.stat(machine.at("/etc/zor/zor.ini"))
+    assert "ZOR_Exploiters = ABC:XYZ:\n" in machine.read("/etc/zor/zor.ini")
+    assert (after.st_uid, after.st_gid) == owner
+    assert after.st_ino != before.st_ino
+
+
+def test_a_registry_whose_owner_cannot_be_kept_is_written_in_place(machine):
+    machine.make_directory("/home/ann/.zor")
+    machine.give_to(HER, "/home/ann/.zor")
+    machine.plant("/home/ann/.zor/zor.ini", "ZOR_Version = 2.x\n", 0o646)
+    before = os.stat(machine.at("/home/ann/.zor/zor.ini"))
+
+    outcome = machine.run("i", "ABC", "-s", SPB, user=HER)
+
+    ends(outcome, 0)
+    after = os.stat(machine.at("/home/ann/.zor/zor.ini"))
+    assert "ZOR_Exploiters = ABC:\n" in machine.read("/home/ann/.zor/zor.ini")
+    assert (after.st_uid, after.st_gid, after.st_mode) == (0, 0, before.st_mode)
+    assert after.st_ino == before.st_ino
+
+
+# The log.
+
+
+@pytest.mark.parametrize("name", ["/dev/stdout", "/dev/fd/1"])
+def test_the_log_goes_to_a_descriptor_whoever_owns_the_links_in_dev(machine, name):
+    """In a container, they often belong to a user whom its user namespace does not map."""
+    outcome = machine.run_in_shell(
+        'chown -h 2000 /dev/stdout /dev/fd; "$0" "$@"', "i", "ABC", "-o", name, "-s", SPB
+    )
+
+    ends(outcome, 0)
+    same_text(outcome.stdout, SHARED_TRANSCRIPT)
+
+
+def test_the_log_goes_to_standard_error_whoever_owns_its_link(machine):
+    outcome = machine.run_in_shell(
+        'chown -h 2000 /dev/stderr; "$0" "$@"', "i", "ABC", "-o", "/dev/stderr", "-s", SPB
+    )
+
+    ends(outcome, 0)
+    same_text(outcome.stderr, SHARED_TRANSCRIPT)
+
+
+def test_a_path_that_leaves_the_descriptors_is_none_of_them(machine):
+    machine.make_directory("/fd", 0o777)
+    os.link(machine.at(SHADOW), machine.at("/fd/5"))
+
+    outcome = machine.run("i", "ABC", "-o", "/proc/../fd/5", "-s", SPB)
+
+    ends(outcome, 0)
+    assert machine.read("/fd/5") == "root:secret:1::::::\n"
 
 
 def test_the_status_report_reads_no_registry_through_a_link(machine):

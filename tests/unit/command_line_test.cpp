@@ -1,10 +1,14 @@
 #include "command_line.h"
 #include "installer_fixtures.h"
+#include "process_limits.h"
 #include "settings.h"
 
 #include <gtest/gtest.h>
 
 #include <initializer_list>
+
+#include <sys/stat.h>
+#include <unistd.h>
 
 namespace {
 
@@ -234,6 +238,7 @@ TEST_F(CommandLineTest, OMayRedirectAgain)
     logstream->flush();
 
     EXPECT_EQ("Target directory: /a\n", readFile(dir / "a"));
+    EXPECT_EQ(0644U, modeOf(dir / "a"));
     EXPECT_EQ("Target directory: /b\n", readFile(dir / "b"));
 }
 
@@ -244,6 +249,33 @@ TEST_F(CommandLineTest, ALogThatCannotBeOpenedLosesWhatFollows)
     EXPECT_EQ("/opt/x", commandLine.destDir);
     EXPECT_TRUE(logstream->fail());
     EXPECT_EQ("", output + errors + log.text());
+}
+
+/// Whether a log to `path` empties a file that somebody else may have planted there as a hard link.
+bool emptiesHardLink(const TempDir& dir, const std::string& directory, const std::string& name,
+                     const std::string& start = "")
+{
+    makeDirectories(dir / directory);
+    EXPECT_EQ(0, chmod((dir / directory).c_str(), 0777));
+    writeFile(dir / "victim", "kept");
+    EXPECT_EQ(0, link((dir / "victim").c_str(), (dir / directory + "/" + name).c_str()));
+    EXPECT_TRUE(passesInChild([&] {
+        ASSERT_EQ(0, chdir(dir.path().c_str()));
+        const std::string path = start + directory + "/" + name;
+        const char* arguments[] = {"wzorinst", "r", "ABC", "-o", path.c_str(), nullptr};
+        CommandLine commandLine;
+        EXPECT_EQ(0, parseCommandLine(5, const_cast<char**>(arguments), commandLine));
+    }));
+    return readFile(dir / "victim") != "kept";
+}
+
+TEST_F(CommandLineTest, OnlyThePathOfADescriptorIsOpenedWhateverItLeadsTo)
+{
+    EXPECT_FALSE(emptiesHardLink(dir, "open", "log"));
+    EXPECT_FALSE(emptiesHardLink(dir, "open", "5"));
+    EXPECT_FALSE(emptiesHardLink(dir, "a/b/c/open", "5")) << "as deep as descriptors in /proc";
+    EXPECT_FALSE(emptiesHardLink(dir, "a/b/c/fd", "5")) << "and in a directory of that name";
+    EXPECT_FALSE(emptiesHardLink(dir, "fd", "5", "/proc/self/cwd/"));
 }
 
 TEST_F(CommandLineTest, AnInvalidProviderIsLoggedToTheRedirectedLogAndTheUsageIsNot)

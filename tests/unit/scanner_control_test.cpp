@@ -1,5 +1,6 @@
 #include "installer_fixtures.h"
 #include "paths.h"
+#include "process_limits.h"
 #include "safe_path.h"
 #include "scanner_control.h"
 #include "settings.h"
@@ -214,6 +215,18 @@ TEST_F(ScannerControlTest, RestartingReturnsTheRawStatusOfTheCommand)
     plantScanners(home, commandLog, "-enable");
 
     EXPECT_EQ(768, restartScanners(home));
+}
+
+TEST_F(ScannerControlTest, ASignalEndsTheStopBeforeTheNextCommand)
+{
+    plantScanners(home, commandLog);
+
+    EXPECT_TRUE(passesInChild([&] {
+        const InterruptionAt first("trawlfs -shutdown");
+        EXPECT_EQ(0, stopScanners(home, true, true));
+    }));
+
+    EXPECT_EQ("trawlfs [-shutdown]\n", calls());
 }
 
 } // namespace

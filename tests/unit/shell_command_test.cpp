@@ -31,10 +31,36 @@ TEST(ShellCommandTest, ASignalToTheInstallerAloneIsNotLost)
 
 TEST(ShellCommandTest, WithoutAProcessTheStatusIsMinus1)
 {
+    for (const int error : {EAGAIN, ENOMEM}) {
+        EXPECT_TRUE(passesInChild([&] {
+            failSystemCall(SYS_clone, error);
+            failSystemCall(SYS_clone3, error);
+            failSystemCall(SYS_vfork, error);
+            ASSERT_EQ(-1, runShell("true")) << error;
+        }));
+    }
+}
+
+TEST(ShellCommandTest, WithoutAShellTheStatusIsThatOfAMissingCommand)
+{
     EXPECT_TRUE(passesInChild([] {
-        failSystemCall(SYS_clone, EAGAIN);
-        failSystemCall(SYS_clone3, EAGAIN);
-        failSystemCall(SYS_vfork, EAGAIN);
+        failSystemCall(SYS_execve, ENOENT);
+        ASSERT_EQ(127 << 8, runShell("true"));
+    }));
+}
+
+TEST(ShellCommandTest, AnInterruptedWaitGoesOn)
+{
+    EXPECT_TRUE(passesInChild([] {
+        beforeSystemCall({SYS_wait4}, 1, [] { return EINTR; });
+        ASSERT_EQ(3 << 8, runShell("exit 3"));
+    }));
+}
+
+TEST(ShellCommandTest, AFailedWaitIsMinus1)
+{
+    EXPECT_TRUE(passesInChild([] {
+        failSystemCall(SYS_wait4, ECHILD);
         ASSERT_EQ(-1, runShell("true"));
     }));
 }

@@ -1,5 +1,6 @@
 #include "installer_fixtures.h"
 #include "paths.h"
+#include "process_limits.h"
 #include "safe_path.h"
 #include "settings.h"
 #include "toolkit_package.h"
@@ -306,6 +307,16 @@ TEST_F(TracePathTest, TheControlProgramFindsItsLibraries)
     EXPECT_EQ(0, updateCommonTracePath(transaction, home, true, dir / "traces"));
 
     EXPECT_EQ(home + "/bin", std::getenv("LD_LIBRARY_PATH"));
+}
+
+TEST_F(TracePathTest, ASignalLeavesTheTracePathUnchanged)
+{
+    EXPECT_TRUE(passesInChild([&] {
+        const InterruptionAt update("Updating common trace path");
+        EXPECT_EQ(14, updateCommonTracePath(transaction, home, true, dir / "traces"));
+    }));
+
+    EXPECT_FALSE(pathExists(calls));
 }
 
 } // namespace

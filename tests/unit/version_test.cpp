@@ -75,6 +75,7 @@ TEST(VersionTest, TheDifferenceIsASigned32BitNumber)
 TEST(VersionTest, ShowsTheFifthNumberOnlyWhenItIsAboveZero)
 {
     EXPECT_EQ("2.3.0.0012", formatVersion({2, 3, 0, 12, 0}));
+    EXPECT_EQ("2.3.0.0012.1", formatVersion({2, 3, 0, 12, 1}));
     EXPECT_EQ("2.3.0.0012.5", formatVersion({2, 3, 0, 12, 5}));
     EXPECT_EQ("2.3.0.0012", formatVersion({2, 3, 0, 12, 0x80000000U}));
     EXPECT_EQ("2.3.0.12345", formatVersion({2, 3, 0, 12345, 0}));
@@ -99,8 +100,8 @@ TEST(BuildDateTest, TheDigitsOfADateAreItsNumber)
 
 TEST(BuildDateTest, AnyOtherTextIsZero)
 {
-    for (const char* const text :
-         {"", "2007-05-23", "22/12/2", "22/12/022", "22-12-02", "ab/cd/ef", "00/00/00", "-1/00/00"})
+    for (const char* const text : {"", "2007-05-23", "22/12/2", "22/12/022", "22-12-02", "22/12-02",
+                                   "22-12/02", "ab/cd/ef", "00/00/00", "-1/00/00"})
         EXPECT_EQ(0, buildDateNumber(text)) << text;
 }
 
