@@ -11,6 +11,7 @@ import re
 import subprocess
 import tempfile
 from dataclasses import dataclass, field, replace
+from pathlib import PurePosixPath
 
 from harness import REPOSITORY, bubblewrap
 from harness.machine import BINARY, ROOT, SPB, Machine
@@ -229,11 +230,21 @@ def tree_of(machine):
 
 
 def restore(machine, tree):
-    """Makes the machine's tree equal to `tree` again."""
+    """Makes the machine's tree equal to `tree` again.
+
+    Some file systems list names in the order in which they were created. For the same order each
+    time, a directory in which a name is missing is filled anew.
+    """
     now = tree_of(machine)
+    incomplete = {
+        os.path.dirname(path)
+        for path, node in tree.items()
+        if path not in now or now[path].kind != node.kind
+    }
     for path in sorted(now, reverse=True):
-        if path not in tree or tree[path].kind != now[path].kind:
+        if path not in tree or not incomplete.isdisjoint(map(str, PurePosixPath(path).parents)):
             machine.remove(path)
+            del now[path]
     for path in sorted(tree):
         if now.get(path) == tree[path]:
             continue
