@@ -178,6 +178,19 @@ def test_a_link_that_was_given_away_is_refused_wherever_it_is(machine, name):
     ends(outcome, 0)
 
 
+def test_a_refused_link_counts_as_a_missing_file(machine):
+    prepare(machine, "registration")
+    path = f"{HOME}/install/zor_install.properties"
+    os.rename(machine.at(path), machine.at("/srv/properties"))
+    machine.link(path, "/srv/properties")
+    machine.give_to(GUEST, path)
+
+    outcome = machine.run(*ACTIONS["registration"], "-d", HOME)
+
+    printed_lines(outcome, f"Loading file {path} error: 2 (No such file or directory)")
+    ends(outcome, 0)
+
+
 # Below bin/customscanners, where everybody may create and the package may have files.
 
 CUSTOM = HOME + "/bin/customscanners"

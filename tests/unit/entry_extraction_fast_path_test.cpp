@@ -1,21 +1,32 @@
 #include "entry_extraction.h"
 #include "package_window.h"
+#include "process_limits.h"
 #include "sample_bytes.h"
 #include "scoped.h"
 #include "test_files.h"
+#include "whole_entry.h"
 #include "zip_builder.h"
 #include "zip_file.h"
 
 #include <gtest/gtest.h>
 
 #include <algorithm>
+#include <cerrno>
 #include <string>
 #include <utility>
 
 #include <fcntl.h>
+#include <sys/syscall.h>
+#include <unistd.h>
 #include <zlib.h>
 
 namespace {
+
+#ifdef SYS_sendfile64
+constexpr long CopyCall = SYS_sendfile64;
+#else
+constexpr long CopyCall = SYS_sendfile;
+#endif
 
 /// Writes deflate data bit by bit.
 class BitWriter {
@@ -154,6 +165,19 @@ TEST_F(SoundEntryTest, ADeflatedEntryArrivesWhole)
     EXPECT_EQ(0, copy(data, entryOf(8, data.size(), 1000)));
 
     EXPECT_EQ(content, readFile(destination));
+}
+
+TEST_F(SoundEntryTest, OnlyEntriesOfUpTo16MebibytesAreHeldInMemory)
+{
+    for (const std::size_t size : {std::size_t{16} << 20, (std::size_t{16} << 20) + 1}) {
+        const std::string content(size, 'a');
+        const std::string data = rawDeflate(content, 1);
+        writeFile(source, data);
+        PackageWindow package(ScopedFd(open(source.c_str(), O_RDONLY)));
+
+        EXPECT_EQ(size == 16 << 20,
+                  wholeContent(package, confirmedEntry(data, content)) != nullptr);
+    }
 }
 
 TEST_F(SoundEntryTest, ADeflatedEntryOfManyPiecesArrivesWhole)
@@ -306,6 +330,30 @@ TEST_F(SoundEntryTest, AStoredEntryArrivesWhole)
     EXPECT_TRUE(content == readFile(destination));
 }
 
+TEST_F(SoundEntryTest, AStoredEntryArrivesWholeAlsoWhereTheSystemCopiesLess)
+{
+    int ends[2] = {-1, -1};
+    ASSERT_EQ(0, pipe2(ends, O_NONBLOCK));
+    const ScopedFd reader(ends[0]);
+    const ScopedFd writer(ends[1]);
+    const std::string content = noiseBytes(100000, 9); // more than a pipe takes
+
+    EXPECT_TRUE(passesInChild([&] {
+        std::string received(content.size(), '\0');
+        ssize_t first = 0;
+        beforeSystemCall({CopyCall}, 2, [&] {
+            first = read(reader.get(), received.data(), received.size());
+            return 0;
+        });
+        EXPECT_EQ(0, copyTo(writer.get(), content, entryOf(0, content.size(), content.size())));
+        const ssize_t second = read(reader.get(), received.data() + first, received.size());
+
+        EXPECT_LT(0, first);
+        EXPECT_EQ(100000, first + second);
+        EXPECT_TRUE(content == received);
+    }));
+}
+
 TEST_F(SoundEntryTest, ADeflatedEntryShorterThanRecordedIsSound)
 {
     const std::string data = rawDeflate("short");
@@ -348,6 +396,23 @@ TEST_F(SoundEntryTest, DataWithoutItsLastByteIsNotSound)
 TEST_F(SoundEntryTest, DataThatIsNotDeflatedIsNotSound)
 {
     EXPECT_EQ(EntryNotSound, copy(std::string(100, '\xFF'), entryOf(8, 100, 100)));
+}
+
+TEST_F(SoundEntryTest, DataOfWhichThePiecesCannotAllBeReadIsNotSound)
+{
+    const std::string content = noiseBytes(65535, 3);
+    std::string data; // of which the last 16 bytes are in a piece of their own
+    for (const char last : {'\0', '\0', '\0', '\1'})
+        data += std::string(1, last) + std::string("\xFF\xFF\0\0", 4) + content;
+    const ZipEntry entry = entryOf(8, data.size(), 4 * content.size());
+    ASSERT_EQ(0, copy(data, entry));
+
+    for (const int nth : {1, 2}) {
+        EXPECT_TRUE(passesInChild([&] {
+            beforeSystemCall({SYS_pread64}, nth, [] { return EIO; });
+            EXPECT_EQ(EntryNotSound, copy(data, entry)) << nth;
+        }));
+    }
 }
 
 TEST_F(SoundEntryTest, AStoredEntryOfTwoGibibytesIsLeftToItsStream)
