@@ -18,8 +18,10 @@ namespace {
 
 #ifdef SYS_fcntl64
 constexpr long FcntlCall = SYS_fcntl64;
+constexpr long SeekCall = SYS__llseek;
 #else
 constexpr long FcntlCall = SYS_fcntl;
+constexpr long SeekCall = SYS_lseek;
 #endif
 
 class ExtractFileTest : public InstallerTest {
@@ -163,6 +165,20 @@ TEST_F(ExtractFileTest, ADamagedEntryWithoutADescriptorForItsStreamIsCode1)
         failSystemCall(FcntlCall, EMFILE);
 
         EXPECT_EQ(1, extractFile(transaction, archive, &archive.entries().at(0), dir / "a", 0));
+    }));
+}
+
+TEST_F(ExtractFileTest, ADamagedEntryWhoseFileCannotBeRewoundIsCode5)
+{
+    EXPECT_TRUE(passesInChild([&] {
+        const std::string path = dir / "package.spb";
+        ZipItem damaged = deflatedItem("a", textBytes(500, 1));
+        damaged.data[0] = '\xFF';
+        writeFile(path, zipBytes({{damaged}}));
+        const ZipFile archive(path.c_str());
+        failSystemCall(SeekCall, EIO);
+
+        EXPECT_EQ(5, extractFile(transaction, archive, &archive.entries().at(0), dir / "a", 0));
     }));
 }
 

@@ -153,4 +153,19 @@ TEST_F(PackageWindowTest, ALargeReadIsOfItsSize)
     EXPECT_EQ(1000000U, heldFrom(100));
 }
 
+TEST_F(PackageWindowTest, ALargeReadMayEndWithTheFile)
+{
+    constexpr std::size_t size = 300000;
+
+    EXPECT_EQ(expected(FileSize - size, size), bytes(FileSize - size, size));
+    EXPECT_EQ("(none)", bytes(FileSize - size, size + 1));
+}
+
+TEST_F(PackageWindowTest, AReadMayBeginWithTheLastByteOfTheOneBefore)
+{
+    EXPECT_EQ(expected(0, 4096), bytes(0, 4096));
+
+    EXPECT_EQ(expected(4095, 10), bytes(4095, 10));
+}
+
 } // namespace
