@@ -440,4 +440,24 @@ TEST_F(CommandLineTest, ARemovalNeedsNoPackage)
     EXPECT_EQ(0, parse({"r", "ABC"}));
 }
 
+TEST_F(CommandLineTest, TheDestinationIsTheGivenDirectoryWithoutItsFinalSlash)
+{
+    commandLine.destDir = "/opt/x/";
+
+    EXPECT_EQ(0, fixDestination(commandLine, "/opt/default"));
+
+    EXPECT_EQ("/opt/x", commandLine.request.homeDirectory);
+    EXPECT_EQ("/opt/x", commandLine.request.configRootDirectory);
+}
+
+TEST_F(CommandLineTest, WithoutAnyDestinationTheUsageIsShown)
+{
+    testing::internal::CaptureStdout();
+
+    EXPECT_EQ(1, fixDestination(commandLine, ""));
+
+    EXPECT_EQ(Usage, testing::internal::GetCapturedStdout());
+    EXPECT_EQ("*** Error: no destination directory.\n", log.text());
+}
+
 } // namespace

@@ -161,6 +161,11 @@ TEST_F(PackageWindowTest, ALargeReadMayEndWithTheFile)
     EXPECT_EQ("(none)", bytes(FileSize - size, size + 1));
 }
 
+TEST_F(PackageWindowTest, TheLastByteCanBeReadAlone)
+{
+    EXPECT_EQ(expected(FileSize - 1, 1), bytes(FileSize - 1, 1));
+}
+
 TEST_F(PackageWindowTest, AReadMayBeginWithTheLastByteOfTheOneBefore)
 {
     EXPECT_EQ(expected(0, 4096), bytes(0, 4096));
