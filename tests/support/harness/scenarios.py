@@ -233,16 +233,17 @@ def restore(machine, tree):
     """Makes the machine's tree equal to `tree` again.
 
     Some file systems list names in the order in which they were created. For the same order each
-    time, a directory in which a name is missing is filled anew.
+    time, a directory of the installation in which a name is missing is filled anew.
     """
     now = tree_of(machine)
     incomplete = {
         os.path.dirname(path)
         for path, node in tree.items()
-        if path not in now or now[path].kind != node.kind
+        if path.startswith(HOME + "/") and (path not in now or now[path].kind != node.kind)
     }
     for path in sorted(now, reverse=True):
-        if path not in tree or not incomplete.isdisjoint(map(str, PurePosixPath(path).parents)):
+        is_below_one = not incomplete.isdisjoint(map(str, PurePosixPath(path).parents))
+        if path not in tree or tree[path].kind != now[path].kind or is_below_one:
             machine.remove(path)
             del now[path]
     for path in sorted(tree):
