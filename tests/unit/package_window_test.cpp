@@ -1,4 +1,5 @@
 #include "package_window.h"
+#include "process_limits.h"
 #include "sample_bytes.h"
 #include "scoped.h"
 #include "test_files.h"
@@ -159,6 +160,19 @@ TEST_F(PackageWindowTest, ALargeReadMayEndWithTheFile)
 
     EXPECT_EQ(expected(FileSize - size, size), bytes(FileSize - size, size));
     EXPECT_EQ("(none)", bytes(FileSize - size, size + 1));
+}
+
+TEST_F(PackageWindowTest, WithoutMemoryNoMoreIsReadThanFits)
+{
+    constexpr std::size_t tooLarge = 1000000;
+
+    EXPECT_TRUE(passesInChild([&] {
+        EXPECT_EQ(expected(0, 100), bytes(0, 100));
+        if (!takeMemory(tooLarge))
+            return;
+        EXPECT_EQ(nullptr, window.bytes(50, tooLarge));
+        EXPECT_EQ(expected(50, 10), bytes(50, 10));
+    }));
 }
 
 TEST_F(PackageWindowTest, TheLastByteCanBeReadAlone)

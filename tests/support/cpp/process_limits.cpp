@@ -10,6 +10,7 @@
 #include <iostream>
 #include <iterator>
 #include <memory>
+#include <new>
 #include <thread>
 
 #include <linux/filter.h>
@@ -18,6 +19,7 @@
 #include <sys/ioctl.h>
 #include <sys/mount.h>
 #include <sys/prctl.h>
+#include <sys/resource.h>
 #include <sys/syscall.h>
 #include <sys/wait.h>
 #include <unistd.h>
@@ -144,6 +146,17 @@ void beforeSystemCall(const std::vector<long>& numbers, int nth, const std::func
     watchSystemCalls(numbers, [call = 0, nth, act](long /*number*/) mutable {
         return ++call == nth ? act() : 0;
     });
+}
+
+bool takeMemory(std::size_t size)
+{
+    if (WZOR_SANITIZE != 0)
+        return false;
+    const rlimit none = {};
+    EXPECT_EQ(0, setrlimit(RLIMIT_AS, &none));
+    while (::operator new(size, std::nothrow) != nullptr) { // what was freed before
+    }
+    return true;
 }
 
 std::vector<long> statusCalls()

@@ -1,6 +1,7 @@
 // Limits that a test sets for its own process: rights, identity, system calls, room on a disk.
 #pragma once
 
+#include <cstddef>
 #include <functional>
 #include <string>
 #include <vector>
@@ -65,6 +66,10 @@ void watchSystemCalls(const std::vector<long>& numbers, const std::function<int(
 
 /// As watchSystemCalls(), for the `nth` of those calls alone.
 void beforeSystemCall(const std::vector<long>& numbers, int nth, const std::function<int()>& act);
+
+/// Leaves this process no memory for pieces of `size` bytes or more. Returns false, and leaves
+/// all, under the address sanitizer, which ends a process that gets none. For a child only.
+[[nodiscard]] bool takeMemory(std::size_t size);
 
 /// The numbers of the system calls that return the status of a file.
 std::vector<long> statusCalls();
