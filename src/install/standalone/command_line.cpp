@@ -184,10 +184,13 @@ private:
             custom_log_path_available = true;
             *logstream << "ZOR custom trace path: " << value << '\n';
             return 0;
-        default: // 'o': takeOptionWithArgument() accepts no other
+        case 'o':
             redirectLog(value);
-            return 0;
+            break;
+        default: // takeOptionWithArgument() accepts no other letter
+            break;
         }
+        return 0;
     }
 
     int applyProvider(const char* value)

@@ -103,7 +103,7 @@ private:
     std::uint32_t available_;
     int status_ = 0; ///< last result of inflate
     z_stream inflate_ = {};
-    unsigned char input_[4096];
+    unsigned char input_[4096] = {};
 };
 
 /// Where the data of `entry` begins in its archive. A seek to 2^31 or beyond fails, and the failure
