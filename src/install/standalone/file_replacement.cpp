@@ -140,7 +140,9 @@ bool needsWritingInPlace(int error)
 int fill(int file, const ContentWriter& write)
 {
     ScopedFd own(fcntl(file, F_DUPFD_CLOEXEC, 0));
-    ScopedFile stream(fdopen(own.get(), "w")); // fails without a descriptor
+    if (!own.isOpen())
+        return errno;
+    ScopedFile stream(fdopen(own.get(), "w"));
     if (!stream)
         return errno;
     (void)own.release(); // the stream owns it now

@@ -50,9 +50,12 @@ int finishUpgrade(FileTransaction& transaction, InstallRegistry& registry,
                   const InstallRegistry& request, bool deployed, bool useCustomPath,
                   const std::string& customPath)
 {
-    if (!localInstall && !useCustomPath)
-        (void)setupCommonLogDir(transaction, registry.homeDirectory, useCustomPath,
-                                customPath); // never fails
+    if (!localInstall && !useCustomPath) {
+        const int code =
+            setupCommonLogDir(transaction, registry.homeDirectory, useCustomPath, customPath);
+        if (code != 0)
+            return code;
+    }
     if (deployed)
         registry.version = request.version;
     const bool changed = updateRegistration(registry, request);

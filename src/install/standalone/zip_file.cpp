@@ -272,14 +272,22 @@ int X__DeflatedInputStream::read()
     return static_cast<signed char>(c);
 }
 
-/// Reads compressed bytes ahead, if any are left.
-void X__DeflatedInputStream::refill()
+/// Reads ahead compressed bytes; false if none are left.
+bool X__DeflatedInputStream::refill()
 {
     const std::size_t wanted = std::min<std::size_t>(sizeof input_, compressedRemaining_);
     const std::size_t count = readUpTo(file_.get(), input_, wanted);
     compressedRemaining_ -= static_cast<std::uint32_t>(count);
     inflate_.next_in = input_;
     inflate_.avail_in = static_cast<uInt>(count);
+    return count != 0;
+}
+
+int X__DeflatedInputStream::markExhausted()
+{
+    status_ = Z_STREAM_ERROR;
+    available_ = 0;
+    return 0;
 }
 
 int X__DeflatedInputStream::read(char* buf, int len)
@@ -291,11 +299,11 @@ int X__DeflatedInputStream::read(char* buf, int len)
         inflate_.next_out = reinterpret_cast<Bytef*>(buf);
         inflate_.avail_out = static_cast<uInt>(len);
         while (status_ == Z_OK && inflate_.avail_out != 0) {
-            if (inflate_.avail_in == 0)
-                refill();
-            // Also without input: inflate may hold output that did not fit the previous block. If
-            // it does not, it returns Z_BUF_ERROR, which ends the stream like any other error.
+            const bool dry = inflate_.avail_in == 0 && !refill();
+            // Also without input: inflate may hold output that did not fit the previous block.
             status_ = inflate(&inflate_, Z_NO_FLUSH);
+            if (dry && status_ == Z_BUF_ERROR)
+                return markExhausted();
         }
     }
 

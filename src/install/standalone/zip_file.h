@@ -96,12 +96,13 @@ public:
     int available() override;
 
 private:
-    void refill();
+    bool refill();
+    int markExhausted();
 
     ScopedFd file_;
     std::uint32_t compressedRemaining_; ///< compressed bytes not read from the file yet
     std::uint32_t available_;
-    int status_ = 0; ///< last result of inflate
+    int status_ = 0; ///< last result of inflate; Z_STREAM_ERROR marks exhausted input
     z_stream inflate_ = {};
     unsigned char input_[4096] = {};
 };
