@@ -35,6 +35,21 @@ protected:
         EXPECT_EQ(1U, archive.entries().size());
         return extractFile(transaction, archive, &archive.entries().at(0), destination, mode);
     }
+
+    /// Expects `code` for a damaged entry while the system call `number` fails with `error`.
+    void expectOfDamaged(int code, long number, int error)
+    {
+        const std::string path = dir / "package.spb";
+        ZipItem damaged = deflatedItem("a", textBytes(500, 1));
+        damaged.data[0] = '\xFF';
+        writeFile(path, zipBytes({{damaged}}));
+        const ZipFile archive(path.c_str());
+        EXPECT_TRUE(passesInChild([&] {
+            failSystemCall(number, error);
+            EXPECT_EQ(code,
+                      extractFile(transaction, archive, &archive.entries().at(0), dir / "a", 0));
+        }));
+    }
 };
 
 TEST_F(ExtractFileTest, WritesStoredAndDeflatedEntriesOfAnySize)
@@ -156,30 +171,12 @@ TEST_F(ExtractFileTest, AnArchiveThatIsGoneWhenAFileIsOverwrittenIsCode1)
 
 TEST_F(ExtractFileTest, ADamagedEntryWithoutADescriptorForItsStreamIsCode1)
 {
-    EXPECT_TRUE(passesInChild([&] {
-        const std::string path = dir / "package.spb";
-        ZipItem damaged = deflatedItem("a", textBytes(500, 1));
-        damaged.data[0] = '\xFF';
-        writeFile(path, zipBytes({{damaged}}));
-        const ZipFile archive(path.c_str());
-        failSystemCall(FcntlCall, EMFILE);
-
-        EXPECT_EQ(1, extractFile(transaction, archive, &archive.entries().at(0), dir / "a", 0));
-    }));
+    expectOfDamaged(1, FcntlCall, EMFILE);
 }
 
 TEST_F(ExtractFileTest, ADamagedEntryWhoseFileCannotBeRewoundIsCode5)
 {
-    EXPECT_TRUE(passesInChild([&] {
-        const std::string path = dir / "package.spb";
-        ZipItem damaged = deflatedItem("a", textBytes(500, 1));
-        damaged.data[0] = '\xFF';
-        writeFile(path, zipBytes({{damaged}}));
-        const ZipFile archive(path.c_str());
-        failSystemCall(SeekCall, EIO);
-
-        EXPECT_EQ(5, extractFile(transaction, archive, &archive.entries().at(0), dir / "a", 0));
-    }));
+    expectOfDamaged(5, SeekCall, EIO);
 }
 
 TEST_F(ExtractFileTest, SetsExactlyTheModeWhateverTheUmask)
